@@ -1,0 +1,77 @@
+// The Windows CE API for programs built for desktop Windows: its own headers, and the calls that
+// only the device has, which platform/windows/ supplies.
+#pragma once
+
+#ifndef UNICODE
+#define UNICODE
+#endif
+#ifndef _UNICODE
+#define _UNICODE
+#endif
+#define WIN32_LEAN_AND_MEAN
+#define NOMINMAX
+#include <winsock2.h>
+// The order counts: winsock2.h before windows.h.
+#include <windows.h>
+#include <tlhelp32.h>
+#include <ws2tcpip.h>
+
+#include <cstdio>
+
+// These macros would rename our own methods in whichever files see them.
+#undef CopyFile
+#undef CreateDirectory
+#undef DeleteFile
+#undef FindFirst
+#undef FindNext
+#undef GetFreeSpace
+#undef MoveFile
+#undef RemoveDirectory
+#undef GetMessage
+#undef SendMessage
+
+#ifndef HORZRES
+#define HORZRES 8
+#endif
+
+struct STORE_INFORMATION {
+  DWORD dwStoreSize;
+  DWORD dwFreeSize;
+};
+
+inline constexpr DWORD SYSMEM_CHANGED = 0;
+inline constexpr ULONG POWER_NAME = 1;
+enum CEDEVICE_POWER_STATE { PwrDeviceUnspecified = -1, D0 = 0, D1, D2, D3, D4, PwrDeviceMaximum };
+
+struct SYSTEM_POWER_STATUS_EX {
+  BYTE ACLineStatus;
+  BYTE BatteryFlag;
+  BYTE BatteryLifePercent;
+  BYTE Reserved1;
+  DWORD BatteryLifeTime;
+  DWORD BatteryFullLifeTime;
+  BYTE Reserved2;
+  BYTE BackupBatteryFlag;
+  BYTE BackupBatteryLifePercent;
+  BYTE Reserved3;
+  DWORD BackupBatteryLifeTime;
+  DWORD BackupBatteryFullLifeTime;
+};
+
+extern "C" {
+HANDLE CreateFileForMappingW(const WCHAR* name, DWORD access, DWORD share,
+                             SECURITY_ATTRIBUTES* security, DWORD disposition, DWORD attributes,
+                             HANDLE template_file);
+BOOL GetStoreInformation(STORE_INFORMATION* information);
+BOOL GetSystemMemoryDivision(DWORD* store_pages, DWORD* ram_pages, DWORD* page_size);
+DWORD SetSystemMemoryDivision(DWORD store_pages);
+BOOL GetSystemPowerStatusEx(SYSTEM_POWER_STATUS_EX* status, BOOL refreshed);
+HANDLE SetPowerRequirement(void* device, CEDEVICE_POWER_STATE state, ULONG flags,
+                           void* system_state, ULONG system_flags);
+DWORD ReleasePowerRequirement(HANDLE requirement);
+void SystemIdleTimerReset();
+BOOL KernelIoControl(DWORD code, void* input, DWORD input_size, void* output, DWORD output_size,
+                     DWORD* returned);
+void NKDbgPrintfW(const WCHAR* format, ...);
+BOOL CloseToolhelp32Snapshot(HANDLE snapshot);
+}

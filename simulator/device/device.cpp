@@ -1,0 +1,52 @@
+#include "device/device.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <utility>
+
+#include "faults/faults.h"
+#include "kernel/debug.h"
+#include "kernel/handle_table.h"
+#include "kernel/kernel.h"
+#include "memory/memory.h"
+#include "net/network.h"
+#include "power/power.h"
+#include "process/processes.h"
+#include "registry/registry.h"
+#include "storage/storage.h"
+#include "trace/trace.h"
+#include "window/screen.h"
+#include "world/sim_thread.h"
+#include "world/world.h"
+
+namespace sim {
+
+Device::Device(World& world, Profile profile, std::filesystem::path folder)
+    : world_(world),
+      profile_(std::move(profile)),
+      folder_(std::move(folder)),
+      faults_(std::make_unique<Faults>()),
+      trace_(std::make_unique<Trace>()),
+      handles_(std::make_unique<HandleTable>()),
+      debug_(std::make_unique<Debug>(*this)),
+      kernel_(std::make_unique<Kernel>(*this)),
+      memory_(std::make_unique<Memory>(*this)),
+      storage_(std::make_unique<Storage>(*this)),
+      registry_(std::make_unique<Registry>(*this)),
+      power_(std::make_unique<Power>(*this)),
+      processes_(std::make_unique<Processes>(*this)),
+      network_(std::make_unique<Network>(*this)),
+      screen_(std::make_unique<Screen>(*this)) {}
+
+Device::~Device() = default;
+
+Device& Device::Current(const char* what) {
+  const SimThread* thread = World::Current();
+  if (thread == nullptr || thread->device == nullptr) {
+    std::fprintf(stderr, "cesim: %s called by a thread that belongs to no simulated device\n", what);
+    std::abort();
+  }
+  return *thread->device;
+}
+
+}  // namespace sim

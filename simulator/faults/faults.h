@@ -1,0 +1,51 @@
+// Which API calls of a device fail, and what has been called how often.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <mutex>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace sim {
+
+/// "The 3rd WriteFile fails with 112" is {"WriteFile", 3, 1, 112}; "every allocation from the 40th
+/// on fails" is {"LocalAlloc", 40, 0, 14}; "the 7th call of any that can fail" is {"*", 7, 1, 0}.
+struct FaultRule {
+  std::string call;         ///< the function's name, or "*" for every call that can fail
+  std::uint64_t nth = 1;    ///< counted from 1, from when the rule was made
+  std::uint64_t count = 1;  ///< how many matching calls fail from there on; 0: all
+  std::uint32_t error = 0;  ///< last error to set; 0: the function's usual one
+};
+
+class Faults {
+ public:
+  void Add(FaultRule rule);
+  void Clear();
+
+  /// Counts one call. @return true, with `error`, when a rule lets it fail. `can_fail` is false for
+  /// calls that have no failure to report (Sleep, GetTickCount); no rule of "*" counts them.
+  bool Enter(std::string_view call, bool can_fail, std::uint32_t usual_error,
+             std::uint32_t& error);
+
+  /// How often `call` was entered; "*" for the calls that can fail.
+  [[nodiscard]] std::uint64_t Count(std::string_view call) const;
+  /// How many calls were made to fail.
+  [[nodiscard]] std::uint64_t fired() const;
+  /// Name of the call that failed last, empty when none did.
+  [[nodiscard]] std::string last_fired() const;
+
+ private:
+  struct Armed {
+    FaultRule rule;
+    std::uint64_t seen = 0;
+  };
+  mutable std::mutex mutex_;
+  std::vector<Armed> rules_;
+  std::map<std::string, std::uint64_t, std::less<>> counts_;
+  std::uint64_t fired_ = 0;
+  std::string last_fired_;
+};
+
+}  // namespace sim

@@ -1,0 +1,15 @@
+#pragma once
+
+namespace sim {
+
+class Device;
+
+class Processes {
+ public:
+  explicit Processes(Device& device) : device_(device) {}
+
+ private:
+  [[maybe_unused]] Device& device_;
+};
+
+}  // namespace sim

@@ -1,0 +1,143 @@
+// One clock, one lock and all blocking of a simulated world.
+//
+// Two worlds stand behind this interface. The real one runs on the host's clock and threads. In the
+// virtual one exactly one simulated thread runs at a time, it is left only at blocking calls, and
+// when all threads are blocked the clock jumps to the next deadline; the same seed gives the same
+// run, byte for byte. Nothing else in the simulator sleeps, waits or reads a clock.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <functional>
+#include <initializer_list>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+struct pollfd;
+
+namespace sim {
+
+class Device;
+class World;
+struct SimThread;
+
+/// Time since the world began.
+using Micros = std::chrono::microseconds;
+
+/// A point where simulated threads wait to be woken: every object that can make a thread runnable
+/// owns one. Guarded by the world's lock; a thread may wait on several at once.
+class WaitQueue {
+ public:
+  WaitQueue() = default;
+  ~WaitQueue();
+  WaitQueue(const WaitQueue&) = delete;
+  WaitQueue& operator=(const WaitQueue&) = delete;
+
+ private:
+  friend class World;
+  friend class WorldCore;
+  std::vector<SimThread*> waiting_;
+};
+
+enum class Wake : std::uint8_t { kNotified, kTimeout };
+
+class World {
+ public:
+  using Lock = std::unique_lock<std::mutex>;
+  using Queues = std::vector<WaitQueue*>;
+
+  /// A world on the host's clock, threads and sockets.
+  static std::unique_ptr<World> MakeReal();
+  /// A world whose time costs nothing. `seed` decides everything that is random in it.
+  static std::unique_ptr<World> MakeVirtual(std::uint64_t seed = 1);
+
+  /// Terminates the simulated threads that are left, at their next blocking call, and joins them.
+  virtual ~World();
+  World(const World&) = delete;
+  World& operator=(const World&) = delete;
+
+  [[nodiscard]] virtual bool is_virtual() const = 0;
+  [[nodiscard]] std::uint64_t seed() const { return seed_; }
+
+  /// The lock that guards all simulated state which several threads share. Held for short
+  /// stretches, never while product code runs.
+  [[nodiscard]] Lock Acquire() { return Lock(mutex_); }
+
+  [[nodiscard]] virtual Micros now() const = 0;
+
+  /// Blocks the calling simulated thread until one of `queues` is notified or `deadline` passes
+  /// (none: no limit). Gives up the lock meanwhile and holds it again on return. May return
+  /// kNotified without cause: callers look at their condition again. Does not return when the
+  /// thread is terminated meanwhile: its stack is abandoned, as on the device.
+  virtual Wake Block(Lock& lock, const Queues& queues, std::optional<Micros> deadline) = 0;
+
+  /// As Block, and also returns when one of the host's file descriptors is ready (revents say
+  /// which). Real world only.
+  virtual Wake BlockOnFiles(Lock& lock, pollfd* files, std::size_t count, const Queues& queues,
+                            std::optional<Micros> deadline) = 0;
+
+  /// Blocks until `ready()` holds. @return false when the deadline passed first.
+  template <typename Predicate>
+  bool WaitUntil(Lock& lock, const Queues& queues, std::optional<Micros> deadline,
+                 Predicate ready) {
+    while (!ready()) {
+      if (Block(lock, queues, deadline) == Wake::kTimeout) return ready();
+    }
+    return true;
+  }
+
+  /// Makes every thread that waits on `queue` look at its condition again. Lock held.
+  virtual void Notify(WaitQueue& queue) = 0;
+
+  /// Runs `action` with the lock held when the clock reaches `when`; actions of one instant run in
+  /// the order of these calls. Lock held. @return a number for Cancel.
+  virtual std::uint64_t At(Micros when, std::function<void()> action) = 0;
+  virtual void Cancel(std::uint64_t action) = 0;
+
+  /// Starts a simulated thread of `device`. Lock held. The world owns the record; it stays valid
+  /// until the world ends. A suspended thread waits for Resume.
+  virtual SimThread& Spawn(Device& device, std::string name, std::function<std::uint32_t()> body,
+                           bool suspended) = 0;
+  virtual void Resume(SimThread& thread) = 0;
+  /// Ends `thread` at its current or next blocking call (or before its first step). Lock held.
+  virtual void Terminate(SimThread& thread, std::uint32_t exit_code) = 0;
+
+  /// Makes the calling host thread a simulated thread of `device` until Detach.
+  virtual SimThread& Attach(Device& device, std::string name) = 0;
+  virtual void Detach(SimThread& thread) = 0;
+
+  /// The simulated thread that is calling, null for a host thread that is not attached.
+  static SimThread* Current();
+
+  /// Uniform in [0, 2^64), from the world's seed. Lock held.
+  std::uint64_t Random();
+  /// Uniform in [0, 1). Lock held.
+  double RandomUnit();
+
+ protected:
+  explicit World(std::uint64_t seed);
+
+ private:
+  std::mutex mutex_;
+  std::uint64_t seed_;
+  std::uint64_t random_state_;
+};
+
+/// Attaches the calling host thread to a device for the length of a scope: a test's or tool's own
+/// thread becomes the device's host program.
+class AttachedThread {
+ public:
+  explicit AttachedThread(Device& device, std::string name = "host");
+  ~AttachedThread();
+  AttachedThread(const AttachedThread&) = delete;
+  AttachedThread& operator=(const AttachedThread&) = delete;
+
+ private:
+  World& world_;
+  SimThread* thread_;
+};
+
+}  // namespace sim
