@@ -1,0 +1,173 @@
+"""Runs every check and test of the project and closes with one line of counts.
+
+A step is a check of its own (passed or failed) or a set of tests whose results are counted one by
+one. Long output goes to build/logs/<step>.log and is shown only when the step fails.
+"""
+
+import argparse
+import os
+import pathlib
+import subprocess
+import sys
+import time
+import xml.etree.ElementTree as ElementTree
+
+ROOT = pathlib.Path(__file__).resolve().parent.parent
+LOGS = ROOT / "build" / "logs"
+JOBS = str(os.cpu_count() or 2)
+
+
+class Counts:
+    def __init__(self):
+        self.passed = self.failed = self.skipped = 0
+
+    def line(self):
+        return f"{self.passed} passed, {self.failed} failed, {self.skipped} skipped"
+
+
+def run(step, command):
+    """Runs a command with its output in the step's log. Returns True when it exits with 0."""
+    LOGS.mkdir(parents=True, exist_ok=True)
+    with open(LOGS / f"{step}.log", "ab") as log:
+        log.write(("$ " + " ".join(command) + "\n").encode())
+        log.flush()
+        return subprocess.run(command, cwd=ROOT, stdout=log, stderr=subprocess.STDOUT,
+                              stdin=subprocess.DEVNULL, check=False).returncode == 0
+
+
+def show_log(step, lines=40):
+    text = (LOGS / f"{step}.log").read_text(errors="replace").splitlines()
+    print("\n".join("    " + line for line in text[-lines:]))
+
+
+def check(*commands):
+    """A step that passes when all its commands do."""
+
+    def action(step, counts):
+        if all(run(step, command) for command in commands):
+            counts.passed += 1
+            return True
+        counts.failed += 1
+        show_log(step)
+        return False
+
+    return action
+
+
+def build(preset, *targets):
+    command = ["cmake", "--build", "--preset", preset, "-j", JOBS]
+    return check(["cmake", "--preset", preset], command + (["--target", *targets] if targets else []))
+
+
+def ctest(preset, *arguments):
+    """A step that counts each test of a build tree."""
+
+    def action(step, counts):
+        report = LOGS / f"{step}.xml"
+        report.unlink(missing_ok=True)
+        run(step, ["ctest", "--preset", preset, "-j", JOBS, "--output-junit", str(report),
+                   "--no-tests=error", *arguments])
+        if not report.exists():
+            counts.failed += 1
+            show_log(step)
+            return False
+        failed = 0
+        for case in ElementTree.parse(report).getroot().iter("testcase"):
+            status = case.get("status")
+            if status == "run":
+                counts.passed += 1
+            elif status in ("notrun", "disabled") or case.find("skipped") is not None:
+                counts.skipped += 1
+                print(f"    skipped: {case.get('name')}: {skip_reason(case)}")
+            else:
+                failed += 1
+                print(f"    FAILED: {case.get('name')}")
+        counts.failed += failed
+        if failed:
+            show_log(step, 80)
+        return failed == 0
+
+    return action
+
+
+def skip_reason(case):
+    skipped = case.find("skipped")
+    output = (case.findtext("system-out") or "").strip().splitlines()
+    reasons = [line.strip() for line in output if "kipped" not in line and line.strip()]
+    if reasons:
+        return reasons[-1]
+    return skipped.get("message", "no reason given") if skipped is not None else "no reason given"
+
+
+def fuzz(step, counts):
+    """Each fuzz target for a few seconds, from its seeds."""
+    if not build("fuzz")(step, counts):
+        return False
+    counts.passed -= 1  # the build is part of the step, not a result of its own
+    good = True
+    for target in sorted((ROOT / "build/fuzz/bin").glob("fuzz_*")):
+        name = target.name[len("fuzz_"):]
+        work = ROOT / "build/fuzz/corpus" / name
+        work.mkdir(parents=True, exist_ok=True)
+        seeds = ROOT / "fuzz/corpus" / name
+        command = [str(target), f"-max_total_time={FUZZ_SECONDS}", "-timeout=10", "-rss_limit_mb=2048",
+                   f"-artifact_prefix={work}/crash-", str(work), str(seeds)]
+        if run(step, command):
+            counts.passed += 1
+        else:
+            counts.failed += 1
+            good = False
+            print(f"    FAILED: {target.name}")
+            show_log(step)
+    return good
+
+
+FUZZ_SECONDS = 5
+
+STEPS = [
+    ("layers", "who may include whom", check([sys.executable, "scripts/check_layers.py"])),
+    ("words", "words and paths that must not be in the project",
+     check([sys.executable, "scripts/check_words.py"])),
+    ("format", "clang-format", check([sys.executable, "scripts/check_format.py"])),
+    ("dev-build", "debug build with address and undefined-behaviour sanitizers", build("dev")),
+    ("dev", "all tests", ctest("dev")),
+    ("tsan-build", "build with the thread sanitizer", build("tsan", "threaded_tests")),
+    ("tsan", "the threaded tests", ctest("tsan", "-L", "threads")),
+    ("release-build", "optimised build", build("release")),
+    ("exports", "what the library exports and needs",
+     check([sys.executable, "scripts/check_exports.py", "build/release/lib/liborvenix.so"],
+           [sys.executable, "scripts/check_surface.py", "build/release/lib/liborvenix.so"])),
+    ("windows", "the library for desktop Windows",
+     check(["cmake", "--preset", "windows"], ["cmake", "--build", "--preset", "windows", "-j", JOBS],
+           [sys.executable, "scripts/check_exports.py", "build/windows/bin/orvenix.dll"])),
+    ("fuzz", "every fuzz target for a few seconds", fuzz),
+    ("tidy", "clang-tidy", check([sys.executable, "scripts/check_tidy.py"])),
+]
+
+
+def main():
+    names = [name for name, _, _ in STEPS]
+    epilog = "steps:\n" + "\n".join(f"  {name:14} {what}" for name, what, _ in STEPS)
+    parser = argparse.ArgumentParser(prog="./test", description=__doc__.splitlines()[0], epilog=epilog,
+                                     formatter_class=argparse.RawDescriptionHelpFormatter)
+    parser.add_argument("step", nargs="*", help="steps to run (default: all)")
+    arguments = parser.parse_args()
+    unknown = [name for name in arguments.step if name not in names]
+    if unknown:
+        parser.error(f"no step is called {', '.join(unknown)}; the steps are {', '.join(names)}")
+
+    counts = Counts()
+    for name, what, action in STEPS:
+        if arguments.step and name not in arguments.step:
+            continue
+        (LOGS / f"{name}.log").unlink(missing_ok=True)
+        started = time.monotonic()
+        print(f"{name}: {what} ...", flush=True)
+        good = action(name, counts)
+        print(f"{name}: {'ok' if good else 'FAILED'} ({time.monotonic() - started:.0f} s)", flush=True)
+    print(counts.line())
+    return 0 if counts.failed == 0 and counts.passed > 0 else 1
+
+
+if __name__ == "__main__":
+    sys.exit(main())
