@@ -8,6 +8,8 @@ class UpgradeConfig;
 
 namespace orvenix {
 
+struct ListKeeper;  // the library's own hand on a list
+
 /// A growable array of pointers whose storage comes from LocalAlloc. Owns the array, never what the
 /// pointers point to. Only the library makes, copies and changes one.
 class PointerArray {
@@ -58,6 +60,7 @@ class PointerList : private PointerArray {
 
  private:
   friend class ::UpgradeConfig;
+  friend struct ListKeeper;
   PointerList() noexcept = default;
   PointerList(const PointerList& other) noexcept = default;
   PointerList& operator=(const PointerList& other) noexcept = default;
