@@ -10,10 +10,12 @@
 #include <cstdint>
 #include <functional>
 #include <initializer_list>
+#include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
+#include <typeindex>
 #include <vector>
 
 struct pollfd;
@@ -117,6 +119,15 @@ class World {
   /// Uniform in [0, 1). Lock held.
   double RandomUnit();
 
+  /// The world's one `T`, made from the world at first use; it ends after the world's threads and
+  /// actions. For what the devices of a world share, such as the network between them. Lock held.
+  template <typename T>
+  T& Shared() {
+    std::shared_ptr<void>& slot = shared_[std::type_index(typeid(T))];
+    if (slot == nullptr) slot = std::make_shared<T>(*this);
+    return *static_cast<T*>(slot.get());
+  }
+
  protected:
   explicit World(std::uint64_t seed);
 
@@ -124,6 +135,7 @@ class World {
   std::mutex mutex_;
   std::uint64_t seed_;
   std::uint64_t random_state_;
+  std::map<std::type_index, std::shared_ptr<void>> shared_;
 };
 
 /// Attaches the calling host thread to a device for the length of a scope: a test's or tool's own
