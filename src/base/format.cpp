@@ -122,8 +122,8 @@ std::size_t FormatV(char* out, std::size_t capacity, const char* format,
       case 'd':
       case 'i': {
         const std::int32_t value = va_arg(arguments, std::int32_t);
-        const std::uint32_t magnitude = value < 0 ? 0U - static_cast<std::uint32_t>(value)
-                                                  : static_cast<std::uint32_t>(value);
+        const std::uint32_t magnitude =
+            value < 0 ? 0U - static_cast<std::uint32_t>(value) : static_cast<std::uint32_t>(value);
         PutNumber(sink, how, magnitude, 10, kLower, value < 0);
         break;
       }

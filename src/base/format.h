@@ -14,7 +14,8 @@ namespace base {
 /// on the device); a null text prints nothing. An unknown conversion is copied as it stands.
 /// Arguments wider than 32 bits must not be passed.
 /// @return characters in `out`, without the terminating zero.
-std::size_t FormatV(char* out, std::size_t capacity, const char* format, va_list arguments) noexcept;
+std::size_t FormatV(char* out, std::size_t capacity, const char* format,
+                    va_list arguments) noexcept;
 
 [[gnu::format(printf, 3, 4)]] std::size_t Format(char* out, std::size_t capacity,
                                                  const char* format, ...) noexcept;

@@ -17,8 +17,7 @@ using WideView = std::basic_string_view<WideChar>;
 /// into a fixed buffer. A capacity of 0 writes nothing. `text` may overlap `out`.
 /// @return false when the text was cut.
 template <typename Char>
-bool CopyText(Char* out, std::size_t capacity,
-                        std::basic_string_view<Char> text) noexcept {
+bool CopyText(Char* out, std::size_t capacity, std::basic_string_view<Char> text) noexcept {
   if (capacity == 0) return false;
   const std::size_t room = capacity - 1;
   const std::size_t taken = text.size() < room ? text.size() : room;
@@ -86,9 +85,7 @@ class BasicFixedText {
   }
 
   /// Replaces the text. @return false when it was cut to fit; what fits is kept.
-  bool Assign(ViewType text) noexcept {
-    return CopyText<Char>(chars_, Capacity, text);
-  }
+  bool Assign(ViewType text) noexcept { return CopyText<Char>(chars_, Capacity, text); }
 
   /// Adds at the end, with the same rule. `text` must not point into this object.
   bool Append(ViewType text) noexcept {
