@@ -128,6 +128,8 @@ STEPS = [
     ("layers", "who may include whom", check([sys.executable, "scripts/check_layers.py"])),
     ("words", "words and paths that must not be in the project",
      check([sys.executable, "scripts/check_words.py"])),
+    ("oddities", "docs/oddities.md says what the sources say",
+     check([sys.executable, "scripts/collect_oddities.py", "--check"])),
     ("format", "clang-format", check([sys.executable, "scripts/check_format.py"])),
     ("dev-build", "debug build with address and undefined-behaviour sanitizers", build("dev")),
     ("dev", "all tests", ctest("dev")),
