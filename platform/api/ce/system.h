@@ -100,6 +100,13 @@ inline constexpr LCID LOCALE_SYSTEM_DEFAULT = 0x800;
 inline constexpr LCID LOCALE_USER_DEFAULT = 0x400;
 inline constexpr UINT CP_ACP = 0;
 inline constexpr UINT CP_UTF8 = 65001;
+inline constexpr DWORD MB_ERR_INVALID_CHARS = 8;
+inline constexpr DWORD DATE_SHORTDATE = 1;
+inline constexpr DWORD DATE_LONGDATE = 2;
+inline constexpr DWORD TIME_NOMINUTESORSECONDS = 1;
+inline constexpr DWORD TIME_NOSECONDS = 2;
+inline constexpr DWORD TIME_NOTIMEMARKER = 4;
+inline constexpr DWORD TIME_FORCE24HOURFORMAT = 8;
 
 extern "C" {
 LONG RegOpenKeyExW(HKEY key, const WCHAR* name, DWORD options, REGSAM access, HKEY* opened);
