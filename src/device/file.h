@@ -18,8 +18,8 @@ enum class TimeKind : std::uint8_t { kCreation, kLastAccess, kLastWrite };
 /// One open file, one search in a folder, and the file system around them.
 ///
 /// Names are 8-bit texts of at most 259 characters; a longer one is refused, never cut. Nothing
-/// here logs: callers do. An object belongs to one thread at a time. It is about 2 KiB large, comes
-/// from the local heap when made with `new`, and closes what it holds when it is destroyed.
+/// here logs: callers do. An object belongs to one thread at a time. It is about 1.5 KiB large,
+/// comes from the local heap when made with `new`, and closes what it holds when it is destroyed.
 /// Files are at most 2 GiB - 1 long.
 ///
 /// A file of another kind (one kept in memory by a driver) derives from this class and replaces the
@@ -126,14 +126,10 @@ class File : public OnLocalHeap {
   bool WriteWithRebalance(const void* data, std::uint32_t length) noexcept;
 
  private:
-  /// Converts `name` for the next call. @return null, with the last error set, for a bad name.
-  const WCHAR* Wide(const char* name) noexcept;
   bool Open(const char* name, DWORD access, DWORD share, DWORD disposition) noexcept;
   /// Notes the platform's error of a failed call, or its absence, and passes the result on.
   bool Note(bool succeeded) noexcept;
 
-  char name_[kNameSize] = {};
-  WideText<kNameSize> wide_;
   FileHandle file_;
   SearchHandle search_;
   WIN32_FIND_DATAW found_ = {};

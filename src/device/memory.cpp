@@ -1,0 +1,45 @@
+#include "device/memory.h"
+
+#include <coredll.h>
+
+namespace device {
+namespace {
+
+/// The platform tells these in bytes; desktop builds of the same calls use wider types.
+std::uint32_t Pages(std::uint64_t bytes, std::uint32_t page_size) noexcept {
+  return static_cast<std::uint32_t>(bytes / page_size);
+}
+
+}  // namespace
+
+std::uint32_t GetRamPagesInUse(std::uint32_t page_size) noexcept {
+  if (page_size == 0) return 0;
+  MEMORYSTATUS status = {};
+  status.dwLength = sizeof status;
+  GlobalMemoryStatus(&status);
+  return Pages(status.dwTotalPhys, page_size) - Pages(status.dwAvailPhys, page_size) + 1;
+}
+
+bool GetMemoryPages(MemoryPages* pages) noexcept {
+  *pages = MemoryPages{};
+  DWORD store_pages = 0;
+  DWORD ram_pages = 0;
+  DWORD page_size = 0;
+  STORE_INFORMATION store = {};
+  if (GetSystemMemoryDivision(&store_pages, &ram_pages, &page_size) == 0 || page_size == 0 ||
+      GetStoreInformation(&store) == 0) {
+    return false;
+  }
+  pages->total = static_cast<std::uint32_t>(store_pages + ram_pages);
+  pages->store_in_use = Pages(store.dwStoreSize, page_size) - Pages(store.dwFreeSize, page_size);
+  pages->programs_in_use = GetRamPagesInUse(page_size);
+  pages->store = static_cast<std::uint32_t>(store_pages);
+  return true;
+}
+
+void RebalanceMemory() noexcept {
+  MemoryPages pages;
+  if (GetMemoryPages(&pages)) SetSystemMemoryDivision(BalancedStorePages(pages));
+}
+
+}  // namespace device
