@@ -7,6 +7,7 @@
 #include "device/device.h"
 #include "faults/api_call.h"
 #include "kernel/wide_format.h"
+#include "locale/code_pages.h"
 #include "world/sim_thread.h"
 
 namespace sim {

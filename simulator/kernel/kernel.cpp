@@ -6,7 +6,7 @@
 
 #include "device/device.h"
 #include "kernel/handle_table.h"
-#include "kernel/wide_format.h"
+#include "locale/code_pages.h"
 
 namespace sim {
 namespace {

@@ -3,6 +3,10 @@
 #include <algorithm>
 #include <cstdint>
 #include <optional>
+#include <string_view>
+#include <utility>
+
+#include "locale/code_pages.h"
 
 namespace sim {
 namespace {
@@ -149,7 +153,9 @@ class Formatter {
     if (narrow) {
       const char* from = va_arg(arguments_, const char*);
       if (from == nullptr) from = "(null)";
-      while (text.size() < limit && *from != 0) text += static_cast<unsigned char>(*from++);
+      std::size_t size = 0;
+      while (size < limit && from[size] != 0) ++size;
+      text = FromAnsi(std::string_view(from, size));
     } else {
       const WCHAR* from = va_arg(arguments_, const WCHAR*);
       if (from == nullptr) from = u"(null)";
@@ -171,84 +177,10 @@ class Formatter {
   std::u16string out_;
 };
 
-constexpr char32_t kReplacement = 0xFFFD;
-
-void AppendUtf8(std::string& out, char32_t code) {
-  const auto add = [&out](char32_t byte) { out += static_cast<char>(byte); };
-  if (code < 0x80) {
-    add(code);
-  } else if (code < 0x800) {
-    add(0xC0U | code >> 6U);
-    add(0x80U | (code & 0x3FU));
-  } else if (code < 0x10000) {
-    add(0xE0U | code >> 12U);
-    add(0x80U | (code >> 6U & 0x3FU));
-    add(0x80U | (code & 0x3FU));
-  } else {
-    add(0xF0U | code >> 18U);
-    add(0x80U | (code >> 12U & 0x3FU));
-    add(0x80U | (code >> 6U & 0x3FU));
-    add(0x80U | (code & 0x3FU));
-  }
-}
-
-/// Takes one character off `text`, or one byte that is none.
-char32_t TakeCharacter(std::string_view& text) {
-  const auto byte = [&text](std::size_t i) {
-    return static_cast<char32_t>(static_cast<unsigned char>(text[i]));
-  };
-  const char32_t first = byte(0);
-  const std::size_t size = first < 0x80   ? 1
-                           : first < 0xC2 ? 0
-                           : first < 0xE0 ? 2
-                           : first < 0xF0 ? 3
-                           : first < 0xF5 ? 4
-                                          : 0;
-  char32_t code = size == 1 ? first : first & (0x7FU >> size);
-  bool good = size != 0 && size <= text.size();
-  for (std::size_t i = 1; good && i < size; ++i) {
-    good = (byte(i) & 0xC0U) == 0x80;
-    code = code << 6U | (byte(i) & 0x3FU);
-  }
-  constexpr char32_t kLowest[] = {0, 0, 0x80, 0x800, 0x10000};
-  good = good && code >= kLowest[size] && code <= 0x10FFFF && (code < 0xD800 || code > 0xDFFF);
-  text.remove_prefix(good ? size : 1);
-  return good ? code : kReplacement;
-}
-
 }  // namespace
 
 std::u16string FormatWide(const WCHAR* format, std::va_list arguments) {
   return Formatter(format, arguments).Run();
-}
-
-std::string ToUtf8(std::u16string_view text) {
-  std::string out;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    char32_t code = text[i];
-    const bool high = code >= 0xD800 && code < 0xDC00;
-    if (high && i + 1 < text.size() && (text[i + 1] & 0xFC00U) == 0xDC00) {
-      code = 0x10000 + ((code - 0xD800) << 10U) + (char32_t{text[++i]} - 0xDC00);
-    } else if (code >= 0xD800 && code < 0xE000) {
-      code = kReplacement;
-    }
-    AppendUtf8(out, code);
-  }
-  return out;
-}
-
-std::u16string ToUtf16(std::string_view text) {
-  std::u16string out;
-  while (!text.empty()) {
-    const char32_t code = TakeCharacter(text);
-    if (code < 0x10000) {
-      out += static_cast<char16_t>(code);
-    } else {
-      out += static_cast<char16_t>(0xD800 + ((code - 0x10000) >> 10U));
-      out += static_cast<char16_t>(0xDC00 + (code & 0x3FFU));
-    }
-  }
-  return out;
 }
 
 }  // namespace sim
