@@ -114,9 +114,7 @@ void UpgradeConfig::AddStopProcess(const char* program) noexcept {
 }
 
 void UpgradeConfig::AddDownloadFile(tagDownloadFile* file) noexcept {
-  ListKeeper::Take(download_files_, file, [this](tagDownloadFile* lost) {
-    if (lost != fields_.multicast_list) FreeRecord(lost);
-  });
+  ListKeeper::Take(download_files_, file, FreeRecord);
 }
 
 void UpgradeConfig::AddFirmwarePkg(FirmwarePackage* package) noexcept {
