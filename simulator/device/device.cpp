@@ -38,12 +38,16 @@ Device::Device(World& world, Profile profile, std::filesystem::path folder)
       network_(std::make_unique<Network>(*this)),
       screen_(std::make_unique<Screen>(*this)) {}
 
-Device::~Device() = default;
+// No thread may still use a part when it goes.
+Device::~Device() {
+  world_.EndThreads(*this);
+}
 
 Device& Device::Current(const char* what) {
   const SimThread* thread = World::Current();
   if (thread == nullptr || thread->device == nullptr) {
-    std::fprintf(stderr, "cesim: %s called by a thread that belongs to no simulated device\n", what);
+    std::fprintf(stderr, "cesim: %s called by a thread that belongs to no simulated device\n",
+                 what);
     std::abort();
   }
   return *thread->device;

@@ -30,6 +30,7 @@ class ApiCall {
  public:
   /// Counts the call and asks the device's faults about it. Ends the program, with the name of the
   /// call, when the calling thread belongs to no device.
+  /// @param name  a literal
   /// @param usual_error  last error of an injected failure whose rule names none; kCannotFail for
   ///   calls without a failure
   explicit ApiCall(const char* name, std::uint32_t usual_error = ERROR_GEN_FAILURE);
@@ -45,7 +46,8 @@ class ApiCall {
   [[nodiscard]] World& world() const;
   [[nodiscard]] SimThread& thread() const { return *thread_; }
 
-  // Arguments for the trace; nothing is formatted while the trace is off.
+  // Arguments for the trace; nothing is formatted while the trace is off. Name every argument that
+  // says what the call is about; an address as such (not a handle) shows as "address".
   void Argument(const char* name, const WCHAR* text);
   void Argument(const char* name, const char* text);
   void Argument(const char* name, std::int64_t value);
@@ -59,7 +61,7 @@ class ApiCall {
   template <typename T>
   T Return(T result) {
     if constexpr (std::is_pointer_v<T>) {
-      NoteResult(static_cast<std::int64_t>(reinterpret_cast<std::intptr_t>(result)));
+      NoteResult(reinterpret_cast<const void*>(result));
     } else {
       NoteResult(static_cast<std::int64_t>(result));
     }
@@ -75,6 +77,8 @@ class ApiCall {
 
  private:
   void NoteResult(std::int64_t result);
+  void NoteResult(const void* result);
+  void WriteTrace();
   void StartArgument(const char* name);
 
   const char* name_;
@@ -83,7 +87,8 @@ class ApiCall {
   bool failed_ = false;
   bool traced_ = false;
   std::uint32_t fault_error_ = 0;
-  std::int64_t result_ = 0;
+  const char* outer_call_ = nullptr;
+  std::string result_;  ///< of the trace line; empty for a call without result
   std::string arguments_;
 };
 

@@ -2,16 +2,21 @@
 #pragma once
 
 #include <cstdint>
-#include <map>
 #include <memory>
+#include <optional>
 #include <string>
+#include <unordered_map>
+#include <vector>
 
 #include "ce/types.h"
 #include "world/world.h"
 
 namespace sim {
 
-/// What a handle stands for. Guarded by the world's lock.
+class ObjectWait;
+
+/// What a handle stands for. Guarded by the world's lock, which is held, too, when the last
+/// reference goes: a destructor must not take it.
 class KernelObject {
  public:
   virtual ~KernelObject() = default;
@@ -19,16 +24,52 @@ class KernelObject {
   /// false.
   [[nodiscard]] virtual bool Signalled(const SimThread& thread) const;
   /// What a satisfied wait takes from the object (auto-reset event, semaphore count, ownership).
-  virtual void Take(SimThread& thread);
+  /// @return true when the object had been abandoned by its last owner.
+  virtual bool Take(SimThread& thread);
   [[nodiscard]] virtual bool waitable() const { return false; }
+  /// Notify this queue when Signalled may have become true: every waiter looks for itself.
+  [[nodiscard]] virtual WaitQueue& wait_queue() { return queue; }
+  /// The stricter way: ends the waits that the object can end now, oldest first, and takes from the
+  /// object what they take. A thread that arrives later cannot slip in before them.
+  void Offer();
 
-  /// Notified whenever Signalled may have become true.
   WaitQueue queue;
+
+ private:
+  friend class ObjectWait;
+  std::vector<ObjectWait*> waits_;  ///< oldest first
 };
 
+/// One thread's wait for handles, from its beginning to its end. Lock held throughout.
+class ObjectWait {
+ public:
+  using Objects = std::vector<std::shared_ptr<KernelObject>>;
+  ObjectWait(SimThread& thread, Objects objects, bool all);
+  ~ObjectWait();
+  ObjectWait(const ObjectWait&) = delete;
+  ObjectWait& operator=(const ObjectWait&) = delete;
+
+  /// Waits until one object (or all) is had, or `deadline` passes; none: no limit.
+  /// @return what WaitForMultipleObjects returns.
+  std::uint32_t Run(World& world, World::Lock& lock, std::optional<Micros> deadline);
+
+ private:
+  friend class KernelObject;
+  /// Takes what the wait is for, if it is there. @return true once the wait is over.
+  bool TrySatisfy();
+  [[nodiscard]] bool TakeAll();
+  [[nodiscard]] bool TakeFirst();
+
+  SimThread& thread_;
+  const Objects objects_;
+  const bool all_;
+  std::optional<std::uint32_t> result_;
+  WaitQueue satisfied_;
+};
+
+/// Lock held for all of these.
 class HandleTable {
  public:
-  /// Lock held for all of these.
   HANDLE Add(std::shared_ptr<KernelObject> object);
   [[nodiscard]] std::shared_ptr<KernelObject> Find(HANDLE handle) const;
   template <typename T>
@@ -40,7 +81,7 @@ class HandleTable {
   [[nodiscard]] std::size_t open_handles() const { return objects_.size(); }
 
  private:
-  std::map<std::uint32_t, std::shared_ptr<KernelObject>> objects_;
+  std::unordered_map<std::uint32_t, std::shared_ptr<KernelObject>> objects_;
   std::uint32_t next_ = 0x10;
 };
 

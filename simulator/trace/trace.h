@@ -1,7 +1,7 @@
 // The opt-in record of a device's API calls: one JSON line a call.
 #pragma once
 
-#include <cstdint>
+#include <atomic>
 #include <functional>
 #include <mutex>
 #include <string>
@@ -11,17 +11,22 @@ namespace sim {
 
 class Trace {
  public:
-  /// Every line, without its line end, goes to `sink`; an empty function turns the trace off.
+  /// Every line, without its line end, goes to `sink`; an empty function turns the trace off. The
+  /// sink is called by the thread that made the call, one at a time.
   void SetSink(std::function<void(std::string_view)> sink);
-  [[nodiscard]] bool on() const;
+  [[nodiscard]] bool on() const { return on_.load(std::memory_order_relaxed); }
   void Write(std::string_view line);
 
  private:
+  std::atomic<bool> on_{false};
   mutable std::mutex mutex_;
   std::function<void(std::string_view)> sink_;
 };
 
-/// Appends `text` as a JSON string, quotes included.
+/// Appends `text` as a JSON string, quotes included. Bytes above 127 appear as the character of the
+/// same number, as in the device's code page.
 void AppendJsonText(std::string& out, std::string_view text);
+/// The same for UTF-16.
+void AppendJsonText(std::string& out, std::u16string_view text);
 
 }  // namespace sim

@@ -1,8 +1,8 @@
 // What the simulator knows of one simulated thread.
 #pragma once
 
-#include <csetjmp>
 #include <condition_variable>
+#include <csetjmp>
 #include <cstdint>
 #include <functional>
 #include <string>
@@ -13,26 +13,45 @@
 
 namespace sim {
 
+/// Told, with the lock held, when a thread ends that it was registered with.
+class ThreadEndListener {
+ public:
+  virtual ~ThreadEndListener() = default;
+  virtual void ThreadEnded(SimThread& thread) = 0;
+};
+
 struct SimThread {
   enum class State : std::uint8_t { kSuspended, kReady, kRunning, kBlocked, kFinished };
 
   std::uint32_t id = 0;
+  World* world = nullptr;
   Device* device = nullptr;
   std::string name;
-  std::uint32_t last_error = 0;  ///< of this thread only; needs no lock
-  std::uint32_t exit_code = 0x103;
+  std::uint32_t last_error = 0;     ///< of this thread only; needs no lock
+  std::uint32_t exit_code = 0x103;  ///< "still active" until the thread has ended
   State state = State::kReady;
   bool terminate = false;
-  bool attached = false;  ///< a host thread that joined; it cannot be terminated
-  WaitQueue finished;     ///< notified when the thread has ended
+  bool attached = false;       ///< a host thread that joined; it cannot be terminated
+  bool leaving = false;        ///< its stack is being abandoned
+  const char* call = nullptr;  ///< the API call it is in
+  unsigned time_asked = 0;     ///< GetTickCount calls since it last waited
+  WaitQueue finished;          ///< notified when the thread has ended
+  /// Who else is told of the end, in this order. An entry leaves the list when it ends itself.
+  std::vector<ThreadEndListener*> end_listeners;
 
   // The world's own bookkeeping.
+  SimThread* outer = nullptr;  ///< the part that the host thread played when it attached again
+  std::uint32_t code_to_leave_with = 0;
   std::condition_variable wake;
   bool notified = false;
   bool timed_out = false;
+  bool polling = false;
   int wake_file = -1;  ///< event descriptor that interrupts a wait on host files
   std::vector<WaitQueue*> waits_on;
-  std::jmp_buf way_out;  ///< to the thread's first frame, for termination
+  Micros timer_due{};
+  std::uint64_t timer_number = 0;  ///< 0: no timer runs
+  std::jmp_buf way_out;            ///< to the thread's first frame, for termination
+  void* first_frame = nullptr;
   std::function<std::uint32_t()> body;
   std::thread host;
 };

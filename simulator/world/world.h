@@ -30,7 +30,8 @@ struct SimThread;
 using Micros = std::chrono::microseconds;
 
 /// A point where simulated threads wait to be woken: every object that can make a thread runnable
-/// owns one. Guarded by the world's lock; a thread may wait on several at once.
+/// owns one. Guarded by the world's lock; a thread may wait on several at once. Must not end while
+/// threads wait on it.
 class WaitQueue {
  public:
   WaitQueue() = default;
@@ -39,7 +40,6 @@ class WaitQueue {
   WaitQueue& operator=(const WaitQueue&) = delete;
 
  private:
-  friend class World;
   friend class WorldCore;
   std::vector<SimThread*> waiting_;
 };
@@ -81,7 +81,9 @@ class World {
   virtual Wake BlockOnFiles(Lock& lock, pollfd* files, std::size_t count, const Queues& queues,
                             std::optional<Micros> deadline) = 0;
 
-  /// Blocks until `ready()` holds. @return false when the deadline passed first.
+  /// Blocks until `ready()` holds. `ready` may have side effects (take what it waited for): it is
+  /// asked with the lock held and not again once it has held.
+  /// @return false when the deadline passed first.
   template <typename Predicate>
   bool WaitUntil(Lock& lock, const Queues& queues, std::optional<Micros> deadline,
                  Predicate ready) {
@@ -90,6 +92,10 @@ class World {
     }
     return true;
   }
+
+  /// For calls that only look whether something has happened: lets others run, and time pass, so
+  /// that a program which polls without a pause does not stop a virtual world.
+  void Yield(Lock& lock);
 
   /// Makes every thread that waits on `queue` look at its condition again. Lock held.
   virtual void Notify(WaitQueue& queue) = 0;
@@ -107,9 +113,20 @@ class World {
   /// Ends `thread` at its current or next blocking call (or before its first step). Lock held.
   virtual void Terminate(SimThread& thread, std::uint32_t exit_code) = 0;
 
-  /// Makes the calling host thread a simulated thread of `device` until Detach.
+  /// Makes the calling host thread a simulated thread of `device` until Detach. In a virtual world
+  /// it waits for its turn. Attaching again, to another device too, nests: until the inner Detach
+  /// the host thread plays the inner part only.
   virtual SimThread& Attach(Device& device, std::string name) = 0;
   virtual void Detach(SimThread& thread) = 0;
+
+  /// Terminates all threads of `device` but the attached ones and waits until they are gone. Ends
+  /// the program with a report when one of them never comes to a blocking call. Lock not held.
+  virtual void EndThreads(const Device& device) = 0;
+  /// Threads of `device` that have not ended, attached ones included. Lock held.
+  [[nodiscard]] virtual std::size_t LiveThreads(const Device& device) const = 0;
+  /// Every thread's name, state and API call, one a line: for whoever looks into a run that hangs.
+  /// Lock held.
+  [[nodiscard]] virtual std::string Report() const = 0;
 
   /// The simulated thread that is calling, null for a host thread that is not attached.
   static SimThread* Current();

@@ -114,7 +114,9 @@ void UpgradeConfig::AddStopProcess(const char* program) noexcept {
 }
 
 void UpgradeConfig::AddDownloadFile(tagDownloadFile* file) noexcept {
-  ListKeeper::Take(download_files_, file, FreeRecord);
+  ListKeeper::Take(download_files_, file, [this](tagDownloadFile* lost) {
+    if (lost != fields_.multicast_list) FreeRecord(lost);
+  });
 }
 
 void UpgradeConfig::AddFirmwarePkg(FirmwarePackage* package) noexcept {

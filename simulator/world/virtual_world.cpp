@@ -1,0 +1,147 @@
+// The world whose time costs nothing.
+//
+// One thread holds the baton and runs; it passes it on only where it blocks. Who is next is decided
+// by queues alone, never by the host, and so a run is a function of its seed.
+#include <atomic>
+#include <deque>
+
+#include "world/world_core.h"
+
+namespace sim {
+namespace {
+
+/// Far beyond any upgrade: a thread that retries for ever would otherwise keep a test busy for
+/// ever, because nothing it waits for takes any of the host's time.
+constexpr Micros kEndOfTime = std::chrono::hours(24 * 60);
+
+class VirtualWorld final : public WorldCore {
+ public:
+  explicit VirtualWorld(std::uint64_t seed) : WorldCore(seed) {}
+  ~VirtualWorld() override { EndAllThreads(); }
+
+  [[nodiscard]] bool is_virtual() const override { return true; }
+  [[nodiscard]] Micros now() const override {
+    return Micros(now_us_.load(std::memory_order_relaxed));
+  }
+
+  Wake Block(Lock& lock, const Queues& queues, std::optional<Micros> deadline) override {
+    SimThread& self = Caller("Block");
+    if (self.terminate) Leave(self);
+    self.state = SimThread::State::kBlocked;
+    self.timed_out = false;
+    self.time_asked = 0;
+    EnterQueues(self, queues);
+    if (deadline) StartTimer(self, *deadline);
+    PassBaton();
+    AwaitBaton(self, lock);
+    if (self.terminate) Leave(self);
+    return self.timed_out ? Wake::kTimeout : Wake::kNotified;
+  }
+
+  Wake BlockOnFiles(Lock& /*lock*/, pollfd* /*files*/, std::size_t /*count*/,
+                    const Queues& /*queues*/, std::optional<Micros> /*deadline*/) override {
+    Die("a wait on the host's files in a virtual world");
+  }
+
+  SimThread& Attach(Device& device, std::string name) override {
+    Lock lock = Acquire();
+    SimThread& self = NewAttached(device, std::move(name));
+    if (self.outer != nullptr && self.outer == running_) {
+      self.outer->state = SimThread::State::kBlocked;
+      self.state = SimThread::State::kRunning;
+      running_ = &self;
+    } else {
+      MakeReady(self);
+      AwaitBaton(self, lock);
+    }
+    return self;
+  }
+
+  void Detach(SimThread& thread) override {
+    const Lock lock = Acquire();
+    if (&Caller("Detach") != &thread) Die("a thread was detached by another");
+    SetCurrent(thread.outer);
+    Finish(thread, 0);
+    if (thread.outer != nullptr && thread.outer->world == this) {
+      running_ = thread.outer;
+      running_->state = SimThread::State::kRunning;
+    } else {
+      PassBaton();
+    }
+  }
+
+ protected:
+  void Wakeup(SimThread& thread) override {
+    LeaveQueues(thread);
+    StopTimer(thread);
+    MakeReady(thread);
+  }
+
+  void AwaitFirstTurn(SimThread& thread, Lock& lock) override { AwaitBaton(thread, lock); }
+
+  void Ended(SimThread& /*thread*/) override { PassBaton(); }
+
+  // The clock moves only when a thread gives up the baton.
+  void ActionAdded() override {}
+
+ private:
+  void MakeReady(SimThread& thread) {
+    thread.state = SimThread::State::kReady;
+    ready_.push_back(&thread);
+    if (running_ == nullptr && !passing_) PassBaton();
+  }
+
+  void AwaitBaton(SimThread& self, Lock& lock) const {
+    while (running_ != &self) self.wake.wait(lock);
+  }
+
+  /// Lets the next thread run, and moves the clock when none is ready.
+  void PassBaton() {
+    running_ = nullptr;
+    passing_ = true;
+    while (ready_.empty() && !timers().empty()) AdvanceClock();
+    passing_ = false;
+    if (ready_.empty()) {
+      DieWhenStuck();
+      return;
+    }
+    running_ = ready_.front();
+    ready_.pop_front();
+    running_->state = SimThread::State::kRunning;
+    running_->wake.notify_one();
+  }
+
+  /// To the earliest timer; everything due by then happens, in order.
+  void AdvanceClock() {
+    const Micros due = timers().begin()->first.first;
+    if (due > now()) now_us_.store(due.count(), std::memory_order_relaxed);
+    if (due > kEndOfTime) Die("the simulated clock ran away");
+    while (!timers().empty() && timers().begin()->first.first <= now()) {
+      const Timer timer = PopTimer();
+      if (timer.thread != nullptr) {
+        timer.thread->timed_out = true;
+        Wakeup(*timer.thread);
+      } else {
+        timer.action();
+      }
+    }
+  }
+
+  /// With no host thread attached a world may rest: one can still attach, or end it.
+  void DieWhenStuck() const {
+    if (AttachedThreads() > 0) Die("every simulated thread waits and nothing can wake one");
+  }
+
+  std::atomic<std::int64_t> now_us_{0};
+  SimThread* running_ = nullptr;
+  bool passing_ = false;
+  std::deque<SimThread*> ready_;
+};
+
+}  // namespace
+
+std::unique_ptr<World> World::MakeVirtual(std::uint64_t seed) {
+  return std::make_unique<VirtualWorld>(seed);
+}
+
+}  // namespace sim

@@ -1,0 +1,303 @@
+#include "world/world_core.h"
+
+#include <unistd.h>
+#include <unwind.h>
+
+#include <algorithm>
+#include <chrono>
+#include <cinttypes>
+#include <cstdio>
+#include <cstdlib>
+
+#include "device/device.h"
+#include "profile/profile.h"
+
+// Present only under the address sanitizer: abandoned frames leave marks on the stack.
+extern "C" __attribute__((weak)) void __asan_handle_no_return();
+
+namespace sim {
+namespace {
+
+thread_local SimThread* current_thread = nullptr;
+thread_local _Unwind_Exception abandon;
+
+/// How long, on the host's clock, threads may take to reach a blocking call when they are ended.
+constexpr std::chrono::seconds kEndPatience{60};
+
+void AbandonCaught(_Unwind_Reason_Code /*reason*/, _Unwind_Exception* /*exception*/) {
+  std::fputs("cesim: a catch (...) swallowed the termination of a simulated thread\n", stderr);
+  std::abort();
+}
+
+// Called for each frame on the way out. Frames that cannot be unwound end the walk early: what lies
+// above them is product code, which is not cleaned up anyway.
+_Unwind_Reason_Code StopAtFirstFrame(int /*version*/, _Unwind_Action actions,
+                                     _Unwind_Exception_Class /*kind*/,
+                                     _Unwind_Exception* /*exception*/, _Unwind_Context* context,
+                                     void* argument) {
+  auto& thread = *static_cast<SimThread*>(argument);
+  const bool at_end = (actions & _UA_END_OF_STACK) != 0;
+  if (at_end || _Unwind_GetCFA(context) > reinterpret_cast<std::uintptr_t>(thread.first_frame)) {
+    std::longjmp(thread.way_out, 1);
+  }
+  return _URC_NO_REASON;
+}
+
+const char* StateName(SimThread::State state) {
+  switch (state) {
+    case SimThread::State::kSuspended: return "suspended";
+    case SimThread::State::kReady: return "ready";
+    case SimThread::State::kRunning: return "running";
+    case SimThread::State::kBlocked: return "waiting";
+    case SimThread::State::kFinished: return "ended";
+  }
+  return "";
+}
+
+}  // namespace
+
+SimThread* World::Current() {
+  return current_thread;
+}
+
+void WorldCore::SetCurrent(SimThread* thread) {
+  current_thread = thread;
+}
+
+SimThread& WorldCore::Caller(const char* what) const {
+  SimThread* thread = current_thread;
+  if (thread == nullptr || thread->world != this) {
+    std::fprintf(stderr, "cesim: %s by a thread that is not of this world\n", what);
+    std::abort();
+  }
+  return *thread;
+}
+
+void WorldCore::EnterQueues(SimThread& thread, const Queues& queues) {
+  thread.waits_on = queues;
+  for (WaitQueue* queue : queues) queue->waiting_.push_back(&thread);
+}
+
+void WorldCore::LeaveQueues(SimThread& thread) {
+  for (WaitQueue* queue : thread.waits_on) {
+    auto& waiting = queue->waiting_;
+    waiting.erase(std::remove(waiting.begin(), waiting.end(), &thread), waiting.end());
+  }
+  thread.waits_on.clear();
+}
+
+void WorldCore::Notify(WaitQueue& queue) {
+  if (queue.waiting_.empty()) return;
+  // Taken out at once, so that many waiters do not search the list for themselves one by one.
+  const std::vector<SimThread*> woken = std::exchange(queue.waiting_, {});
+  for (SimThread* thread : woken) Wakeup(*thread);
+}
+
+// ---- timers ----
+
+void WorldCore::StartTimer(SimThread& thread, Micros due) {
+  thread.timer_due = due;
+  thread.timer_number = next_timer_++;
+  timers_.emplace(TimerKey{due, thread.timer_number}, Timer{&thread, nullptr});
+}
+
+void WorldCore::StopTimer(SimThread& thread) {
+  if (thread.timer_number == 0) return;
+  timers_.erase(TimerKey{thread.timer_due, thread.timer_number});
+  thread.timer_number = 0;
+}
+
+WorldCore::Timer WorldCore::PopTimer() {
+  const auto first = timers_.begin();
+  Timer timer = std::move(first->second);
+  if (timer.thread != nullptr) {
+    timer.thread->timer_number = 0;
+  } else {
+    action_due_.erase(first->first.second);
+  }
+  timers_.erase(first);
+  return timer;
+}
+
+std::uint64_t WorldCore::At(Micros when, std::function<void()> action) {
+  const std::uint64_t number = next_timer_++;
+  timers_.emplace(TimerKey{when, number}, Timer{nullptr, std::move(action)});
+  action_due_.emplace(number, when);
+  ActionAdded();
+  return number;
+}
+
+void WorldCore::Cancel(std::uint64_t action) {
+  const auto found = action_due_.find(action);
+  if (found == action_due_.end()) return;
+  timers_.erase(TimerKey{found->second, action});
+  action_due_.erase(found);
+}
+
+// ---- threads ----
+
+SimThread& WorldCore::NewThread(Device& device, std::string name) {
+  auto thread = std::make_unique<SimThread>();
+  thread->id = ++next_thread_id_;
+  thread->world = this;
+  thread->device = &device;
+  thread->name = std::move(name);
+  threads_.push_back(std::move(thread));
+  return *threads_.back();
+}
+
+SimThread& WorldCore::NewAttached(Device& device, std::string name) {
+  SimThread& thread = NewThread(device, std::move(name));
+  thread.attached = true;
+  thread.outer = current_thread;
+  current_thread = &thread;
+  ++attached_;
+  return thread;
+}
+
+SimThread& WorldCore::Spawn(Device& device, std::string name, std::function<std::uint32_t()> body,
+                            bool suspended) {
+  JoinEnded();
+  SimThread& thread = NewThread(device, std::move(name));
+  thread.body = std::move(body);
+  thread.state = SimThread::State::kSuspended;
+  try {
+    thread.host = std::thread([this, &thread] { ThreadMain(thread); });
+  } catch (...) {
+    threads_.pop_back();
+    throw;
+  }
+  if (!suspended) Resume(thread);
+  return thread;
+}
+
+void WorldCore::Resume(SimThread& thread) {
+  if (thread.state == SimThread::State::kSuspended) Wakeup(thread);
+}
+
+void WorldCore::Terminate(SimThread& thread, std::uint32_t exit_code) {
+  if (thread.attached || thread.terminate || thread.state == SimThread::State::kFinished) return;
+  thread.terminate = true;
+  thread.code_to_leave_with = exit_code;
+  if (thread.state == SimThread::State::kSuspended || thread.state == SimThread::State::kBlocked) {
+    Wakeup(thread);
+  }
+}
+
+void WorldCore::ThreadMain(SimThread& thread) {
+  SetCurrent(&thread);
+  Lock lock = Acquire();
+  AwaitFirstTurn(thread, lock);
+  if (!thread.terminate) {
+    lock.unlock();
+    RunBody(thread);
+    lock.lock();
+  }
+  thread.body = nullptr;
+  if (thread.wake_file >= 0) close(thread.wake_file);
+  thread.wake_file = -1;
+  Finish(thread, thread.code_to_leave_with);
+  ended_.push_back(&thread);
+  thread_ended_.notify_all();
+  Ended(thread);
+}
+
+__attribute__((noinline)) void WorldCore::RunBody(SimThread& thread) {
+  thread.first_frame = __builtin_frame_address(0);
+  if (setjmp(thread.way_out) != 0) return;
+  const std::uint32_t code = thread.body();
+  if (!thread.terminate) thread.code_to_leave_with = code;
+}
+
+void WorldCore::Leave(SimThread& thread) {
+  thread.leaving = true;
+  if (__asan_handle_no_return != nullptr) __asan_handle_no_return();
+  abandon = {};
+  abandon.exception_cleanup = AbandonCaught;
+  _Unwind_ForcedUnwind(&abandon, StopAtFirstFrame, &thread);
+  std::longjmp(thread.way_out, 1);
+}
+
+void WorldCore::Finish(SimThread& thread, std::uint32_t exit_code) {
+  thread.state = SimThread::State::kFinished;
+  thread.exit_code = exit_code;
+  thread.call = nullptr;
+  if (thread.attached) --attached_;
+  const std::vector<ThreadEndListener*> listeners = std::exchange(thread.end_listeners, {});
+  for (ThreadEndListener* listener : listeners) listener->ThreadEnded(thread);
+  Notify(thread.finished);
+}
+
+// A thread on this list has given up the lock for the last time, so joining it under the lock ends.
+void WorldCore::JoinEnded() {
+  for (SimThread* thread : ended_) thread->host.join();
+  ended_.clear();
+}
+
+// ---- ends ----
+
+void WorldCore::EndThreadsWhere(const std::function<bool(const SimThread&)>& chosen) {
+  Lock lock = Acquire();
+  std::vector<SimThread*> ending;
+  for (const auto& thread : threads_) {
+    const bool done = thread->state == SimThread::State::kFinished;
+    if (done || thread->attached || thread.get() == current_thread || !chosen(*thread)) continue;
+    ending.push_back(thread.get());
+    Terminate(*thread, 0);
+  }
+  const bool of_this_world = current_thread != nullptr && current_thread->world == this;
+  for (SimThread* thread : ending) {
+    const auto gone = [thread] { return thread->state == SimThread::State::kFinished; };
+    if (of_this_world) {
+      WaitUntil(lock, {&thread->finished}, std::nullopt, gone);
+    } else if (!thread_ended_.wait_for(lock, kEndPatience, gone)) {
+      Die("a thread that was to end never came to a blocking call");
+    }
+  }
+  JoinEnded();
+}
+
+void WorldCore::EndThreads(const Device& device) {
+  EndThreadsWhere([&device](const SimThread& thread) { return thread.device == &device; });
+}
+
+void WorldCore::EndAllThreads() {
+  EndThreadsWhere([](const SimThread&) { return true; });
+  const Lock lock = Acquire();
+  for (const auto& thread : threads_) {
+    if (thread->state != SimThread::State::kFinished) Die("a world ended with a thread attached");
+  }
+}
+
+std::size_t WorldCore::LiveThreads(const Device& device) const {
+  return static_cast<std::size_t>(
+      std::count_if(threads_.begin(), threads_.end(), [&device](const auto& thread) {
+        return thread->device == &device && thread->state != SimThread::State::kFinished;
+      }));
+}
+
+std::string WorldCore::Report() const {
+  std::string report;
+  for (const auto& thread : threads_) {
+    if (thread->state == SimThread::State::kFinished) continue;
+    char line[256];
+    std::snprintf(line, sizeof line, "  %u \"%s\": %s in %s", thread->id, thread->name.c_str(),
+                  StateName(thread->state), thread->call != nullptr ? thread->call : "no call");
+    report += line;
+    if (thread->timer_number != 0) {
+      std::snprintf(line, sizeof line, " until %" PRId64 " us",
+                    static_cast<std::int64_t>(thread->timer_due.count()));
+      report += line;
+    }
+    report += '\n';
+  }
+  return report;
+}
+
+void WorldCore::Die(const char* why) const {
+  std::fprintf(stderr, "cesim: %s at %" PRId64 " us\n%s", why,
+               static_cast<std::int64_t>(now().count()), Report().c_str());
+  std::abort();
+}
+
+}  // namespace sim

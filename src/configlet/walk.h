@@ -1,0 +1,84 @@
+// Where the host stands in its settings tree, and what it is filling there.
+#pragma once
+
+#include <coredll.h>
+
+#include <utility>
+
+#include "base/text.h"
+#include "device/lock.h"
+#include "orvenix/upgrade_config.h"
+
+namespace configlet {
+
+/// A record that the host fills before and, because it may go on, after the job has taken it over.
+/// Until then it is freed here.
+template <typename Record>
+class CurrentRecord {
+ public:
+  [[nodiscard]] Record* get() const noexcept { return record_; }
+
+  /// Makes a new record, all zero. @return null, with nothing current, when there is no memory.
+  Record* Begin() noexcept {
+    Forget();
+    record_ = static_cast<Record*>(LocalAlloc(LPTR, sizeof(Record)));
+    is_ours_ = record_ != nullptr;
+    return record_;
+  }
+
+  /// Notes that the job owns the record now. It stays current.
+  void HandedOver() noexcept { is_ours_ = false; }
+
+  void Forget() noexcept {
+    if (is_ours_) LocalFree(record_);
+    record_ = nullptr;
+    is_ours_ = false;
+  }
+
+  /// To be called before the job's records are freed.
+  void ForgetJobs() noexcept {
+    if (!is_ours_) record_ = nullptr;
+  }
+
+ private:
+  Record* record_ = nullptr;
+  bool is_ours_ = false;
+};
+
+/// The module's state between the host's calls. Touched by the host's thread only, except that an
+/// upgrade thread takes away what it frees; hold a WalkLock for `job` and the current records.
+struct Walk {
+  base::FixedText<128> group;    ///< begun most recently; its end does not bring the parent back
+  UpgradeConfig* job = nullptr;  ///< being filled, and still after it was started
+  bool in_file_list = false;
+  bool in_disk_cleanup = false;
+  bool in_download = false;
+  bool in_start_process = false;
+  CurrentRecord<tagDownloadFile> download_file;
+  CurrentRecord<tagStorageReq> storage;
+  CurrentRecord<tagRegistryTest> registry_test;
+  base::FixedText<260> cleanup_name;
+  char cleanup_action = kNoAction;
+
+  static constexpr char kNoAction = ' ';
+  static constexpr char kDelete = 'D';
+  static constexpr char kSave = 'S';
+};
+
+/// The one walk of this module.
+Walk& TheWalk() noexcept;
+
+/// Keeps the upgrade thread from freeing the job. Without a handle for the lock the call goes on
+/// unguarded: only a host that goes on filling a job which it has started could be hurt.
+class WalkLock {
+ public:
+  WalkLock() noexcept : guard_("Configlet") {}
+
+ private:
+  device::LockGuard guard_;
+};
+
+/// Forgets a job that its upgrade thread is about to free, and its records.
+void ForgetJob(const UpgradeConfig* job) noexcept;
+
+}  // namespace configlet

@@ -1,0 +1,22 @@
+// Where the host wants its status documents.
+#pragma once
+
+#include <cstdint>
+
+struct IcfgCallbacks;
+
+namespace report {
+
+struct HostCallbacks {
+  std::uintptr_t context = 0;            ///< the host's own value
+  const IcfgCallbacks* table = nullptr;  ///< the host's, null until it has set one
+};
+
+/// Remembers both for the life of the process. The host's thread.
+void SetHostCallbacks(HostCallbacks callbacks) noexcept;
+
+/// Any thread. A host that changes its table while an upgrade runs may see its new context with
+/// its old table once.
+[[nodiscard]] HostCallbacks GetHostCallbacks() noexcept;
+
+}  // namespace report
