@@ -10,29 +10,29 @@
 namespace sim {
 
 struct VolumeProfile {
-  std::string path;             ///< "\\", "\\Flash File Store", "\\SDMMC Disk", ...
-  std::uint64_t capacity = 0;   ///< bytes; the root's is the object store's, from the memory model
+  std::string path;            ///< "\\", "\\Flash File Store", "\\SDMMC Disk", ...
+  std::uint64_t capacity = 0;  ///< bytes; the root's is the object store's, from the memory model
   bool present = true;
 };
 
 /// What CreateProcessW of a device program does.
 struct ProgramProfile {
-  std::string command;          ///< host command (the device's folder in ORVENIX_DEVICE); empty: built in
+  std::string command;  ///< host command (the device's folder in ORVENIX_DEVICE); empty: built in
   std::uint32_t exit_code = 0;  ///< of the built-in
   std::uint32_t run_ms = 0;     ///< how long the built-in runs
 };
 
 struct ProcessProfile {
-  std::string name;             ///< executable name as the snapshot shows it
+  std::string name;  ///< executable name as the snapshot shows it
 };
 
 struct Profile {
   std::string name = "handheld";
 
   // Identity.
-  std::string platform = "Corvanta MR7";  ///< empty: the platform does not say
-  std::string configuration = "TQ52-A1";  ///< configuration text
-  std::string serial = "MR700123";        ///< text serial, on platforms that have one
+  std::string platform = "Corvanta MR7";    ///< empty: the platform does not say
+  std::string configuration = "TQ52-A1";    ///< configuration text
+  std::string serial = "MR700123";          ///< text serial, on platforms that have one
   std::string network_id = "5E4D3C2B1A00";  ///< six bytes in the order the platform returns them
   std::uint32_t os_major = 5;
   std::uint32_t os_minor = 0;
@@ -48,11 +48,11 @@ struct Profile {
 
   // Memory, in pages.
   std::uint32_t page_size = 4096;
-  std::uint32_t store_pages = 24576;     ///< 96 MiB object store
-  std::uint32_t ram_pages = 8192;        ///< 32 MiB program memory
-  std::uint32_t ram_used_pages = 2048;   ///< of program memory, before this program's own blocks
+  std::uint32_t store_pages = 24576;    ///< 96 MiB object store
+  std::uint32_t ram_pages = 8192;       ///< 32 MiB program memory
+  std::uint32_t ram_used_pages = 2048;  ///< of program memory, before this program's own blocks
 
-  std::vector<VolumeProfile> volumes;    ///< besides the root
+  std::vector<VolumeProfile> volumes;  ///< besides the root
 
   // Power.
   std::uint8_t ac_line = 1;
