@@ -6,7 +6,7 @@
 namespace base {
 namespace {
 
-/// Counts what does not fit instead of writing it.
+/// Takes characters as long as there is room and drops the rest.
 class Sink {
  public:
   Sink(char* out, std::size_t capacity) noexcept : out_(out), room_(capacity - 1) {}
@@ -31,6 +31,10 @@ class Sink {
   std::size_t used_ = 0;
 };
 
+constexpr const char* kLower = "0123456789abcdef";
+constexpr const char* kUpper = "0123456789ABCDEF";
+
+/// What stands between a '%' and its letter.
 struct Conversion {
   bool left = false;
   bool zeros = false;
@@ -80,67 +84,89 @@ const char* ReadSize(const char* at, std::size_t& value) noexcept {
   return at;
 }
 
+/// Lets functions share one walk over the arguments: a va_list itself may be an array or a record.
+struct Arguments {
+  va_list list;
+};
+
+const char* ReadWidth(const char* at, Conversion& how, Arguments& arguments) noexcept {
+  if (*at != '*') return ReadSize(at, how.width);
+  const int width = va_arg(arguments.list, int);
+  how.left = how.left || width < 0;
+  how.width = width < 0 ? 0U - static_cast<unsigned>(width) : static_cast<unsigned>(width);
+  return at + 1;
+}
+
+const char* ReadPrecision(const char* at, Conversion& how, Arguments& arguments) noexcept {
+  if (*at != '.') return at;
+  how.has_precision = true;
+  if (*++at != '*') return ReadSize(at, how.precision);
+  const int precision = va_arg(arguments.list, int);
+  how.has_precision = precision >= 0;
+  how.precision = precision < 0 ? 0 : static_cast<std::size_t>(precision);
+  return at + 1;
+}
+
+/// Reads what stands between a '%' and its letter. @return the letter's place.
+const char* ReadConversion(const char* at, Conversion& how, Arguments& arguments) noexcept {
+  for (; *at == '-' || *at == '0'; ++at) (*at == '-' ? how.left : how.zeros) = true;
+  at = ReadWidth(at, how, arguments);
+  at = ReadPrecision(at, how, arguments);
+  while (*at == 'l' || *at == 'h') ++at;
+  return at;
+}
+
+void PutSigned(Sink& sink, const Conversion& how, std::int32_t value) noexcept {
+  const auto bits = static_cast<std::uint32_t>(value);
+  PutNumber(sink, how, value < 0 ? 0U - bits : bits, 10, kLower, value < 0);
+}
+
+/// @return false, with no argument taken, when the letter is unknown.
+bool PutConversion(Sink& sink, const Conversion& how, char letter, Arguments& arguments) noexcept {
+  switch (letter) {
+    case 'd':
+    case 'i': PutSigned(sink, how, va_arg(arguments.list, std::int32_t)); return true;
+    case 'u':
+      PutNumber(sink, how, va_arg(arguments.list, std::uint32_t), 10, kLower, false);
+      return true;
+    case 'x':
+      PutNumber(sink, how, va_arg(arguments.list, std::uint32_t), 16, kLower, false);
+      return true;
+    case 'X':
+      PutNumber(sink, how, va_arg(arguments.list, std::uint32_t), 16, kUpper, false);
+      return true;
+    case 's': PutText(sink, how, va_arg(arguments.list, const char*)); return true;
+    case 'c': {
+      const char c = static_cast<char>(va_arg(arguments.list, int));
+      PutPadded(sink, how, "", &c, 1);
+      return true;
+    }
+    case '%': sink.Put('%'); return true;
+    default: return false;
+  }
+}
+
 }  // namespace
 
 std::size_t FormatV(char* out, std::size_t capacity, const char* format,
                     va_list arguments) noexcept {
   if (capacity == 0) return 0;
-  constexpr const char* kLower = "0123456789abcdef";
-  constexpr const char* kUpper = "0123456789ABCDEF";
+  Arguments rest;
+  va_copy(rest.list, arguments);
   Sink sink(out, capacity);
   for (const char* at = format; *at != '\0'; ++at) {
     if (*at != '%') {
       sink.Put(*at);
       continue;
     }
-    const char* const start = at++;
+    const char* const start = at;
     Conversion how;
-    for (; *at == '-' || *at == '0'; ++at) (*at == '-' ? how.left : how.zeros) = true;
-    if (*at == '*') {
-      const int width = va_arg(arguments, int);
-      how.left = how.left || width < 0;
-      how.width = static_cast<std::size_t>(width < 0 ? 0U - static_cast<unsigned>(width)
-                                                     : static_cast<unsigned>(width));
-      ++at;
-    } else {
-      at = ReadSize(at, how.width);
-    }
-    if (*at == '.') {
-      how.has_precision = true;
-      ++at;
-      if (*at == '*') {
-        const int precision = va_arg(arguments, int);
-        how.has_precision = precision >= 0;
-        how.precision = precision < 0 ? 0 : static_cast<std::size_t>(precision);
-        ++at;
-      } else {
-        at = ReadSize(at, how.precision);
-      }
-    }
-    while (*at == 'l' || *at == 'h') ++at;
-    switch (*at) {
-      case 'd':
-      case 'i': {
-        const std::int32_t value = va_arg(arguments, std::int32_t);
-        const std::uint32_t magnitude =
-            value < 0 ? 0U - static_cast<std::uint32_t>(value) : static_cast<std::uint32_t>(value);
-        PutNumber(sink, how, magnitude, 10, kLower, value < 0);
-        break;
-      }
-      case 'u': PutNumber(sink, how, va_arg(arguments, std::uint32_t), 10, kLower, false); break;
-      case 'x': PutNumber(sink, how, va_arg(arguments, std::uint32_t), 16, kLower, false); break;
-      case 'X': PutNumber(sink, how, va_arg(arguments, std::uint32_t), 16, kUpper, false); break;
-      case 's': PutText(sink, how, va_arg(arguments, const char*)); break;
-      case 'c': {
-        const char c = static_cast<char>(va_arg(arguments, int));
-        PutPadded(sink, how, "", &c, 1);
-        break;
-      }
-      case '%': sink.Put('%'); break;
-      case '\0': --at; [[fallthrough]];
-      default: sink.Put(start, static_cast<std::size_t>(at - start) + 1); break;
-    }
+    at = ReadConversion(start + 1, how, rest);
+    if (PutConversion(sink, how, *at, rest)) continue;
+    if (*at == '\0') --at;
+    sink.Put(start, static_cast<std::size_t>(at - start) + 1);
   }
+  va_end(rest.list);
   return sink.Finish();
 }
 
