@@ -1,0 +1,236 @@
+#include "upgrade/upgrade_thread.h"
+
+#include <coredll.h>
+
+#include <atomic>
+
+#include "configlet/version/version.h"
+#include "device/handle.h"
+#include "http/job_client.h"
+#include "orvenix/upgrade_thread.h"
+#include "report/log/log.h"
+#include "report/window/progress_window.h"
+#include "upgrade/file_lists.h"
+#include "upgrade/keep_awake.h"
+#include "upgrade/memory_division.h"
+#include "upgrade/pass_state.h"
+#include "upgrade/phases.h"
+#include "upgrade/progress.h"
+#include "upgrade/ram_allocation.h"
+#include "upgrade/run.h"
+#include "upgrade/run_state/run_state.h"
+#include "upgrade/storage_card.h"
+#include "upgrade/turn.h"
+
+namespace upgrade {
+namespace {
+
+using report::Log;
+using report::SetOverallProgress;
+using report::ShowStatus;
+
+/// How long a host waits, at most, for the end of an earlier job.
+constexpr std::uint32_t kHostWaitMs = 10000;
+constexpr DWORD kPauseMs = 2000;
+
+std::atomic<void (*)(const UpgradeConfig*)> job_freed_listener{nullptr};
+
+/// The event that other programs of the device look for while an upgrade runs.
+class InProgressEvent {
+ public:
+  InProgressEvent() noexcept
+      : event_(CreateEventW(nullptr, FALSE, FALSE, TEXT("TW_UPGRADE_IN_PROGRESS"))) {
+    if (event_) {
+      Log("Orvenix - CretaeUpgradeInProgressEvent - Success\r\n");
+    } else {
+      Log("Orvenix - CretaeUpgradeInProgressEvent - error, %d\r\n",
+          static_cast<int>(GetLastError()));
+    }
+  }
+
+  void Delete() noexcept {
+    event_.Reset();
+    Log("Orvenix - DeleteUpgradeInProgressEvent\r\n");
+  }
+
+ private:
+  device::EventHandle event_;
+};
+
+/// Forgets what an earlier job counted. What this job is expected to bring was set before.
+void ResetCounters(std::int32_t mode) noexcept {
+  http::BundleRx.store(0, std::memory_order_relaxed);
+  http::HttpFallback.store(mode == 0 ? 1 : 0, std::memory_order_relaxed);
+  ResetReceivedBytes();
+}
+
+void PauseForTheEye(const UpgradeConfig& job) noexcept {
+  if (job.GetShowGUI() == 1) Sleep(kPauseMs);
+}
+
+/// Everything by HTTP, for a caller from outside the configlet.
+void RunAsUpgradeClient(Run& run) noexcept {
+  Log("UpgradeClient Mode...");
+  CountFiles(run);
+  SetMemoryDivision(0.9);
+  ReadRamAllocation(run);
+  Log("Processing OS files...");
+  ShowStatus("Processing OS files");
+  FetchOsFiles(run);
+  Log("Processing INF files\r\n");
+  ShowStatus("Processing INF files...");
+  FetchInfFiles(run, InfMode::kFetch);
+  PauseForTheEye(run.job);
+  Log("Processing misc files\r\n");
+  ShowStatus("Processing misc files...");
+  FetchMiscFiles(run);
+  PauseForTheEye(run.job);
+}
+
+/// Only what the multicast transfer did not bring.
+void RunAsMulticastFallback(Run& run) noexcept {
+  Log("Multicast Fallback Mode...");
+  run.files_to_fetch = 1;
+  Log("Orvenix - UpgradeThread - Validate Files\r\n");
+  ShowStatus("Validating files");
+  ValidateFiles(run);
+  Log("Orvenix - Rename settings file\r\n");
+  ApplyRenames(run.job);
+}
+
+/// A job that is through, or has failed, begins at its first pass the next time.
+void KeepOrDeletePassState(const Run& run) noexcept {
+  if (run.job.IsMultiPass() == 0 || !run.succeeded) {
+    DeletePassState(run.job);
+  } else if (run.job.GetFamily()[0] == '7' && run.pass == 1) {
+    ShowStatus("Saving Network Parms...");
+  }
+}
+
+void ShowOutcome(const Run& run) noexcept {
+  if (run.succeeded) {
+    Log("Local Upgrade Executing\r\n");
+    Sleep(kPauseMs);
+    return;
+  }
+  ShowStatus("%s", run.error_text.c_str());
+  Log("%s\r\n", run.error_text.c_str());
+}
+
+/// From the job's first step to its report.
+void CarryOut(Run& run, std::int32_t mode) noexcept {
+  SetOverallProgress(2);
+  run.pass = BeginPass(run.job);
+  Log("Orvenix - UpgradeThread - InitRAM\r\n");
+  InitRam(run.job);
+  run.storage_card = ProbeStorageCards(run.job, run.pass);
+  if (mode != 0) {
+    RunAsUpgradeClient(run);
+  } else {
+    RunAsMulticastFallback(run);
+  }
+  KeepOrDeletePassState(run);
+  Log("Orvenix - SendUpgradeComplete\r\n");
+  http::SendUpgradeComplete(run.job, run.error_text.c_str());
+  ShowOutcome(run);
+}
+
+void ShowEnd() noexcept {
+  Log("Orvenix - UpgradeThread - Exiting\r\n");
+  ShowStatus("Upgrade Complete");
+  SetOverallProgress(100);
+  report::RepaintWindow();
+  report::CloseLogFile();
+  Sleep(kPauseMs);
+  Sleep(2 * kPauseMs);
+}
+
+void FreeJob(UpgradeConfig* job) noexcept {
+  ForgetJob(job);
+  const auto listener = job_freed_listener.load(std::memory_order_relaxed);
+  if (listener != nullptr) listener(job);
+  delete job;
+}
+
+/// One job, from beginning to end.
+void RunJob(UpgradeConfig* job, std::int32_t mode) noexcept {
+  Run run(*job);
+  ResetCounters(mode);
+  configlet::WriteVersionFiles();
+  report::SetSyslogTarget(job->GetSysLogPort(), job->GetSysLogIP());
+  Log("Orvenix thread - Started\r\n");
+  ShowStatus("Upgrade Initialization...");
+  InProgressEvent in_progress;
+  LightRequirement light;
+  KeepAwake keep_awake;
+  CarryOut(run, mode);
+  ShowEnd();
+  EndUpgrade();  // from here on the host may hand over the next job; it begins when this thread
+                 // ends
+  light.Release();
+  keep_awake.Stop();
+  in_progress.Delete();
+  http::ReleaseJobClient();
+  Sleep(kPauseMs);
+  FreeJob(job);
+  report::CloseProgressWindow();
+}
+
+/// Opens the progress window for the job that runs next.
+void Present(const UpgradeConfig& job, std::int32_t mode) noexcept {
+  if (mode != 0) {
+    report::ShowCaption(job.GetMfgString(), job.GetSerialNumber());
+    report::RepaintWindow();
+  }
+  const bool shown = job.GetShowGUI() == 1;
+  const report::GuiStart start = {nullptr, shown ? SW_SHOWNORMAL : SW_HIDE};
+  report::StartGUI(&start);
+  if (shown) report::ShowProgressWindow();
+}
+
+DWORD WINAPI UpgradeThread(void* argument) {
+  const auto number = static_cast<std::uint32_t>(reinterpret_cast<std::uintptr_t>(argument));
+  AwaitTurn(number, INFINITE);
+  const Handover handed = HandoverOf(number);
+  if (handed.job != nullptr) {
+    if (!handed.presented) Present(*handed.job, handed.mode);
+    RunJob(handed.job, handed.mode);
+  }
+  EndTurn(number);
+  return 0;
+}
+
+/// @return the thread's handle, null when it could not be made.
+HANDLE StartThread(std::uint32_t number) noexcept {
+  HANDLE const thread =
+      CreateThread(nullptr, 0, UpgradeThread,
+                   reinterpret_cast<void*>(static_cast<std::uintptr_t>(number)), 0, nullptr);
+  if (thread != nullptr) return thread;
+  if (HandoverOf(number).presented) report::CloseProgressWindow();
+  GiveNumberBack(number);
+  return nullptr;
+}
+
+}  // namespace
+
+void SetJobFreedListener(void (*listener)(const UpgradeConfig* job)) noexcept {
+  job_freed_listener.store(listener, std::memory_order_relaxed);
+}
+
+}  // namespace upgrade
+
+extern "C" void* StartUpgradeThread(UpgradeConfig* config, std::int32_t mode) noexcept {
+  using namespace upgrade;
+  const std::uint32_t number = config == nullptr ? 0 : TakeNumber(config, mode);
+  if (number == 0) return nullptr;
+  // While an earlier job runs on, its window stays; the thread then opens one when its turn comes.
+  if (AwaitTurn(number, kHostWaitMs)) {
+    if (HandoverOf(number).job == nullptr) {
+      GiveNumberBack(number);
+      return nullptr;
+    }
+    Present(*config, mode);
+    NotePresented(number);
+  }
+  return StartThread(number);
+}
