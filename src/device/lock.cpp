@@ -12,8 +12,8 @@ using MutexName = base::WideFixedText<64>;
 
 MutexName NameOf(const char* name) noexcept {
   char narrow[MutexName::capacity()];
-  const std::size_t length =
-      base::Format(narrow, sizeof narrow, "Orvenix.%.32s.%x", name, GetCurrentProcessId());
+  const std::size_t length = base::Format(narrow, sizeof narrow, "Orvenix.%.32s.%x", name,
+                                          static_cast<std::uint32_t>(GetCurrentProcessId()));
   MutexName wide;
   for (std::size_t i = 0; i < length; ++i) wide.data()[i] = static_cast<WCHAR>(narrow[i]);
   return wide;

@@ -7,6 +7,7 @@
 #include <cstdint>
 
 #include "base/text.h"
+#include "device/local_memory.h"
 
 namespace mcftp {
 
@@ -16,6 +17,23 @@ using AddressText = base::FixedText<16>;
 /// The address in network order, or INADDR_NONE when `text` is null, empty or no IPv4 address.
 /// "255.255.255.255" is not accepted either, because its number is INADDR_NONE.
 [[nodiscard]] std::uint32_t ParseAddress(const char* text) noexcept;
+
+/// A reference to Windows Sockets 1.1: started for as long as somebody holds one.
+class SocketLibrary {
+ public:
+  SocketLibrary() noexcept = default;
+  ~SocketLibrary() { Stop(); }
+  SocketLibrary(const SocketLibrary&) = delete;
+  SocketLibrary& operator=(const SocketLibrary&) = delete;
+
+  /// Does nothing when this object holds a reference already.
+  [[nodiscard]] bool Start() noexcept;
+  void Stop() noexcept;
+  [[nodiscard]] bool is_started() const noexcept { return started_; }
+
+ private:
+  bool started_ = false;
+};
 
 /// One UDP socket with an IPv4 address and port: where it is bound to, or whom it sends to.
 ///
@@ -34,6 +52,7 @@ class UdpEndpoint {
   /// @return false when there was no socket or closing failed; there is none afterwards.
   bool Close() noexcept;
   [[nodiscard]] bool is_open() const noexcept { return socket_ != INVALID_SOCKET; }
+  [[nodiscard]] SOCKET handle() const noexcept { return socket_; }
 
   /// Lets several sockets of the machine bind the same port.
   [[nodiscard]] bool AllowAddressReuse() noexcept;
@@ -63,7 +82,7 @@ class UdpEndpoint {
   bool SendTo(const UdpEndpoint& target, const void* bytes, std::uint16_t length) noexcept;
 
  private:
-  friend class UdpNetwork;
+  bool ChangeMembership(int option, std::uint32_t group) noexcept;
 
   SOCKET socket_ = INVALID_SOCKET;
   sockaddr_in address_;
@@ -80,19 +99,16 @@ struct Datagram {
   [[nodiscard]] explicit operator bool() const noexcept { return bytes != nullptr; }
 };
 
-/// Windows Sockets itself, the host's own name and address, and receiving, which needs to know
+/// The host's own name and address, and receiving, which needs to know
 /// them.
 class UdpNetwork {
  public:
   UdpNetwork() noexcept = default;
-  ~UdpNetwork();
-  UdpNetwork(const UdpNetwork&) = delete;
-  UdpNetwork& operator=(const UdpNetwork&) = delete;
 
-  /// Starts Windows Sockets 1.1 for as long as this object lives or until Stop, and learns the
-  /// host's names and address. A host that does not know its own address starts all the same.
+  /// Starts Windows Sockets for as long as this object lives or until Stop, and learns the host's
+  /// names and address. A host that does not know its own address starts all the same.
   [[nodiscard]] bool Start() noexcept;
-  void Stop() noexcept;
+  void Stop() noexcept { library_.Stop(); }
 
   /// The host's name, empty when unknown.
   [[nodiscard]] const char* host_name() const noexcept { return host_name_.c_str(); }
@@ -113,12 +129,15 @@ class UdpNetwork {
 
  private:
   void LearnOwnIdentity() noexcept;
+  /// Takes what made the socket readable. @return its length, 0 for an empty datagram, -1 when
+  ///   there is none.
+  int TakeDatagram(const UdpEndpoint& endpoint, sockaddr_in& sender) noexcept;
 
-  bool started_ = false;
+  SocketLibrary library_;
   std::uint32_t own_address_ = 0;  ///< network order; 0 filters nothing
   base::FixedText<128> host_name_;
   base::FixedText<256> full_name_;
-  std::uint8_t* buffer_ = nullptr;  ///< LocalAlloc; made by the first Receive
+  device::LocalBlock<std::uint8_t> buffer_;  ///< made by the first Receive
 };
 
 }  // namespace mcftp
