@@ -37,8 +37,8 @@ ApiCall::ApiCall(const char* name, std::uint32_t usual_error)
     std::abort();
   }
   device_ = thread_->device;
-  outer_call_ = thread_->call;
-  thread_->call = name;
+  outer_call_ = thread_->call.load(std::memory_order_relaxed);
+  thread_->call.store(name, std::memory_order_relaxed);
   traced_ = device_->trace().on();
   const bool can_fail = usual_error != kCannotFail;
   failed_ = device_->faults().Enter(name, can_fail, usual_error, fault_error_);
@@ -46,7 +46,7 @@ ApiCall::ApiCall(const char* name, std::uint32_t usual_error)
 }
 
 ApiCall::~ApiCall() {
-  thread_->call = outer_call_;
+  thread_->call.store(outer_call_, std::memory_order_relaxed);
   if (traced_) WriteTrace();
 }
 

@@ -41,13 +41,24 @@ std::optional<Micros> Deadline(const World& world, DWORD timeout_ms) {
   return world.now() + std::chrono::milliseconds(timeout_ms);
 }
 
+/// A loop around a wait that fails at once would otherwise never let go.
+DWORD FailedWait(ApiCall& call, DWORD error, World::Lock& lock) {
+  call.world().Yield(lock);
+  return call.Fail(error, WAIT_FAILED);
+}
+
+DWORD FailedWait(ApiCall& call, DWORD error) {
+  World::Lock lock = call.world().Acquire();
+  return FailedWait(call, error, lock);
+}
+
 DWORD Wait(ApiCall& call, DWORD count, const HANDLE* handles, bool all, DWORD timeout_ms) {
   World::Lock lock = call.world().Acquire();
   ObjectWait::Objects objects;
   for (DWORD i = 0; i < count; ++i) {
     objects.push_back(call.device().handles().Find(handles[i]));
     if (objects.back() == nullptr || !objects.back()->waitable()) {
-      return call.Fail(ERROR_INVALID_HANDLE, WAIT_FAILED);
+      return FailedWait(call, ERROR_INVALID_HANDLE, lock);
     }
   }
   const std::optional<Micros> deadline = Deadline(call.world(), timeout_ms);
@@ -157,7 +168,7 @@ DWORD WaitForSingleObject(HANDLE object, DWORD timeout_ms) {
   ApiCall call("WaitForSingleObject", ERROR_INVALID_HANDLE);
   call.Argument("handle", object);
   call.Argument("ms", timeout_ms);
-  if (call.failed()) return call.Return(WAIT_FAILED);
+  if (call.failed()) return sim::FailedWait(call, call.fault_error());
   return sim::Wait(call, 1, &object, false, timeout_ms);
 }
 
@@ -166,9 +177,9 @@ DWORD WaitForMultipleObjects(DWORD count, const HANDLE* objects, BOOL wait_all, 
   call.Argument("count", count);
   call.Argument("all", wait_all);
   call.Argument("ms", timeout_ms);
-  if (call.failed()) return call.Return(WAIT_FAILED);
+  if (call.failed()) return sim::FailedWait(call, call.fault_error());
   if (count == 0 || count > MAXIMUM_WAIT_OBJECTS || objects == nullptr) {
-    return call.Fail(ERROR_INVALID_PARAMETER, WAIT_FAILED);
+    return sim::FailedWait(call, ERROR_INVALID_PARAMETER);
   }
   return sim::Wait(call, count, objects, wait_all != FALSE, timeout_ms);
 }

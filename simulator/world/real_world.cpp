@@ -31,6 +31,7 @@ class RealWorld final : public WorldCore {
   ~RealWorld() override {
     EndAllThreads();
     StopService();
+    EndShared();
   }
 
   [[nodiscard]] bool is_virtual() const override { return false; }
@@ -52,6 +53,12 @@ class RealWorld final : public WorldCore {
     }
     EndBlock(self);
     return self.notified ? Wake::kNotified : Wake::kTimeout;
+  }
+
+  void Yield(Lock& /*lock*/) override {
+    SimThread& self = Caller("Yield");
+    if (self.terminate) Leave(self);
+    std::this_thread::yield();
   }
 
   Wake BlockOnFiles(Lock& lock, pollfd* files, std::size_t count, const Queues& queues,

@@ -1,6 +1,7 @@
 // What the simulator knows of one simulated thread.
 #pragma once
 
+#include <atomic>
 #include <condition_variable>
 #include <csetjmp>
 #include <cstdint>
@@ -31,11 +32,11 @@ struct SimThread {
   std::uint32_t exit_code = 0x103;  ///< "still active" until the thread has ended
   State state = State::kReady;
   bool terminate = false;
-  bool attached = false;       ///< a host thread that joined; it cannot be terminated
-  bool leaving = false;        ///< its stack is being abandoned
-  const char* call = nullptr;  ///< the API call it is in
-  unsigned time_asked = 0;     ///< GetTickCount calls since it last waited
-  WaitQueue finished;          ///< notified when the thread has ended
+  bool attached = false;                   ///< a host thread that joined; it cannot be terminated
+  bool leaving = false;                    ///< its stack is being abandoned
+  std::atomic<const char*> call{nullptr};  ///< the API call it is in
+  unsigned time_asked = 0;                 ///< GetTickCount calls since it last waited
+  WaitQueue finished;                      ///< notified when the thread has ended
   /// Who else is told of the end, in this order. An entry leaves the list when it ends itself.
   std::vector<ThreadEndListener*> end_listeners;
 

@@ -17,7 +17,10 @@ constexpr Micros kEndOfTime = std::chrono::hours(24 * 60);
 class VirtualWorld final : public WorldCore {
  public:
   explicit VirtualWorld(std::uint64_t seed) : WorldCore(seed) {}
-  ~VirtualWorld() override { EndAllThreads(); }
+  ~VirtualWorld() override {
+    EndAllThreads();
+    EndShared();
+  }
 
   [[nodiscard]] bool is_virtual() const override { return true; }
   [[nodiscard]] Micros now() const override {
@@ -37,6 +40,8 @@ class VirtualWorld final : public WorldCore {
     if (self.terminate) Leave(self);
     return self.timed_out ? Wake::kTimeout : Wake::kNotified;
   }
+
+  void Yield(Lock& lock) override { Block(lock, {}, now() + Micros(1)); }
 
   Wake BlockOnFiles(Lock& /*lock*/, pollfd* /*files*/, std::size_t /*count*/,
                     const Queues& /*queues*/, std::optional<Micros> /*deadline*/) override {

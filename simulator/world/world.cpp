@@ -20,6 +20,10 @@ World::World(std::uint64_t seed) : seed_(seed), random_state_(seed) {}
 
 World::~World() = default;
 
+void World::EndShared() {
+  shared_.clear();
+}
+
 // SplitMix64: every state gives a good number, so any seed will do.
 std::uint64_t World::Random() {
   std::uint64_t mixed = (random_state_ += 0x9E3779B97F4A7C15U);
@@ -31,10 +35,6 @@ std::uint64_t World::Random() {
 double World::RandomUnit() {
   constexpr double kStep = 1.0 / 9007199254740992.0;  // 2^-53
   return static_cast<double>(Random() >> 11U) * kStep;
-}
-
-void World::Yield(Lock& lock) {
-  if (is_virtual()) Block(lock, {}, now() + Micros(1));
 }
 
 AttachedThread::AttachedThread(Device& device, std::string name)

@@ -93,9 +93,10 @@ class World {
     return true;
   }
 
-  /// For calls that only look whether something has happened: lets others run, and time pass, so
-  /// that a program which polls without a pause does not stop a virtual world.
-  void Yield(Lock& lock);
+  /// For calls that only look whether something has happened, and for waits that fail: lets others
+  /// run, and a microsecond pass in a virtual world, so that a program which asks again without a
+  /// pause does not stop the world. Like Block, does not return when the thread is terminated.
+  virtual void Yield(Lock& lock) = 0;
 
   /// Makes every thread that waits on `queue` look at its condition again. Lock held.
   virtual void Notify(WaitQueue& queue) = 0;
@@ -147,6 +148,9 @@ class World {
 
  protected:
   explicit World(std::uint64_t seed);
+  /// Ends what Shared made. For the derived destructors, once the threads are gone: it may still
+  /// call the world.
+  void EndShared();
 
  private:
   std::mutex mutex_;

@@ -22,7 +22,7 @@ thread_local SimThread* current_thread = nullptr;
 thread_local _Unwind_Exception abandon;
 
 /// How long, on the host's clock, threads may take to reach a blocking call when they are ended.
-constexpr std::chrono::seconds kEndPatience{60};
+constexpr std::chrono::seconds kEndPatience{30};
 
 void AbandonCaught(_Unwind_Reason_Code /*reason*/, _Unwind_Exception* /*exception*/) {
   std::fputs("cesim: a catch (...) swallowed the termination of a simulated thread\n", stderr);
@@ -280,9 +280,10 @@ std::string WorldCore::Report() const {
   std::string report;
   for (const auto& thread : threads_) {
     if (thread->state == SimThread::State::kFinished) continue;
+    const char* call = thread->call.load(std::memory_order_relaxed);
     char line[256];
     std::snprintf(line, sizeof line, "  %u \"%s\": %s in %s", thread->id, thread->name.c_str(),
-                  StateName(thread->state), thread->call != nullptr ? thread->call : "no call");
+                  StateName(thread->state), call != nullptr ? call : "no call");
     report += line;
     if (thread->timer_number != 0) {
       std::snprintf(line, sizeof line, " until %" PRId64 " us",

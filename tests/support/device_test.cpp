@@ -29,7 +29,11 @@ std::uint32_t RunProgram(sim::Device& device, std::function<std::uint32_t()> pro
 }
 
 DeviceTest::DeviceTest(sim::Profile profile, std::uint64_t seed)
-    : world_(sim::World::MakeVirtual(seed)), profile_(std::move(profile)) {
+    : DeviceTest(WorldKind::kVirtual, std::move(profile), seed) {}
+
+DeviceTest::DeviceTest(WorldKind kind, sim::Profile profile, std::uint64_t seed)
+    : world_(kind == WorldKind::kVirtual ? sim::World::MakeVirtual(seed) : sim::World::MakeReal()),
+      profile_(std::move(profile)) {
   Restart(profile_);
 }
 
@@ -49,5 +53,8 @@ void DeviceTest::Restart(sim::Profile profile) {
   device_ = std::make_unique<sim::Device>(*world_, profile_, folder_.path() / "device");
   host_ = std::make_unique<sim::AttachedThread>(*device_, "test");
 }
+
+RealDeviceTest::RealDeviceTest(sim::Profile profile)
+    : DeviceTest(WorldKind::kReal, std::move(profile)) {}
 
 }  // namespace test

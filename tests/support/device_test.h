@@ -34,13 +34,17 @@ class TemporaryFolder {
 std::uint32_t RunProgram(sim::Device& device, std::function<std::uint32_t()> program,
                          std::string name = "program");
 
-/// A fresh device in a fresh folder and a virtual world, with the test's own thread attached to it:
-/// the test is a program of the device. Handles and other leftovers are the test's business.
+enum class WorldKind { kVirtual, kReal };
+
+/// A fresh device in a fresh folder and a world of its own, a virtual one if not said otherwise,
+/// with the test's own thread attached to it: the test is a program of the device. Handles and
+/// other leftovers are the test's business.
 class DeviceTest : public ::testing::Test {
  protected:
   /// @param profile  what the device is
-  /// @param seed  of the world
+  /// @param seed  of a virtual world
   explicit DeviceTest(sim::Profile profile = {}, std::uint64_t seed = 1);
+  explicit DeviceTest(WorldKind kind, sim::Profile profile = {}, std::uint64_t seed = 1);
   ~DeviceTest() override;
 
   [[nodiscard]] sim::Device& device() { return *device_; }
@@ -62,7 +66,14 @@ class DeviceTest : public ::testing::Test {
   std::unique_ptr<sim::AttachedThread> host_;
 };
 
+/// The same in the real world: for sockets and threads as the host has them.
+class RealDeviceTest : public DeviceTest {
+ protected:
+  explicit RealDeviceTest(sim::Profile profile = {});
+};
+
 }  // namespace test
 
 // Tests name their fixture without its namespace.
-using test::DeviceTest;  // NOLINT(google-global-names-in-headers)
+using test::DeviceTest;      // NOLINT(google-global-names-in-headers)
+using test::RealDeviceTest;  // NOLINT(google-global-names-in-headers)
