@@ -84,6 +84,9 @@ DWORD WaitForSingleObject(HANDLE object, DWORD timeout_ms);
 DWORD WaitForMultipleObjects(DWORD count, const HANDLE* objects, BOOL wait_all, DWORD timeout_ms);
 BOOL CloseHandle(HANDLE object);
 
+/// Puts `value` into `target` and returns what was there, as one step for all threads.
+LONG InterlockedExchange(LONG volatile* target, LONG value);
+
 void Sleep(DWORD duration_ms);
 DWORD GetTickCount();
 DWORD GetLastError();
