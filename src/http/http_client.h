@@ -9,12 +9,12 @@
 #include <string_view>
 
 #include "base/text.h"
+#include "device/file.h"
+#include "device/local_memory.h"
+#include "device/wide_text.h"
+#include "http/request.h"
 #include "http/response_head/response_head.h"
 #include "http/socket_io.h"
-
-namespace device {
-class File;
-}
 
 namespace http {
 
@@ -23,25 +23,18 @@ namespace http {
 extern std::atomic<std::uint32_t> BundleRx;
 /// 1 while files are fetched because multicast may not have delivered them, else 0. Sent likewise.
 extern std::atomic<std::uint32_t> HttpFallback;
+/// Both as they stand.
+[[nodiscard]] Counters CurrentCounters() noexcept;
 
 /// Room for the longest URL of a job: base URL, source and the counters behind it.
 inline constexpr std::size_t kUrlCapacity = 640;
 using UrlText = base::WideFixedText<kUrlCapacity>;
 
-/// What the device tells the server about itself. Null texts count as empty.
-struct Identity {
-  const char* type;
-  const char* family;
-  const char* model;
-  const char* serial_number;
-  const char* core_name;  ///< the device's unique id
-};
-
 /// One connection to the upgrade server, kept from file to file while address and port agree, and
 /// the file that is being fetched.
 ///
-/// The upgrade thread's; nothing here locks. Lives in LocalAlloc memory.
-class CHTTPClient : public CSocketIO {
+/// The upgrade thread's; nothing here locks.
+class CHTTPClient : public CSocketIO, public device::OnLocalHeap {
  public:
   /// Called after every block written but the first.
   /// @param total   bytes of the whole file
@@ -51,17 +44,12 @@ class CHTTPClient : public CSocketIO {
   /// Receive buffer, and the largest checkpoint block that a server may ask for, in bytes.
   static constexpr std::uint32_t kBufferSize = 16384;
 
-  CHTTPClient() noexcept = default;
-  /// Closes file and connection at once.
-  ~CHTTPClient();
-
-  static void* operator new(std::size_t size) noexcept;
-  static void operator delete(void* client) noexcept;
-
   /// Connects to the server of `url`, or keeps the connection there is when it goes to the same
   /// address and port.
   /// @param url   "http://HOST:PORT/PATH"; either kind of slash. Null fails without a log line.
-  /// @param path  receives what stands behind the slash that ends the port
+  /// @param path  receives what stands behind the slash that ends the port; a path that does not
+  /// fit
+  ///   counts as an unreadable URL
   [[nodiscard]] bool OpenURL(const WCHAR* url, UrlText& path) noexcept;
 
   /// Fetches `path` into the current destination. Asks again, without a limit, after a stalled
@@ -103,10 +91,46 @@ class CHTTPClient : public CSocketIO {
   void CloseFile() noexcept;
 
  private:
+  /// How one round of asking for a file ended.
+  enum class Round : std::uint8_t { kComplete, kFailed, kRepeat };
+  /// How receiving the body ended.
+  enum class Body : std::uint8_t { kComplete, kBroken, kReadError };
+
+  [[nodiscard]] bool KeepsConnection(std::uint32_t address, std::uint16_t port) noexcept;
+  [[nodiscard]] bool OpenConnection(std::uint32_t address, std::uint16_t port) noexcept;
+  [[nodiscard]] bool AllocateBuffer() noexcept;
+  [[nodiscard]] Identity identity() const noexcept;
+
+  // The steps of Get, in download.cpp.
+  Round FetchOnce(const char* path) noexcept;
+  Round Fail(int number, const WCHAR* debug_text) noexcept;
+  Round FailWithFile() noexcept;
+  Round EndAtOnce() noexcept;
+  [[nodiscard]] bool SendRequest(const char* request, std::size_t length) noexcept;
+  Round ReceiveHead(ResponseHead& head, std::string_view& body) noexcept;
+  Round ReceiveFile(const ResponseHead& head, std::string_view first) noexcept;
+  [[nodiscard]] bool OpenDestination(std::uint32_t size) noexcept;
+  Body ReceiveRest(std::uint32_t length, std::uint32_t position) noexcept;
+  int ReceiveBlock(std::uint32_t most) noexcept;
+  [[nodiscard]] bool WriteBlock(std::uint32_t position, const char* bytes,
+                                std::uint32_t size) noexcept;
+  [[nodiscard]] bool CheckCrc(std::uint32_t expected) noexcept;
+
+  std::uint16_t connected_port_ = 0;
+  std::uint32_t connected_address_ = 0xFFFFFFFFU;
   HANDLE transfer_semaphore_ = nullptr;
-  Progress progress_ = nullptr;
+  device::LocalBlock<char> buffer_;  ///< kBufferSize bytes; made on first use, kept for the job
+  base::FixedText<64> type_;
+  base::FixedText<64> family_;
+  base::FixedText<64> model_;
+  base::FixedText<64> serial_number_;
+  base::FixedText<64> core_name_;
   bool crc_check_ = true;
+  device::LocalObject<device::File> file_;  ///< of the current transfer
   bool crc_good_ = true;
+  Progress progress_ = nullptr;
+  device::NarrowText<device::File::kNameSize> destination_;
+  bool destination_fits_ = true;
 };
 
 }  // namespace http
