@@ -12,7 +12,9 @@ constexpr const char* kWithout =
 
 }  // namespace
 
-std::unique_ptr<Font> MakeSystemFont() { return MakeBitmapFont(); }
+std::unique_ptr<Font> MakeSystemFont() {
+  return MakeBitmapFont();
+}
 
 bool WritePng(const Image&, const std::filesystem::path& file, std::string& error) {
   error = "cannot write the picture " + file.string() + ": " + kWithout;
