@@ -14,6 +14,7 @@
 namespace report {
 namespace {
 
+constexpr const char* kLockName = "TransferLog";
 constexpr const char* kLogFile = "\\FileXfer.log";
 constexpr int kPriority = 14;  // facility "user", severity "informational"
 constexpr std::size_t kLineSize = 1152;
@@ -25,9 +26,8 @@ struct SyslogLink : device::OnLocalHeap {
   mcftp::UdpEndpoint server;
 };
 
-/// As old as the process, and without a destructor: a target outlives its job.
+/// Guarded by the lock. As old as the process, and without a destructor: a target outlives its job.
 struct State {
-  device::Lock lock;  ///< around what follows
   std::uint16_t syslog_port;
   SyslogLink* syslog;  ///< owned; null when there is no socket
   FILE* file;          ///< stays open between lines only while there is a syslog port
@@ -80,15 +80,13 @@ void Log(const char* format, ...) noexcept {
   va_start(arguments, format);
   base::FormatV(message, sizeof message, format, arguments);
   va_end(arguments);
-  {
-    const device::LockGuard lock(state.lock);
-    Write(message);
-  }
+  if (const device::LockGuard lock(kLockName); lock) Write(message);
   SetLastError(error);
 }
 
 void SetSyslogTarget(int port, const char* address) noexcept {
-  const device::LockGuard lock(state.lock);
+  const device::LockGuard lock(kLockName);
+  if (!lock) return;
   delete std::exchange(state.syslog, nullptr);
   state.syslog_port = static_cast<std::uint16_t>(port);
   const std::uint32_t server = mcftp::ParseAddress(address);
@@ -99,8 +97,7 @@ void SetSyslogTarget(int port, const char* address) noexcept {
 }
 
 void CloseLogFile() noexcept {
-  const device::LockGuard lock(state.lock);
-  CloseFile();
+  if (const device::LockGuard lock(kLockName); lock) CloseFile();
 }
 
 }  // namespace report
