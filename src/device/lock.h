@@ -1,35 +1,41 @@
-// A lock for state that lives as long as the process.
+// The lock around what threads share in this library.
 #pragma once
+
+#include <coredll.h>
 
 namespace device {
 
-/// Holds one of the module's locks for a scope; ask it before touching what the lock guards.
+/// Guards a few words, a list of pointers or one open stream.
 ///
-///     const device::LockGuard lock("TransferLog");
-///     if (!lock) return;
+/// Zero memory is an unlocked lock: nothing has to set it up, so it holds from the first call of
+/// any thread on, and nothing has to be released with the library. It stands on
+/// InterlockedExchange, which the platform supplies even on ARM cores that have no
+/// compare-and-swap. Who finds it taken sleeps, because spinning could keep a holder of lower
+/// priority from ever going on.
 ///
-/// The lock itself is a named mutex that exists while somebody holds or awaits it. So there is no
-/// object to construct before the first use, no compare-and-swap, which older ARM cores lack, to
-/// construct it once, and nothing to release when the library is unloaded.
-///
-/// Hold it for a few instructions and never across a call that could come back. A thread may take
-/// the same lock twice. A lock whose owner was terminated passes on like a free one.
+/// While it is held nothing may be called that waits for another thread, draws or sends a message.
+/// A thread must not take it twice.
+class Lock {
+ public:
+  void Acquire() noexcept {
+    while (InterlockedExchange(&taken_, 1) != 0) Sleep(1);
+  }
+  void Release() noexcept { InterlockedExchange(&taken_, 0); }
+
+ private:
+  LONG taken_ = 0;
+};
+
+/// Holds a lock for a scope.
 class [[nodiscard]] LockGuard {
  public:
-  /// Waits without limit.
-  /// @param name  what tells this lock from the module's others: at most 32 ASCII characters. The
-  ///   process's number is added, so processes do not wait for each other.
-  explicit LockGuard(const char* name) noexcept;
-  ~LockGuard();
+  explicit LockGuard(Lock& lock) noexcept : lock_(lock) { lock_.Acquire(); }
+  ~LockGuard() { lock_.Release(); }
   LockGuard(const LockGuard&) = delete;
   LockGuard& operator=(const LockGuard&) = delete;
 
-  /// False when the system had no handle left for the lock. The caller then does without what it
-  /// wanted to do.
-  [[nodiscard]] explicit operator bool() const noexcept { return mutex_ != nullptr; }
-
  private:
-  void* mutex_;  ///< the system's handle, owned by this thread; null when the lock is not held
+  Lock& lock_;
 };
 
 }  // namespace device

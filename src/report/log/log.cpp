@@ -14,7 +14,6 @@
 namespace report {
 namespace {
 
-constexpr const char* kLockName = "TransferLog";
 constexpr const char* kLogFile = "\\FileXfer.log";
 constexpr int kPriority = 14;  // facility "user", severity "informational"
 constexpr std::size_t kLineSize = 1152;
@@ -26,8 +25,9 @@ struct SyslogLink : device::OnLocalHeap {
   mcftp::UdpEndpoint server;
 };
 
-/// Guarded by the lock. As old as the process, and without a destructor: a target outlives its job.
+/// As old as the process, and without a destructor: a target outlives its job.
 struct State {
+  device::Lock lock;  ///< around what follows
   std::uint16_t syslog_port;
   SyslogLink* syslog;  ///< owned; null when there is no socket
   FILE* file;          ///< stays open between lines only while there is a syslog port
@@ -80,13 +80,15 @@ void Log(const char* format, ...) noexcept {
   va_start(arguments, format);
   base::FormatV(message, sizeof message, format, arguments);
   va_end(arguments);
-  if (const device::LockGuard lock(kLockName); lock) Write(message);
+  {
+    const device::LockGuard lock(state.lock);
+    Write(message);
+  }
   SetLastError(error);
 }
 
 void SetSyslogTarget(int port, const char* address) noexcept {
-  const device::LockGuard lock(kLockName);
-  if (!lock) return;
+  const device::LockGuard lock(state.lock);
   delete std::exchange(state.syslog, nullptr);
   state.syslog_port = static_cast<std::uint16_t>(port);
   const std::uint32_t server = mcftp::ParseAddress(address);
@@ -97,7 +99,8 @@ void SetSyslogTarget(int port, const char* address) noexcept {
 }
 
 void CloseLogFile() noexcept {
-  if (const device::LockGuard lock(kLockName); lock) CloseFile();
+  const device::LockGuard lock(state.lock);
+  CloseFile();
 }
 
 }  // namespace report

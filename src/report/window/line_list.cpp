@@ -24,7 +24,7 @@ LineList::Added LineList::Add(std::string_view text, int capacity) noexcept {
   WCHAR* oldest = nullptr;
   Added added;
   {
-    const ShortLockHolder hold(lock_);
+    const device::LockGuard hold(lock_);
     if (count_ > capacity - 1) {
       added.oldest_left = true;
       oldest = lines_[0];
@@ -44,7 +44,7 @@ void LineList::Clear() noexcept {
   WCHAR* old[kMaxLines] = {};
   int count = 0;
   {
-    const ShortLockHolder hold(lock_);
+    const device::LockGuard hold(lock_);
     for (; count < count_; ++count) old[count] = lines_[count];
     count_ = 0;
   }
@@ -52,7 +52,7 @@ void LineList::Clear() noexcept {
 }
 
 bool LineList::Copy(int index, Line& line) noexcept {
-  const ShortLockHolder hold(lock_);
+  const device::LockGuard hold(lock_);
   if (index < 0 || index >= count_) return false;
   line.Assign(lines_[index]);
   return true;

@@ -6,7 +6,7 @@
 #include <string_view>
 
 #include "base/text.h"
-#include "report/window/short_lock.h"
+#include "device/lock.h"
 
 namespace report {
 
@@ -34,7 +34,7 @@ class LineList {
   bool Copy(int index, Line& line) noexcept;
 
  private:
-  ShortLock lock_;
+  device::Lock lock_;
   int count_ = 0;
   WCHAR* lines_[kMaxLines] = {};
 };

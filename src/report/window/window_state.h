@@ -7,8 +7,8 @@
 #include <atomic>
 
 #include "base/text.h"
+#include "device/lock.h"
 #include "report/window/line_list.h"
-#include "report/window/short_lock.h"
 
 namespace report {
 
@@ -31,16 +31,16 @@ class CaptionText {
   using Text = base::WideFixedText<300>;
 
   void Set(const Text& text) noexcept {
-    const ShortLockHolder hold(lock_);
+    const device::LockGuard hold(lock_);
     text_.Assign(text.view());
   }
   void Copy(Text& text) noexcept {
-    const ShortLockHolder hold(lock_);
+    const device::LockGuard hold(lock_);
     text.Assign(text_.view());
   }
 
  private:
-  ShortLock lock_;
+  device::Lock lock_;
   Text text_;
 };
 
