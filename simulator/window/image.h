@@ -74,6 +74,8 @@ int Text(Image& image, const RECT& clip, Font& font, int x, int y, std::u16strin
 // PNG files. False, with one line in `error`, when the file is at fault or the simulator was built
 // without pictures.
 
+/// False in a build without them.
+bool HavePictures();
 bool WritePng(const Image& image, const std::filesystem::path& file, std::string& error);
 bool ReadPng(const std::filesystem::path& file, Image& image, std::string& error);
 

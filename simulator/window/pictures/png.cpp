@@ -16,13 +16,18 @@ std::string Say(const std::filesystem::path& file, const char* what, const png_i
 
 }  // namespace
 
+bool HavePictures() {
+  return true;
+}
+
 bool WritePng(const Image& image, const std::filesystem::path& file, std::string& error) {
   png_image png = {};
   png.version = PNG_IMAGE_VERSION;
   png.width = static_cast<png_uint_32>(image.width);
   png.height = static_cast<png_uint_32>(image.height);
   png.format = PNG_FORMAT_RGB;
-  if (png_image_write_to_file(&png, file.c_str(), 0, image.rgb.data(), 0, nullptr) != 0) return true;
+  if (png_image_write_to_file(&png, file.c_str(), 0, image.rgb.data(), 0, nullptr) != 0)
+    return true;
   error = Say(file, "write", png);
   return false;
 }

@@ -19,7 +19,9 @@ namespace {
 /// Height of the letters' em in pixels: a line of it is 13 pixels high.
 constexpr FT_UInt kEmPixels = 11;
 
-int Rounded(FT_Pos in_64ths) { return static_cast<int>((in_64ths + 32) >> 6); }
+int Rounded(FT_Pos in_64ths) {
+  return static_cast<int>((in_64ths + 32) >> 6);
+}
 
 [[noreturn]] void GiveUp(const char* what) {
   std::fprintf(stderr,
@@ -97,6 +99,8 @@ class RenderedFont final : public Font {
 
 }  // namespace
 
-std::unique_ptr<Font> MakeSystemFont() { return std::make_unique<RenderedFont>(); }
+std::unique_ptr<Font> MakeSystemFont() {
+  return std::make_unique<RenderedFont>();
+}
 
 }  // namespace sim
