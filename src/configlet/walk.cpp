@@ -4,12 +4,15 @@ namespace configlet {
 namespace {
 
 Walk the_walk;
+device::Lock the_lock;
 
 }  // namespace
 
 Walk& TheWalk() noexcept {
   return the_walk;
 }
+
+WalkLock::WalkLock() noexcept : guard_(the_lock) {}
 
 void ForgetJob(const UpgradeConfig* job) noexcept {
   const WalkLock lock;

@@ -68,11 +68,11 @@ struct Walk {
 /// The one walk of this module.
 Walk& TheWalk() noexcept;
 
-/// Keeps the upgrade thread from freeing the job. Without a handle for the lock the call goes on
-/// unguarded: only a host that goes on filling a job which it has started could be hurt.
-class WalkLock {
+/// Keeps the upgrade thread from freeing the job for the length of a scope. No call that could come
+/// back to the host is made under it.
+class [[nodiscard]] WalkLock {
  public:
-  WalkLock() noexcept : guard_("Configlet") {}
+  WalkLock() noexcept;
 
  private:
   device::LockGuard guard_;
