@@ -1,0 +1,49 @@
+// Folders of the host, entered one name at a time from an open descriptor.
+//
+// No path of the host is ever built from a name of the device: every step opens one name in one
+// open folder and refuses symbolic links, so that nothing leads out of the device's folder.
+#pragma once
+
+#include <sys/types.h>
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "ce/types.h"
+#include "locale/clock.h"
+#include "storage/unique_fd.h"
+
+namespace sim {
+
+/// A file or folder as the host has it. Links, pipes and whatever else a host's folder may hold do
+/// not exist for the device, nor do names that it could not say.
+struct HostEntry {
+  std::string name;  ///< on the host, in the spelling it has there
+  bool folder = false;
+  std::uint64_t size = 0;  ///< bytes; 0 for a folder
+  dev_t device = 0;
+  ino_t inode = 0;
+  FileTicks modified = 0;  ///< by the host's clock
+};
+
+/// Opens folder `name` of `parent`. @return none, with errno set, for anything but a real folder.
+[[nodiscard]] UniqueFd OpenFolder(int parent, const std::string& name);
+
+/// The entry with exactly this name on the host.
+[[nodiscard]] std::optional<HostEntry> StatEntry(int folder, const std::string& name);
+
+/// The entry that the device means by `name`: the same spelling if there is one, otherwise the
+/// first, in sorted order, that differs in letter case only.
+[[nodiscard]] std::optional<HostEntry> FindEntry(int folder, std::u16string_view name);
+
+/// Names of the device's files and folders in `folder`, in the order in which the device lists
+/// them: without regard to case.
+[[nodiscard]] std::vector<std::u16string> ListNames(int folder);
+
+/// The device's error number for one of the host's.
+[[nodiscard]] DWORD ErrorOfErrno(int error);
+
+}  // namespace sim

@@ -1,0 +1,98 @@
+// An open file: what the handles of CreateFileW and the streams of fopen stand for.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <string>
+
+#include "ce/files.h"
+#include "kernel/handle_table.h"
+#include "storage/file_records.h"
+#include "storage/unique_fd.h"
+
+namespace sim {
+
+class Device;
+class Storage;
+class Volume;
+
+/// Files end below 4 GiB: their sizes have 32 bits.
+inline constexpr std::uint64_t kMaxFileSize = 0xFFFFFFFFU;
+
+/// What all open handles of one file share.
+struct FileNode {
+  FileNode(Volume& on, std::string below_storage) : volume(on), path(std::move(below_storage)) {}
+
+  Volume& volume;
+  const std::string path;  ///< an open file and its folders keep their names
+  dev_t device = 0;
+  ino_t inode = 0;
+
+  std::mutex mutex;  ///< of the size, the record and the content
+  std::uint64_t size = 0;
+  FileRecord record;
+  bool changed = false;  ///< the record differs from the one kept on the host
+
+  // How it is shared; guarded by the storage's lock.
+  unsigned opens = 0;
+  unsigned readers = 0;
+  unsigned writers = 0;
+  unsigned bar_reading = 0;  ///< opens that let nobody else read
+  unsigned bar_writing = 0;
+};
+
+/// All operations give an error number of the device, 0 for success. Any thread; the file's
+/// position is the handle's own.
+class OpenFile final : public KernelObject {
+ public:
+  struct Mode {
+    DWORD access = 0;       ///< GENERIC_READ and GENERIC_WRITE
+    DWORD share = 0;        ///< FILE_SHARE_READ and FILE_SHARE_WRITE
+    bool append = false;    ///< every write goes to the end
+    bool mappable = false;  ///< opened by CreateFileForMappingW
+  };
+  OpenFile(Device& device, Storage& storage, std::shared_ptr<FileNode> node, UniqueFd fd,
+           Mode mode);
+  ~OpenFile() override;
+
+  /// At the end of the file it reads 0 bytes and succeeds.
+  DWORD Read(void* bytes, DWORD size, DWORD& read);
+  /// All or nothing: what does not fit on the volume is refused with ERROR_DISK_FULL, and neither
+  /// the file nor the position changes, so that the same write can be tried again.
+  DWORD Write(const void* bytes, DWORD size, DWORD& written);
+  /// @param method  FILE_BEGIN, FILE_CURRENT or FILE_END
+  /// @param most    a position beyond it is refused
+  DWORD Seek(std::int64_t distance, DWORD method, std::uint64_t most, std::uint64_t& position);
+  /// Cuts or lengthens the file to the position; what is new reads as zeros.
+  DWORD SetEnd();
+  /// Keeps attributes and times on the host now instead of at the closing.
+  DWORD Flush();
+  [[nodiscard]] std::uint64_t size() const;
+  [[nodiscard]] FileRecord record() const;
+  /// The whole content, and writing it back within the file's size: what a mapping needs.
+  DWORD Load(char* bytes, std::size_t size);
+  DWORD Store(const char* bytes, std::size_t size);
+  /// Makes the file at least `size` bytes long.
+  DWORD Lengthen(std::uint64_t size);
+  /// Null pointers leave their time as it is.
+  DWORD SetTimes(const FILETIME* created, const FILETIME* accessed, const FILETIME* written);
+
+  [[nodiscard]] bool readable() const { return (mode_.access & GENERIC_READ) != 0; }
+  [[nodiscard]] bool writable() const { return (mode_.access & GENERIC_WRITE) != 0; }
+  [[nodiscard]] const Mode& mode() const { return mode_; }
+
+ private:
+  friend class Storage;
+  void NoteChange();
+  DWORD Resize(std::uint64_t size);
+
+  Device& device_;
+  Storage* storage_;  ///< null once the file is closed
+  std::shared_ptr<FileNode> node_;
+  UniqueFd fd_;
+  const Mode mode_;
+  std::uint64_t position_ = 0;  ///< guarded by the node's mutex
+};
+
+}  // namespace sim
