@@ -1,0 +1,105 @@
+#include <iostream>
+#include <memory>
+#include <nlohmann/json.hpp>
+
+#include "base/number.h"
+#include "tools/bundle.h"
+#include "tools/cli.h"
+#include "tools/device_table.h"
+#include "tools/failure.h"
+
+namespace tools {
+namespace {
+
+struct MakeCommand {
+  BundleOptions options;
+  bool no_window = false;
+  std::string syslog;
+  std::vector<std::string> attributes;
+  bool json = false;
+};
+
+/// Splits "10.0.0.2:514" and "*.ini=hidden".
+std::pair<std::string, std::string> SplitAt(const std::string& text, char divider) {
+  const std::size_t at = text.rfind(divider);
+  if (at == std::string::npos) return {text, ""};
+  return {text.substr(0, at), text.substr(at + 1)};
+}
+
+void Complete(MakeCommand& command) {
+  command.options.show_window = !command.no_window;
+  if (!command.syslog.empty()) {
+    const auto [address, port] = SplitAt(command.syslog, ':');
+    const std::uint32_t number = port.empty() ? 514 : base::LeadingNumber(port);
+    if (number == 0 || number > 65535) {
+      throw Failure(ExitCode::kUsage, "--syslog", "\"" + port + "\" is no port",
+                    "give it as 10.0.0.2:514");
+    }
+    command.options.syslog_address = address;
+    command.options.syslog_port = static_cast<std::uint16_t>(number);
+  }
+  for (const std::string& rule : command.attributes) {
+    const auto [pattern, names] = SplitAt(rule, '=');
+    static_cast<void>(ParseAttributes(names));
+    command.options.attributes.emplace_back(pattern, names);
+  }
+}
+
+ExitCode Make(MakeCommand& command) {
+  Complete(command);
+  const Bundle bundle = MakeBundle(command.options);
+  const std::filesystem::path& out = command.options.out;
+  if (command.json) {
+    const nlohmann::ordered_json json{{"event", "made"},
+                                      {"bundle", out.string()},
+                                      {"job", (out / kBundleJob).string()},
+                                      {"files", bundle.files.size()},
+                                      {"bytes", bundle.total_size},
+                                      {"list_crc32", bundle.list.crc32}};
+    std::cout << json.dump() << std::endl;
+    return ExitCode::kOk;
+  }
+  std::cout << bundle.files.size() << " files, " << FormatBytes(bundle.total_size) << ", for "
+            << bundle.address << ":" << bundle.port << "\n  serve it:  orvenix serve "
+            << out.string() << "\n  run it:    orvenix run " << (out / kBundleJob).string()
+            << " --device DIR" << std::endl;
+  return ExitCode::kOk;
+}
+
+}  // namespace
+
+void AddBundleVerb(CLI::App& app, Action& action) {
+  CLI::App* bundle = app.add_subcommand("bundle", "Make files ready for the upgrade server");
+  bundle->require_subcommand(1);
+  CLI::App* make = bundle->add_subcommand(
+      "make", "Turn a folder of files into a bundle: list file, served tree and job");
+  auto command = std::make_shared<MakeCommand>();
+  BundleOptions& options = command->options;
+  make->add_option("FOLDER", options.folder, "the files, sub-folders included")->required();
+  make->add_option("BUNDLE", options.out, "the bundle to make; an earlier one is replaced")
+      ->required();
+  make->add_option("--name", options.name, "first part of every published path")
+      ->capture_default_str();
+  make->add_option("--address", options.address, "the server, as devices reach it")
+      ->capture_default_str();
+  make->add_option("--port", options.port, "its port")->capture_default_str();
+  make->add_option("--dest", options.destination, "folder on the device")->capture_default_str();
+  make->add_option("--masks", options.masks, "which devices: patterns of configuration texts")
+      ->capture_default_str();
+  make->add_option("--attributes", command->attributes,
+                   "PATTERN=LIST: attributes of the files that match, from read-only, hidden, "
+                   "system, archive; may be repeated, the first that matches counts")
+      ->allow_extra_args(false);
+  make->add_option("--begin-text", options.begin_text, "what the device reports at the beginning");
+  make->add_option("--end-text", options.end_text,
+                   "what it reports at the end; needs a --begin-text");
+  make->add_option("--syslog", command->syslog, "ADDRESS:PORT that the device logs to");
+  make->add_flag("--no-window", command->no_window, "show no progress window on the device");
+  AddJsonOption(*make, command->json, "print what was made as one JSON object");
+  make->footer(
+      "Example:\n  orvenix bundle make ./files ./bundle --address 127.0.0.2 --port 8080 \\\n"
+      "      --dest '\\Application' --attributes '*.ini=read-only,archive'");
+  make->callback([command, &action] { action = [command] { return Make(*command); }; });
+}
+
+}  // namespace tools

@@ -1,0 +1,26 @@
+// The command line of the program `orvenix`.
+#pragma once
+
+#include <CLI/CLI.hpp>
+#include <functional>
+
+#include "tools/exit_codes.h"
+
+namespace tools {
+
+/// What a verb does once its options are read. Throws Failure.
+using Action = std::function<ExitCode()>;
+
+/// Each adds one verb with its options, and sets `action` when the command line names it.
+void AddBundleVerb(CLI::App& app, Action& action);
+void AddServeVerb(CLI::App& app, Action& action);
+
+/// Adds --json, with the verb's own words about what it changes.
+void AddJsonOption(CLI::App& verb, bool& json, const std::string& effect);
+
+/// Reads the command line and does what it says. @return the exit code of the program. Every
+/// failure is one line on the standard error output, and with --json one object on the standard
+/// output as well.
+int RunCommandLine(int argc, char** argv);
+
+}  // namespace tools

@@ -1,0 +1,202 @@
+#include "tools/serve.h"
+
+#include <unistd.h>
+
+#include <asio/io_context.hpp>
+#include <asio/signal_set.hpp>
+#include <asio/steady_timer.hpp>
+#include <csignal>
+#include <iostream>
+#include <system_error>
+
+#include "server/http_server.h"
+#include "tools/bundle.h"
+#include "tools/device_table.h"
+#include "tools/failure.h"
+#include "tools/file_text.h"
+
+namespace tools {
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr std::chrono::milliseconds kRedraw{250};
+constexpr std::size_t kTableRows = 30;
+
+/// What is to be served, and what its bundle says about where.
+struct Source {
+  fs::path root;
+  std::string address = "127.0.0.1";
+  std::uint16_t port = 8080;
+  std::vector<BundleFile> files;  ///< with attributes of their own
+};
+
+Source FindSource(const fs::path& named) {
+  fs::path folder = named;
+  if (fs::is_regular_file(named)) {
+    folder = named.parent_path().empty() ? fs::path(".") : named.parent_path();
+    if (!fs::exists(folder / kBundleManifest)) {
+      throw Failure(ExitCode::kBadInput, named.string(), "does not belong to a bundle",
+                    "name a bundle's folder, or the job.xml in it");
+    }
+  }
+  if (!fs::is_directory(folder)) {
+    throw Failure(ExitCode::kBadInput, named.string(), "there is no such bundle or folder",
+                  "make one with 'orvenix bundle make'");
+  }
+  Source source;
+  source.root = folder;
+  if (!fs::exists(folder / kBundleManifest)) return source;
+  const Bundle bundle = ReadBundle(folder);
+  source.root = folder / kBundleTree;
+  source.address = bundle.address;
+  source.port = bundle.port;
+  for (const BundleFile& file : bundle.files) {
+    if (file.attributes != 0) source.files.push_back(file);
+  }
+  return source;
+}
+
+class ServeRun {
+ public:
+  explicit ServeRun(const ServeOptions& options)
+      : options_(options),
+        source_(FindSource(options.bundle)),
+        site_(source_.root),
+        signals_(loop_, SIGINT, SIGTERM),
+        redraw_(loop_),
+        table_(!options.json && ::isatty(STDOUT_FILENO) == 1) {}
+
+  ExitCode Run() {
+    for (const BundleFile& file : source_.files) site_.SetAttributes(file.source, file.attributes);
+    inventory_ = site_.Warm();
+    server::RaiseDescriptorLimit();
+    ledger_.SetListener([this](const server::Event& event) { OnEvent(event); });
+    Listen();
+    Announce();
+    signals_.async_wait([this](const asio::error_code& error, int) {
+      if (!error) Stop();
+    });
+    if (table_) Redraw();
+    loop_.run();
+    if (table_) std::cout << "\x1b[H\x1b[J" << FormatTable(ledger_, kTableRows) << std::flush;
+    WriteReport();
+    return ExitCode::kOk;
+  }
+
+ private:
+  void Listen() {
+    server::HttpServerOptions http;
+    http.address = options_.address.value_or(source_.address);
+    http.port = options_.port.value_or(source_.port);
+    http.max_connections = options_.max_connections;
+    http.session.body_pause = server::Time(options_.pause_ms);
+    http.session.checkpoint_block_size = options_.checkpoint_block_size;
+    address_ = http.address;
+    try {
+      server_ = std::make_unique<server::HttpServer>(loop_, site_, ledger_, http);
+    } catch (const std::system_error& error) {
+      throw Failure(ExitCode::kCannotListen, http.address + ":" + std::to_string(http.port),
+                    error.code().message(), "choose another --address or --port");
+    }
+  }
+
+  void Announce() {
+    if (options_.json) {
+      Print({{"event", "listening"},
+             {"address", address_},
+             {"port", server_->port()},
+             {"files", inventory_.files},
+             {"bytes", inventory_.bytes}});
+    } else {
+      std::cout << "serving " << inventory_.files << " files, " << FormatBytes(inventory_.bytes)
+                << ", at http://" << address_ << ":" << server_->port() << " (Ctrl-C ends it)"
+                << std::endl;
+    }
+  }
+
+  static void Print(const nlohmann::ordered_json& json) { std::cout << json.dump() << std::endl; }
+
+  void OnEvent(const server::Event& event) {
+    if (options_.json) {
+      Print(ToJson(event, start_));
+    } else if (!table_) {
+      std::cout << ToLine(event, start_) << std::endl;
+    }
+    if (event.kind == server::EventKind::kReport && ++reports_ == options_.until_reports) {
+      // Not at once: the device still has to close its connection.
+      ending_ = true;
+      redraw_.expires_after(kRedraw);
+      redraw_.async_wait([this](const asio::error_code& error) {
+        if (!error) Stop();
+      });
+    }
+  }
+
+  void Redraw() {
+    if (ending_) return;
+    std::cout << "\x1b[H\x1b[J"
+              << "serving " << inventory_.files << " files at http://" << address_ << ":"
+              << server_->port() << ", " << server_->figures().connections
+              << " connections (Ctrl-C ends it)\n\n"
+              << FormatTable(ledger_, kTableRows) << std::flush;
+    redraw_.expires_after(kRedraw);
+    redraw_.async_wait([this](const asio::error_code& error) {
+      if (!error) Redraw();
+    });
+  }
+
+  void Stop() {
+    signals_.cancel();
+    redraw_.cancel();
+    server_->Stop();
+  }
+
+  void WriteReport() {
+    nlohmann::ordered_json devices = nlohmann::ordered_json::array();
+    for (const auto& [key, device] : ledger_.devices()) devices.push_back(ToJson(device));
+    const server::HttpServerFigures& figures = server_->figures();
+    const nlohmann::ordered_json report{{"event", "ended"},
+                                        {"seconds", Seconds()},
+                                        {"files", inventory_.files},
+                                        {"bytes", inventory_.bytes},
+                                        {"connections", figures.accepted},
+                                        {"most_connections", figures.most_connections},
+                                        {"turned_away", figures.turned_away},
+                                        {"bad_requests", ledger_.bad_requests()},
+                                        {"devices", devices}};
+    if (!options_.report.empty()) WriteWholeFile(options_.report, report.dump(2) + "\n");
+    if (options_.json) Print(report);
+    if (!options_.json) {
+      std::cout << "ended: " << devices.size() << " devices, " << reports_ << " reports, "
+                << figures.most_connections << " connections at once at most" << std::endl;
+    }
+  }
+
+  [[nodiscard]] double Seconds() const {
+    return std::chrono::duration<double>(server::Now() - start_).count();
+  }
+
+  const ServeOptions options_;
+  const Source source_;
+  server::Site site_;
+  server::DeviceLedger ledger_;
+  asio::io_context loop_;
+  asio::signal_set signals_;
+  asio::steady_timer redraw_;
+  const bool table_;
+  const server::Time start_ = server::Now();
+  server::Site::Inventory inventory_;
+  std::unique_ptr<server::HttpServer> server_;
+  std::string address_;
+  std::uint64_t reports_ = 0;
+  bool ending_ = false;
+};
+
+}  // namespace
+
+ExitCode Serve(const ServeOptions& options) {
+  return ServeRun(options).Run();
+}
+
+}  // namespace tools
