@@ -36,6 +36,17 @@ bool CopyText(char (&out)[Capacity], std::string_view text) noexcept {
   return text == nullptr ? std::string_view{} : std::string_view{text};
 }
 
+/// The part of `text` from `from` on, at most `count` characters of it; empty where the text has
+/// none. Unlike substr it has no error to throw, for which the device's library has no run time.
+template <typename Char>
+[[nodiscard]] constexpr std::basic_string_view<Char> Part(
+    std::basic_string_view<Char> text, std::size_t from,
+    std::size_t count = std::basic_string_view<Char>::npos) noexcept {
+  if (from >= text.size()) return {};
+  const std::size_t left = text.size() - from;
+  return {text.data() + from, count < left ? count : left};
+}
+
 /// A text field of a fixed-size record, which a stranger may have left without its terminator.
 template <std::size_t Capacity>
 [[nodiscard]] std::string_view FieldView(const char (&field)[Capacity]) noexcept {
@@ -67,7 +78,7 @@ template <typename Char>
 }
 
 [[nodiscard]] constexpr bool EndsWith(std::string_view text, std::string_view end) noexcept {
-  return text.size() >= end.size() && text.substr(text.size() - end.size()) == end;
+  return text.size() >= end.size() && Part(text, text.size() - end.size()) == end;
 }
 
 /// A zero-terminated text of exactly `Capacity` characters of storage, at most `Capacity` - 1 of

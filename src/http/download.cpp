@@ -1,4 +1,5 @@
 // CHTTPClient::Get: one file from the server to the device.
+#include "base/text.h"
 #include "device/file_crc.h"
 #include "http/http_client.h"
 #include "http/texts.h"
@@ -140,7 +141,7 @@ CHTTPClient::Round CHTTPClient::ReceiveHead(ResponseHead& head, std::string_view
   // A head that does not end here would be written into the file.
   if (error == HeadError::kNoEnd) return Fail(0, nullptr);
   if (error != HeadError::kNone) return Fail(static_cast<int>(error), DebugText(error));
-  body = block.substr(head.body_offset);
+  body = base::Part(block, head.body_offset);
   return Round::kComplete;
 }
 

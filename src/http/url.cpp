@@ -1,6 +1,7 @@
 #include "http/url.h"
 
 #include "base/number.h"
+#include "base/text.h"
 
 namespace http {
 namespace {
@@ -29,18 +30,18 @@ bool BeginsWithScheme(base::WideView url) noexcept {
 
 std::optional<UrlParts> ParseUrl(base::WideView url) noexcept {
   if (!BeginsWithScheme(url)) return std::nullopt;
-  const base::WideView rest = url.substr(kSchemeLength);
+  const base::WideView rest = base::Part(url, kSchemeLength);
   std::size_t end = 0;  // the separator's place
   std::size_t colon = base::WideView::npos;
   for (; end < rest.size() && !IsSlash(rest[end]); ++end) {
     if (rest[end] == ':') colon = end;
   }
   UrlParts parts;
-  parts.path = end < rest.size() ? rest.substr(end + 1) : base::WideView{};
+  parts.path = base::Part(rest, end + 1);
   if (colon != base::WideView::npos) {
     parts.host = rest.substr(0, colon);
     parts.port = static_cast<std::int32_t>(
-        base::LeadingNumber<base::WideChar>(rest.substr(colon + 1, end - colon - 1)));
+        base::LeadingNumber<base::WideChar>(base::Part(rest, colon + 1, end - colon - 1)));
   } else {
     // KEPT ODDITY: without a port the host keeps the separator, so it does not resolve, and the
     // port is 0. Jobs always name a port.
@@ -52,7 +53,7 @@ std::optional<UrlParts> ParseUrl(base::WideView url) noexcept {
 base::WideView FromFirstLetter(base::WideView path) noexcept {
   std::size_t at = 0;
   while (at < path.size() && !IsLetter(path[at])) ++at;
-  return path.substr(at);
+  return base::Part(path, at);
 }
 
 }  // namespace http

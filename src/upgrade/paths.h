@@ -19,7 +19,7 @@ using PathText = base::FixedText<kPathSize>;
 
 /// What stands behind the last backslash.
 [[nodiscard]] constexpr std::string_view FileName(std::string_view path) noexcept {
-  return path.substr(path.rfind('\\') + 1);
+  return base::Part(path, path.rfind('\\') + 1);
 }
 static_assert(FileName("a\\b") == "b" && FileName("b") == "b" && FileName("a\\").empty());
 

@@ -89,7 +89,7 @@ void UpgradeConfig::GetDeviceInfo() noexcept {
   const base::FixedText<sizeof f.manufacturing_string> made(
       base::FieldView(f.manufacturing_string));
   const auto letters = [&made](std::size_t from, std::size_t count) {
-    return from < made.size() ? made.view().substr(from, count) : std::string_view{};
+    return base::Part(made.view(), from, count);
   };
   const bool is_computer = letters(0, 1) == "7";
   base::CopyText(f.type, is_computer ? "Computer" : letters(0, 1));

@@ -1,5 +1,7 @@
 #include "http/response_head/response_head.h"
 
+#include "base/text.h"
+
 namespace http {
 namespace {
 
@@ -9,7 +11,7 @@ constexpr std::uint32_t kLargest = 0xFFFFFFFFU;
 std::optional<std::string_view> Behind(std::string_view block, std::string_view name) noexcept {
   const std::size_t at = block.find(name);
   if (at == std::string_view::npos) return std::nullopt;
-  return block.substr(at + name.size());
+  return base::Part(block, at + name.size());
 }
 
 struct Number {

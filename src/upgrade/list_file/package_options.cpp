@@ -4,6 +4,7 @@
 #include <optional>
 
 #include "base/number.h"
+#include "base/text.h"
 
 namespace upgrade {
 namespace {
@@ -11,7 +12,7 @@ namespace {
 std::optional<std::string_view> Behind(std::string_view options, std::string_view name) noexcept {
   const std::size_t at = options.find(name);
   if (at == std::string_view::npos) return std::nullopt;
-  return options.substr(at + name.size());
+  return base::Part(options, at + name.size());
 }
 
 }  // namespace
@@ -32,7 +33,7 @@ DiskNeed PackageDiskNeed(std::string_view options) noexcept {
   const std::size_t colon = value.find(':');
   if (colon == std::string_view::npos) return need;
   need.folder.Assign(value.substr(0, colon));
-  need.bytes = base::LeadingInt(value.substr(colon + 1));
+  need.bytes = base::LeadingInt(base::Part(value, colon + 1));
   return need;
 }
 

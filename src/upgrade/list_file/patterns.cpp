@@ -2,6 +2,8 @@
 
 #include <cstddef>
 
+#include "base/text.h"
+
 namespace upgrade {
 namespace {
 
@@ -26,7 +28,7 @@ bool AnyListPatternMatches(std::string_view patterns, std::string_view device) n
   constexpr std::string_view kSeparators = " ;";
   for (std::size_t from = patterns.find_first_not_of(kSeparators);
        from != std::string_view::npos;) {
-    const std::string_view rest = patterns.substr(from);
+    const std::string_view rest = base::Part(patterns, from);
     const std::string_view pattern = rest.substr(0, rest.find_first_of(kSeparators));
     if (ListPatternMatches(pattern, device)) return true;
     from = patterns.find_first_not_of(kSeparators, from + pattern.size());
