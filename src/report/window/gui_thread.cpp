@@ -32,7 +32,8 @@ LRESULT OnTimer(HWND, UINT, WPARAM, LPARAM) {
 }
 
 LRESULT OnClose(HWND window, UINT, WPARAM, LPARAM) {
-  DestroyWindow(window);
+  // A window that stays would cover the device; it cannot outlive its thread.
+  if (DestroyWindow(window) == FALSE) PostQuitMessage(0);
   return 0;
 }
 

@@ -26,30 +26,57 @@ void DrawStatusLines(HDC dc, const Layout& layout) noexcept {
   }
 }
 
-void DrawFill(HDC dc, const Bar& bar, int value) noexcept {
-  HPEN pen = CreatePen(PS_SOLID, kFillWidth, kFillColour);
-  if (pen == nullptr) return;
-  HGDIOBJ previous = SelectObject(dc, pen);
+/// The grey pen of the bars' fills. Lives longer than the context that it is selected into, so that
+/// it can always be deleted.
+class FillPen {
+ public:
+  FillPen() noexcept = default;
+  ~FillPen() {
+    if (pen_ != nullptr) DeleteObject(pen_);
+  }
+  FillPen(const FillPen&) = delete;
+  FillPen& operator=(const FillPen&) = delete;
+
+  /// Made when the first bar needs it; null when that failed.
+  HPEN get() noexcept {
+    if (pen_ == nullptr) pen_ = CreatePen(PS_SOLID, kFillWidth, kFillColour);
+    return pen_;
+  }
+
+ private:
+  HPEN pen_ = nullptr;
+};
+
+struct Canvas {
+  HDC dc;
+  const Layout& layout;
+  FillPen& pen;
+};
+
+void DrawFill(const Canvas& canvas, const Bar& bar, int value) noexcept {
+  HPEN pen = canvas.pen.get();
+  HGDIOBJ previous = pen != nullptr ? SelectObject(canvas.dc, pen) : nullptr;
+  if (previous == nullptr) return;
   const POINT line[] = {bar.fill_start, {bar.fill_start.x + value * bar.step, bar.fill_start.y}};
-  Polyline(dc, line, 2);
-  SelectObject(dc, previous);
-  DeleteObject(pen);
+  Polyline(canvas.dc, line, 2);
+  SelectObject(canvas.dc, previous);
 }
 
-void DrawBar(HDC dc, const Bar& bar, int value) noexcept {
+void DrawBar(const Canvas& canvas, int row, int value) noexcept {
   if (value < 0) return;
-  DrawRectangle(dc, bar.outline);
-  if (value > 0) DrawFill(dc, bar, value);
+  const Bar bar = canvas.layout.BarIn(row);
+  DrawRectangle(canvas.dc, bar.outline);
+  if (value > 0) DrawFill(canvas, bar, value);
 }
 
-void DrawSecondRow(HDC dc, const Layout& layout) noexcept {
+void DrawSecondRow(const Canvas& canvas) noexcept {
   if (window_state.caption_shown.get() != 0) {
-    DrawBar(dc, layout.BarIn(kSecondRow), window_state.file_value.get());
+    DrawBar(canvas, kSecondRow, window_state.file_value.get());
     return;
   }
   CaptionText::Text caption;
   window_state.caption.Copy(caption);
-  DrawLineOfText(dc, layout.Caption(), caption.view());
+  DrawLineOfText(canvas.dc, canvas.layout.Caption(), caption.view());
 }
 
 /// Asks the font's sizes and keeps what the other threads need of them.
@@ -73,6 +100,7 @@ ScreenKind CurrentScreenKind() noexcept {
 }
 
 LRESULT PaintProgressWindow(HWND window) noexcept {
+  FillPen pen;
   PAINTSTRUCT paint = {};
   HDC dc = BeginPaint(window, &paint);
   // An area that stays invalid would be reported for ever; the default handling settles it.
@@ -86,8 +114,9 @@ LRESULT PaintProgressWindow(HWND window) noexcept {
   DrawRectangle(dc, layout.Background());
   // A bar's progress asks for the area below the lines only.
   if (paint.rcPaint.top == 0) DrawStatusLines(dc, layout);
-  DrawBar(dc, layout.BarIn(kOverallRow), window_state.overall_value.get());
-  DrawSecondRow(dc, layout);
+  const Canvas canvas = {dc, layout, pen};
+  DrawBar(canvas, kOverallRow, window_state.overall_value.get());
+  DrawSecondRow(canvas);
 
   EndPaint(window, &paint);
   return 0;

@@ -58,7 +58,9 @@ void SetBar(Shared<int>& bar, int percent) noexcept {
 void WaitForWindow() noexcept {
   HANDLE thread = window_state.thread.get();
   while (window_state.window.get() == nullptr && !window_state.cannot_be_made.get()) {
-    if (WaitForSingleObject(thread, kPollMs) != WAIT_TIMEOUT) return;
+    const DWORD waited = WaitForSingleObject(thread, kPollMs);
+    if (waited == WAIT_OBJECT_0) return;  // the thread is at its end: no window will come
+    if (waited == WAIT_FAILED) Sleep(kPollMs);
   }
 }
 
@@ -73,10 +75,9 @@ void StartGUI(const GuiStart* start) noexcept {
 
   OutputDebugStringW(TEXT("GUI Creating thread\r\n"));
   window_state.cannot_be_made.set(false);
-  GuiStart begin = *start;
+  window_state.start = *start;
   DWORD thread_id = 0;
-  window_state.thread.set(CreateThread(nullptr, 0, GUIMain, &begin, 0, &thread_id));
-  // `begin` lives until the new thread has read it: it does so before either outcome is known.
+  window_state.thread.set(CreateThread(nullptr, 0, GUIMain, &window_state.start, 0, &thread_id));
   if (window_state.thread.get() != nullptr) WaitForWindow();
 }
 
@@ -124,7 +125,10 @@ void ShowProgressWindow() noexcept {
 
 void CloseProgressWindow() noexcept {
   HWND window = window_state.window.get();
-  if (window != nullptr) PostMessageW(window, WM_CLOSE, 0, 0);
+  // Tried twice: a window that misses this message would stay on top of everything.
+  if (window != nullptr && PostMessageW(window, WM_CLOSE, 0, 0) == FALSE) {
+    PostMessageW(window, WM_CLOSE, 0, 0);
+  }
   HANDLE thread = window_state.thread.get();
   if (thread != nullptr) {
     WaitForSingleObject(thread, kCloseWaitMs);

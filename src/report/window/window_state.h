@@ -9,6 +9,7 @@
 #include "base/text.h"
 #include "device/lock.h"
 #include "report/window/line_list.h"
+#include "report/window/progress_window.h"
 
 namespace report {
 
@@ -50,6 +51,8 @@ inline constexpr int kBarUnits = 38;
 inline constexpr int kBarUnitsSmall = 48;  // more, not fewer: the small bar moves in finer steps
 
 struct WindowState {
+  GuiStart start{};  ///< for the window's thread, set before it is created
+
   Shared<HWND> window{nullptr};
   Shared<HANDLE> thread{nullptr};
   Shared<bool> cannot_be_made{false};  ///< the window's thread has given up
