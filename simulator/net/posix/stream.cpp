@@ -43,7 +43,11 @@ int PosixStream::ConnectResult() {
   int error = 0;
   socklen_t size = sizeof error;
   if (getsockopt(file_.get(), SOL_SOCKET, SO_ERROR, &error, &size) != 0) error = errno;
-  return error == 0 ? 0 : ToWinsockError(error);
+  if (error == 0) return 0;
+  // The host wants to be told before the socket may try again.
+  const sockaddr nowhere{};
+  static_cast<void>(connect(file_.get(), &nowhere, sizeof nowhere));
+  return ToWinsockError(error);
 }
 
 int PosixStream::Listen(int backlog) {
