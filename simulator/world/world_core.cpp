@@ -206,6 +206,7 @@ __attribute__((noinline)) void WorldCore::RunBody(SimThread& thread) {
   thread.first_frame = __builtin_frame_address(0);
   if (setjmp(thread.way_out) != 0) return;
   const std::uint32_t code = thread.body();
+  const Lock lock = Acquire();  // another thread may terminate this one at its last step
   if (!thread.terminate) thread.code_to_leave_with = code;
 }
 
