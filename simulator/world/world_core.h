@@ -72,7 +72,7 @@ class WorldCore : public World {
 
  private:
   void ThreadMain(SimThread& thread);
-  static void RunBody(SimThread& thread);
+  void RunBody(SimThread& thread);
   void EndThreadsWhere(const std::function<bool(const SimThread&)>& chosen);
   void JoinEnded();
 
