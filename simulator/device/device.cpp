@@ -38,9 +38,11 @@ Device::Device(World& world, Profile profile, std::filesystem::path folder)
       network_(std::make_unique<Network>(*this)),
       screen_(std::make_unique<Screen>(*this)) {}
 
-// No thread may still use a part when it goes.
+// No thread may still use a part when it goes, and what handles stand for goes before the parts.
 Device::~Device() {
   world_.EndThreads(*this);
+  const World::Lock lock = world_.Acquire();
+  handles_->Clear();
 }
 
 Device& Device::Current(const char* what) {

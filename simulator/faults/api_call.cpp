@@ -16,6 +16,16 @@ namespace {
 /// trace different.
 constexpr std::uintptr_t kHighestHandle = 0x00FFFFFF;
 
+/// A thread that calls this often and never waits is caught in a loop: nothing else of its virtual
+/// world will ever run again.
+constexpr std::uint32_t kCallsWithoutWait = 20'000'000;
+
+[[noreturn]] void DieInLoop(const SimThread& thread, const char* call) {
+  std::fprintf(stderr, "cesim: thread %u \"%s\" never waits, its last call is %s\n", thread.id,
+               thread.name.c_str(), call);
+  std::abort();
+}
+
 void AppendPointer(std::string& out, std::uintptr_t value) {
   const bool root_key = value >= 0x80000000U && value <= 0x8000000FU;
   if (value == ~static_cast<std::uintptr_t>(0)) {
@@ -39,6 +49,7 @@ ApiCall::ApiCall(const char* name, std::uint32_t usual_error)
   device_ = thread_->device;
   outer_call_ = thread_->call.load(std::memory_order_relaxed);
   thread_->call.store(name, std::memory_order_relaxed);
+  if (++thread_->calls == kCallsWithoutWait && world().is_virtual()) DieInLoop(*thread_, name);
   traced_ = device_->trace().on();
   const bool can_fail = usual_error != kCannotFail;
   failed_ = device_->faults().Enter(name, can_fail, usual_error, fault_error_);

@@ -38,7 +38,7 @@ class Debug {
   void Clear();
 
   /// Gets every text of OutputDebugStringW as UTF-8, from the thread that put it out; an empty
-  /// function ends that.
+  /// function ends that. It must not call this class.
   void SetListener(Listener listener);
 
   // For the API functions.

@@ -39,4 +39,12 @@ std::shared_ptr<KernelObject> HandleTable::Remove(HANDLE handle) {
   return object;
 }
 
+void HandleTable::Clear() {
+  while (!objects_.empty()) {
+    // Out of the table first: an object may remove handles of its own when it goes.
+    const std::shared_ptr<KernelObject> object = std::move(objects_.begin()->second);
+    objects_.erase(objects_.begin());
+  }
+}
+
 }  // namespace sim

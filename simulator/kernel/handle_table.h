@@ -2,10 +2,10 @@
 #pragma once
 
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
-#include <unordered_map>
 #include <vector>
 
 #include "ce/types.h"
@@ -78,10 +78,12 @@ class HandleTable {
   }
   /// @return the object that the handle stood for, null for an unknown handle.
   std::shared_ptr<KernelObject> Remove(HANDLE handle);
+  /// Removes everything, in the order in which the handles were made.
+  void Clear();
   [[nodiscard]] std::size_t open_handles() const { return objects_.size(); }
 
  private:
-  std::unordered_map<std::uint32_t, std::shared_ptr<KernelObject>> objects_;
+  std::map<std::uint32_t, std::shared_ptr<KernelObject>> objects_;
   std::uint32_t next_ = 0x10;
 };
 

@@ -13,7 +13,7 @@ namespace {
 using sim::ApiCall;
 
 /// A program that asks for the time this often without a pause waits for time to pass.
-constexpr unsigned kAsksBeforeTimePasses = 1000;
+constexpr std::uint32_t kAsksBeforeTimePasses = 1000;
 
 std::shared_ptr<sim::ThreadObject> FindThread(const ApiCall& call, HANDLE handle) {
   return call.device().handles().FindAs<sim::ThreadObject>(handle);

@@ -1,4 +1,10 @@
-// The opt-in record of a device's API calls: one JSON line a call.
+// The opt-in record of a device's API calls: one JSON line a call, written when the call returns.
+//
+//   {"us":2000,"thread":258,"call":"SetEvent","args":{"handle":20},"result":1,"error":0}
+//
+// "us" is the world's time, "error" the thread's last error after the call. A call that was made to
+// fail has "fault":true; one that its thread did not come back from has "ended":true and neither
+// result nor error. In a virtual world equal seeds give equal lines.
 #pragma once
 
 #include <atomic>

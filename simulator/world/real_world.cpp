@@ -127,6 +127,7 @@ class RealWorld final : public WorldCore {
     if (self.terminate) Leave(self);
     self.state = SimThread::State::kBlocked;
     self.notified = false;
+    self.calls = 0;
     self.time_asked = 0;
     EnterQueues(self, queues);
     return self;

@@ -35,14 +35,16 @@ struct SimThread {
   bool attached = false;                   ///< a host thread that joined; it cannot be terminated
   bool leaving = false;                    ///< its stack is being abandoned
   std::atomic<const char*> call{nullptr};  ///< the API call it is in
-  unsigned time_asked = 0;                 ///< GetTickCount calls since it last waited
+  std::uint32_t calls = 0;                 ///< API calls since it last waited
+  std::uint32_t time_asked = 0;            ///< GetTickCount calls among them
   WaitQueue finished;                      ///< notified when the thread has ended
   /// Who else is told of the end, in this order. An entry leaves the list when it ends itself.
   std::vector<ThreadEndListener*> end_listeners;
 
   // The world's own bookkeeping.
   SimThread* outer = nullptr;  ///< the part that the host thread played when it attached again
-  std::uint32_t code_to_leave_with = 0;
+  std::uint32_t code_to_leave_with = 0;  ///< when it is terminated
+  std::uint32_t code_of_body = 0;        ///< when it is not; no lock needed
   std::condition_variable wake;
   bool notified = false;
   bool timed_out = false;

@@ -32,6 +32,7 @@ class VirtualWorld final : public WorldCore {
     if (self.terminate) Leave(self);
     self.state = SimThread::State::kBlocked;
     self.timed_out = false;
+    self.calls = 0;
     self.time_asked = 0;
     EnterQueues(self, queues);
     if (deadline) StartTimer(self, *deadline);

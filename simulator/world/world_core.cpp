@@ -196,7 +196,7 @@ void WorldCore::ThreadMain(SimThread& thread) {
   thread.body = nullptr;
   if (thread.wake_file >= 0) close(thread.wake_file);
   thread.wake_file = -1;
-  Finish(thread, thread.code_to_leave_with);
+  Finish(thread, thread.terminate ? thread.code_to_leave_with : thread.code_of_body);
   ended_.push_back(&thread);
   thread_ended_.notify_all();
   Ended(thread);
@@ -205,9 +205,7 @@ void WorldCore::ThreadMain(SimThread& thread) {
 __attribute__((noinline)) void WorldCore::RunBody(SimThread& thread) {
   thread.first_frame = __builtin_frame_address(0);
   if (setjmp(thread.way_out) != 0) return;
-  const std::uint32_t code = thread.body();
-  const Lock lock = Acquire();  // another thread may terminate this one at its last step
-  if (!thread.terminate) thread.code_to_leave_with = code;
+  thread.code_of_body = thread.body();
 }
 
 void WorldCore::Leave(SimThread& thread) {
