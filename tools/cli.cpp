@@ -74,6 +74,8 @@ int RunCommandLine(int argc, char** argv) {
   Action action;
   AddBundleVerb(app, action);
   AddServeVerb(app, action);
+  AddDeviceVerb(app, action);
+  AddRunVerb(app, action);
   try {
     RefuseUnknownVerb(app, argc, argv);
     app.parse(argc, argv);

@@ -14,6 +14,8 @@ using Action = std::function<ExitCode()>;
 /// Each adds one verb with its options, and sets `action` when the command line names it.
 void AddBundleVerb(CLI::App& app, Action& action);
 void AddServeVerb(CLI::App& app, Action& action);
+void AddDeviceVerb(CLI::App& app, Action& action);
+void AddRunVerb(CLI::App& app, Action& action);
 
 /// Adds --json, with the verb's own words about what it changes.
 void AddJsonOption(CLI::App& verb, bool& json, const std::string& effect);

@@ -1,0 +1,24 @@
+#include <memory>
+
+#include "tools/cli.h"
+#include "tools/run.h"
+
+namespace tools {
+
+void AddRunVerb(CLI::App& app, Action& action) {
+  CLI::App* run = app.add_subcommand("run", "Run a job on a simulated device and watch it");
+  auto options = std::make_shared<RunOptions>();
+  run->add_option("JOB", options->job, "the job file, as 'bundle make' writes it")->required();
+  run->add_option("--device", options->device, "the device's folder, from 'device new'")
+      ->required();
+  run->add_option("--screens", options->screens, "save a picture of every paint in this folder");
+  run->add_option("--timeout", options->timeout_s, "seconds to wait for the end of the upgrade")
+      ->capture_default_str();
+  run->add_option("--library", options->library,
+                  "the configlet library (default: lib/liborvenix.so beside this program)");
+  AddJsonOption(*run, options->json, "print one JSON object a line for everything that happens");
+  run->footer("Example:\n  orvenix run ./bundle/job.xml --device ./handheld --screens ./screens");
+  run->callback([options, &action] { action = [options] { return Run(*options); }; });
+}
+
+}  // namespace tools

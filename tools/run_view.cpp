@@ -1,0 +1,125 @@
+#include "tools/run_view.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <iostream>
+
+namespace tools {
+namespace {
+
+constexpr int kBarWidth = 20;
+constexpr const char* kClearLine = "\r\x1b[K";
+
+bool SameBar(const std::optional<sim::BarView>& a, const std::optional<sim::BarView>& b) {
+  if (a.has_value() != b.has_value()) return false;
+  return !a || (a->filled == b->filled && a->total == b->total);
+}
+
+/// Texts of the device may hold anything, and a terminal obeys control characters.
+std::string WithoutControls(std::string text) {
+  std::replace_if(
+      text.begin(), text.end(), [](unsigned char letter) { return letter < ' ' || letter == 0x7F; },
+      ' ');
+  return text.substr(0, text.find_last_not_of(' ') + 1);
+}
+
+}  // namespace
+
+std::vector<std::string> NewLines(const std::vector<std::string>& before,
+                                  const std::vector<std::string>& now) {
+  // The longest end of the old list that the new one begins with.
+  std::size_t kept = std::min(before.size(), now.size());
+  while (kept > 0 &&
+         !std::equal(before.end() - static_cast<std::ptrdiff_t>(kept), before.end(), now.begin())) {
+    --kept;
+  }
+  return {now.begin() + static_cast<std::ptrdiff_t>(kept), now.end()};
+}
+
+int Percent(const sim::BarView& bar) {
+  return bar.total <= 0 ? 0 : std::clamp(100 * bar.filled / bar.total, 0, 100);
+}
+
+std::string FormatBar(const sim::BarView& bar, int width) {
+  const int percent = Percent(bar);
+  const int filled = width * percent / 100;
+  std::string text = "[" + std::string(static_cast<std::size_t>(filled), '#') +
+                     std::string(static_cast<std::size_t>(width - filled), '.') + "]";
+  const std::string number = std::to_string(percent);
+  return text + std::string(4 - number.size(), ' ') + number + "%";
+}
+
+RunView::~RunView() {
+  if (bars_shown_) std::cout << std::endl;
+}
+
+void RunView::Print(const nlohmann::ordered_json& event) {
+  std::cout << event.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace) << std::endl;
+}
+
+void RunView::Line(const std::string& text) {
+  if (bars_shown_) std::cout << kClearLine;
+  bars_shown_ = false;
+  std::cout << WithoutControls(text) << std::endl;
+}
+
+void RunView::Bars(const sim::ProgressView& view) {
+  if (!view.overall) return;
+  if (style_ == Style::kJson) {
+    nlohmann::ordered_json event{{"event", "progress"}, {"overall", Percent(*view.overall)}};
+    if (view.file) event["file"] = Percent(*view.file);
+    Print(event);
+    return;
+  }
+  std::string bars = "overall " + FormatBar(*view.overall, kBarWidth);
+  if (view.file) bars += "   file " + FormatBar(*view.file, kBarWidth);
+  if (style_ == Style::kTerminal) {
+    std::cout << kClearLine << bars << std::flush;
+    bars_shown_ = true;
+  } else if (!last_ || !SameBar(last_->overall, view.overall)) {
+    Line(bars);
+  }
+}
+
+void RunView::ShowProgress(const sim::ProgressView& view) {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  const std::vector<std::string> none;
+  const auto lines = NewLines(last_ ? last_->status_lines : none, view.status_lines);
+  for (const std::string& line : lines) {
+    if (style_ == Style::kJson) {
+      Print({{"event", "status"}, {"text", line}});
+    } else {
+      Line("  " + line);
+    }
+  }
+  const bool moved =
+      !last_ || !SameBar(last_->overall, view.overall) || !SameBar(last_->file, view.file);
+  if (moved || (style_ == Style::kTerminal && !lines.empty())) Bars(view);
+  last_ = view;
+}
+
+void RunView::ShowDocument(const std::string& text) {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  if (style_ == Style::kJson) {
+    Print({{"event", "document"}, {"text", text}});
+  } else {
+    Line("document: " + text);
+  }
+}
+
+void RunView::ShowRemark(const std::string& text) {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  if (style_ != Style::kJson) Line(text);
+}
+
+void RunView::ShowEvent(const nlohmann::ordered_json& event) {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  if (style_ == Style::kJson) Print(event);
+}
+
+std::optional<sim::ProgressView> RunView::last() const {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  return last_;
+}
+
+}  // namespace tools

@@ -1,0 +1,58 @@
+// What somebody at the terminal sees of a running upgrade.
+#pragma once
+
+#include <cstdint>
+#include <mutex>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "window/progress_view.h"
+
+namespace tools {
+
+/// The lines of `now` that came after `before`, when lines enter a list at its end and leave it at
+/// its beginning. Lines that stand in both count as the same as far as the order allows.
+[[nodiscard]] std::vector<std::string> NewLines(const std::vector<std::string>& before,
+                                                const std::vector<std::string>& now);
+
+/// "[#####.....]  50%".
+[[nodiscard]] std::string FormatBar(const sim::BarView& bar, int width);
+[[nodiscard]] int Percent(const sim::BarView& bar);
+
+/// Shows an upgrade while it runs: status lines as they come, both bars in the last line of a
+/// terminal (elsewhere a line whenever the upper bar has moved), documents and remarks; with JSON
+/// one object a line. Any thread may call any of it.
+class RunView {
+ public:
+  enum class Style : std::uint8_t { kTerminal, kPlain, kJson };
+
+  explicit RunView(Style style) : style_(style) {}
+  /// Ends the line of the bars.
+  ~RunView();
+  RunView(const RunView&) = delete;
+  RunView& operator=(const RunView&) = delete;
+
+  void ShowProgress(const sim::ProgressView& view);
+  void ShowDocument(const std::string& text);
+  /// A line of the program's own. With JSON it is left out; the events say the same.
+  void ShowRemark(const std::string& text);
+  /// An object of its own; shown with JSON only.
+  void ShowEvent(const nlohmann::ordered_json& event);
+
+  /// The window as it was seen last.
+  [[nodiscard]] std::optional<sim::ProgressView> last() const;
+
+ private:
+  void Line(const std::string& text);
+  void Bars(const sim::ProgressView& view);
+  static void Print(const nlohmann::ordered_json& event);
+
+  const Style style_;
+  mutable std::mutex mutex_;
+  std::optional<sim::ProgressView> last_;
+  bool bars_shown_ = false;
+};
+
+}  // namespace tools
