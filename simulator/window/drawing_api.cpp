@@ -105,8 +105,8 @@ void DrawTextCall(const Target& target, Font& font, const TextCall& what) {
   }
   const RECT place = target.OnSurface(cells);
   if (target.context->background_mode == OPAQUE) Fill(image, clip, place, kWhite);
-  Text(image, clip, font, place.left, place.top, what.text, what.spacing,
-       target.context->text_colour);
+  Text(image, clip, font,
+       {{place.left, place.top}, what.text, what.spacing, target.context->text_colour});
 }
 
 }  // namespace
@@ -191,6 +191,7 @@ COLORREF SetTextColor(HDC dc, COLORREF colour) {
   return call.Return(std::exchange(context->text_colour, colour & 0xFFFFFFU));
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's signature
 BOOL ExtTextOutW(HDC dc, int x, int y, UINT options, const RECT* clip, const WCHAR* text,
                  UINT length, const INT* spacing) {
   sim::ApiCall call("ExtTextOutW", ERROR_INVALID_HANDLE);

@@ -104,12 +104,11 @@ class WideLine {
 };
 
 void DrawGlyph(Image& image, const RECT& clip, const Glyph& glyph, int x, int y, COLORREF colour) {
+  auto coverage = glyph.coverage.begin();
   for (int row = 0; row < glyph.height; ++row) {
-    for (int column = 0; column < glyph.width; ++column) {
-      const unsigned coverage =
-          glyph.coverage[static_cast<std::size_t>(row * glyph.width + column)];
-      if (coverage != 0 && Contains(clip, x + column, y + row)) {
-        Mix(image, x + column, y + row, colour, coverage);
+    for (int column = 0; column < glyph.width; ++column, ++coverage) {
+      if (*coverage != 0 && Contains(clip, x + column, y + row)) {
+        Mix(image, x + column, y + row, colour, *coverage);
       }
     }
   }
@@ -172,17 +171,16 @@ void Line(Image& image, const RECT& clip, POINT from, POINT to, int width, COLOR
   }
 }
 
-int Text(Image& image, const RECT& clip, Font& font, int x, int y, std::u16string_view text,
-         const INT* spacing, COLORREF colour) {
+int Text(Image& image, const RECT& clip, Font& font, const TextRun& run) {
   const RECT inside = Intersect(image.area(), clip);
-  const int baseline = y + font.metrics().ascent;
-  int at = x;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    const Glyph& glyph = font.GlyphOf(text[i]);
-    DrawGlyph(image, inside, glyph, at + glyph.left, baseline - glyph.top, colour);
-    at += spacing != nullptr ? spacing[i] : glyph.advance;
+  const int baseline = run.at.y + font.metrics().ascent;
+  int x = run.at.x;
+  for (std::size_t i = 0; i < run.text.size(); ++i) {
+    const Glyph& glyph = font.GlyphOf(run.text[i]);
+    DrawGlyph(image, inside, glyph, x + glyph.left, baseline - glyph.top, run.colour);
+    x += run.spacing != nullptr ? run.spacing[i] : glyph.advance;
   }
-  return at - x;
+  return x - run.at.x;
 }
 
 }  // namespace sim

@@ -65,11 +65,14 @@ void Blit(Image& image, const RECT& clip, int x, int y, const Image& from);
 /// A straight line with flat ends, without its last point. A line of even width stands half a
 /// pixel to the upper left: 8 wide at y 20 it covers rows 16 to 23.
 void Line(Image& image, const RECT& clip, POINT from, POINT to, int width, COLORREF colour);
-/// @param x,y  upper left corner of the text
-/// @param spacing  advance of each character, null for the font's
+struct TextRun {
+  POINT at;  ///< upper left corner
+  std::u16string_view text;
+  const INT* spacing;  ///< advance of each character, null for the font's
+  COLORREF colour;
+};
 /// @return the width of the text.
-int Text(Image& image, const RECT& clip, Font& font, int x, int y, std::u16string_view text,
-         const INT* spacing, COLORREF colour);
+int Text(Image& image, const RECT& clip, Font& font, const TextRun& run);
 
 // PNG files. False, with one line in `error`, when the file is at fault or the simulator was built
 // without pictures.

@@ -53,6 +53,7 @@ ATOM RegisterClassW(const WNDCLASSW* window_class) {
   return call.Return(made->atom);
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's signature
 HWND CreateWindowExW(DWORD extended_style, const WCHAR* class_name, const WCHAR* title, DWORD style,
                      int x, int y, int width, int height, HWND parent, HMENU menu,
                      HINSTANCE instance, void* parameter) {

@@ -16,7 +16,9 @@ std::unique_ptr<Font> MakeSystemFont() {
   return MakeBitmapFont();
 }
 
-bool HavePictures() { return false; }
+bool HavePictures() {
+  return false;
+}
 
 bool WritePng(const Image&, const std::filesystem::path& file, std::string& error) {
   error = "cannot write the picture " + file.string() + ": " + kWithout;

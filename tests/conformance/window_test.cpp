@@ -542,6 +542,32 @@ TEST_F(WindowConformance, TheDevicesResolutionIsTheDesktops) {
   ReleaseDC(nullptr, dc);
 }
 
+TEST_F(WindowConformance, DrawingNeedsAContextAndALineTwoPoints) {
+  HWND window = MakeWindow(WS_VISIBLE);
+  HDC dc = GetDC(window);
+  const POINT points[] = {{1, 1}, {5, 1}};
+
+  EXPECT_TRUE(Polyline(dc, points, 2));
+  EXPECT_FALSE(Polyline(dc, points, 1));
+  EXPECT_TRUE(ExtTextOutW(dc, 1, 1, 0, nullptr, TEXT("text"), 4, nullptr));
+  EXPECT_TRUE(ExtTextOutW(dc, 1, 1, 0, nullptr, TEXT(""), 0, nullptr));
+  ReleaseDC(window, dc);
+  EXPECT_FALSE(Polyline(dc, points, 2));
+  EXPECT_FALSE(ExtTextOutW(dc, 1, 1, 0, nullptr, TEXT("text"), 4, nullptr));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
+}
+
+TEST_F(WindowConformance, AMessageBoxTellsWhichButtonWasPressed) {
+  EXPECT_EQ(MessageBoxW(nullptr, TEXT("Text"), TEXT("Caption"), MB_OK), IDOK);
+}
+
+TEST_F(WindowConformance, OnlyKeysAreTranslated) {
+  MSG message = {};
+  message.message = WM_PAINT;
+
+  EXPECT_FALSE(TranslateMessage(&message));
+}
+
 TEST_F(WindowConformance, ModesAndColoursGiveBackTheOnesBefore) {
   HDC dc = GetDC(MakeWindow(WS_VISIBLE));
 

@@ -3,8 +3,6 @@
 
 #include <coredll.h>
 
-#include <algorithm>
-
 namespace report {
 
 /// Sizes of the window's font, as GetTextMetricsW tells them.
@@ -99,7 +97,8 @@ class Layout {
 /// in single precision. Whole numbers give the same value for every percent, on every processor
 /// and without its floating-point library; the assertion below says so.
 [[nodiscard]] constexpr int BarValue(int percent, int units) noexcept {
-  return std::clamp(percent, 0, 100) * units / 100;
+  const int held = percent < 0 ? 0 : percent > 100 ? 100 : percent;
+  return held * units / 100;
 }
 
 constexpr bool BarValueIsTheSinglePrecisionProduct(int units) noexcept {

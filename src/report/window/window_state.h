@@ -73,6 +73,6 @@ struct WindowState {
 };
 
 /// The process has one progress window.
-extern WindowState window_state;
+extern WindowState window_state;  // NOLINT(bugprone-dynamic-static-initializers): it is constant
 
 }  // namespace report

@@ -111,13 +111,13 @@ TEST(ImageTest, TextIsWrittenFromItsUpperLeftCornerAndClipped) {
   Image image(30, 20, kPaper);
   const auto font = MakeBitmapFont();
 
-  const int width = Text(image, image.area(), *font, 2, 3, u"Il", nullptr, kInk);
+  const int width = Text(image, image.area(), *font, {{2, 3}, u"Il", nullptr, kInk});
 
   EXPECT_EQ(width, 2 * 6);
   // The letters' first row is 3 below the line's top: an ascent of 10, 7 of them inked.
   ExpectArea(Inked(image), {3, 6, 12, 13});
   Image clipped(30, 20, kPaper);
-  Text(clipped, {0, 0, 5, 8}, *font, 2, 3, u"Il", nullptr, kInk);
+  Text(clipped, {0, 0, 5, 8}, *font, {{2, 3}, u"Il", nullptr, kInk});
   ExpectArea(Inked(clipped), {3, 6, 5, 8});
 }
 
@@ -126,7 +126,7 @@ TEST(ImageTest, SpacingReplacesTheFontsAdvance) {
   const auto font = MakeBitmapFont();
   const INT spacing[] = {30, 4};
 
-  EXPECT_EQ(Text(image, image.area(), *font, 0, 0, u"II", spacing, kInk), 34);
+  EXPECT_EQ(Text(image, image.area(), *font, {{0, 0}, u"II", spacing, kInk}), 34);
   EXPECT_EQ(image.At(2 + 30, 5), kInk);
 }
 
