@@ -558,6 +558,46 @@ TYPED_TEST(SocketTest, FailsWithTheUsualErrorOfAFault) {
   EXPECT_EQ(ce_inet_ntoa(ce_in_addr{}), nullptr);
 }
 
+/// A conversation that gives up at the first call that fails.
+bool Converse(SOCKET listener) {
+  const SOCKET client = Tcp();
+  SOCKET server = CE_INVALID_SOCKET;
+  ce_sockaddr_in name{};
+  int size = sizeof name;
+  char bytes[4] = {};
+  std::uint32_t pending = 0;
+  const bool whole = ce_getsockname(listener, reinterpret_cast<ce_sockaddr*>(&name), &size) == 0 &&
+                     SetNumber(client, CE_IPPROTO_TCP, CE_TCP_NODELAY, 1) == 0 &&
+                     Connect(client, kDevice, sim::ToEndpoint(name).port) == 0 &&
+                     (server = ce_accept(listener, nullptr, nullptr)) != CE_INVALID_SOCKET &&
+                     SendText(client, "ping") == 4 && Select(server, For::kRead, 1000) == 1 &&
+                     ce_ioctlsocket(server, CE_FIONREAD, &pending) == 0 &&
+                     ce_recv(server, bytes, 4, 0) == 4 && ce_shutdown(server, CE_SD_SEND) == 0 &&
+                     ce_recv(client, bytes, 4, 0) == 0;
+  const bool closed = ce_closesocket(server) == 0;
+  return ce_closesocket(client) == 0 && closed && whole;
+}
+
+TYPED_TEST(SocketTest, SurvivesTheFailureOfEachCallInTurn) {
+  std::uint64_t nth = 1;
+  for (;; ++nth) {
+    ASSERT_LT(nth, 100U);
+    const SOCKET listener = Listener();
+    const std::uint64_t fired = this->device().faults().fired();
+    this->device().faults().Add({"*", nth, 1, 0});
+    const bool whole = Converse(listener);
+    const bool failed = this->device().faults().fired() > fired;
+    this->device().faults().Clear();
+    ce_closesocket(listener);
+    EXPECT_EQ(whole, !failed) << "call " << nth << ", " << this->device().faults().last_fired();
+    if (!failed) break;
+  }
+
+  EXPECT_EQ(nth, 14U) << "thirteen calls that can fail";
+  ce_WSACleanup();
+  EXPECT_EQ(this->device().network().open_sockets(), 0U);
+}
+
 TYPED_TEST(SocketTest, ClosesWhatIsLeftWhenWinsockIsCleanedUpForTheLastTime) {
   ce_WSADATA data;
   ASSERT_EQ(ce_WSAStartup(MAKEWORD(2, 2), &data), 0);
