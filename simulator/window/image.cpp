@@ -131,8 +131,13 @@ COLORREF Image::At(int x, int y) const {
 
 void Fill(Image& image, const RECT& clip, const RECT& area, COLORREF colour) {
   const RECT inside = Intersect(Intersect(image.area(), clip), area);
-  for (int y = inside.top; y < inside.bottom; ++y) {
-    for (int x = inside.left; x < inside.right; ++x) Put(image, x, y, colour);
+  if (IsEmpty(inside)) return;
+  // One row pixel by pixel, the others as copies of it: backgrounds are most of what is drawn.
+  for (int x = inside.left; x < inside.right; ++x) Put(image, x, inside.top, colour);
+  const auto* first = &image.rgb[Offset(image, inside.left, inside.top)];
+  const auto bytes = static_cast<std::ptrdiff_t>(inside.right - inside.left) * 3;
+  for (int y = inside.top + 1; y < inside.bottom; ++y) {
+    std::copy(first, first + bytes, &image.rgb[Offset(image, inside.left, y)]);
   }
 }
 

@@ -240,6 +240,21 @@ TEST_F(ProgressWindowTest, TheNextJobOfAProcessHasAWindowOfItsOwn) {
   EXPECT_EQ(view().file->filled, 0);
 }
 
+TEST_F(ProgressWindowTest, AfterSomebodyClosedItTheUpgradeGoesOnWithoutIt) {
+  Start();
+  HWND window = window_state.window.get();
+  SendMessageW(window, WM_CLOSE, 0, 0);
+  ASSERT_FALSE(IsWindow(window));
+
+  ShowStatus("unseen");
+  SetOverallProgress(50);
+  const GuiStart start = {nullptr, SW_SHOWNORMAL};
+  StartGUI(&start);
+
+  EXPECT_EQ(window_state.window.get(), window) << "the handle stays until the job ends";
+  EXPECT_THAT(screen().Windows(), IsEmpty());
+}
+
 TEST_F(ProgressWindowTest, LeavesNeitherPensNorContextsNorMemoryBehind) {
   Start();
   for (int i = 0; i < 40; ++i) {
