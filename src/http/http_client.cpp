@@ -23,6 +23,9 @@ std::uint32_t Resolve(const UrlParts& url) noexcept {
 
 }  // namespace
 
+CHTTPClient::CHTTPClient() noexcept = default;
+CHTTPClient::~CHTTPClient() = default;
+
 bool CHTTPClient::OpenURL(const WCHAR* url, UrlText& path) noexcept {
   path.Clear();
   if (url == nullptr) return false;

@@ -44,6 +44,10 @@ class CHTTPClient : public CSocketIO, public device::OnLocalHeap {
   /// Receive buffer, and the largest checkpoint block that a server may ask for, in bytes.
   static constexpr std::uint32_t kBufferSize = 16384;
 
+  CHTTPClient() noexcept;
+  /// Closes file and connection at once.
+  ~CHTTPClient();
+
   /// Connects to the server of `url`, or keeps the connection there is when it goes to the same
   /// address and port.
   /// @param url   "http://HOST:PORT/PATH"; either kind of slash. Null fails without a log line.
