@@ -1,0 +1,110 @@
+#include "product_support/host.h"
+
+#include <ostream>
+
+#include "ce/kernel.h"
+#include "configlet/walk.h"
+#include "kernel/handle_table.h"
+#include "kernel/kernel.h"
+#include "memory/memory.h"
+#include "net/network.h"
+#include "orvenix/configlet.h"
+#include "power/power.h"
+#include "window/screen.h"
+
+namespace test {
+namespace {
+
+void Set(const char* name, const std::string& value) {
+  if (!value.empty()) IcfgSetField(name, 0, value.c_str());
+}
+
+void SetFile(const HostFile& file) {
+  Set("Source", file.source);
+  Set("Dest", file.destination);
+  Set("MCTMask", file.masks);
+  Set("CRC", file.crc);
+}
+
+void WalkFiles(const HostJob& job) {
+  if (job.list) {
+    IcfgBeginGroup("FileList", 0, 0);
+    SetFile(*job.list);
+    IcfgEndGroup("FileList", 0, 0);
+  }
+  IcfgBeginGroup("Download", 0, 0);
+  for (const HostFile& file : job.files) {
+    IcfgBeginGroup("File", 0, 0);
+    SetFile(file);
+    IcfgEndGroup("File", 0, 0);
+  }
+  IcfgEndGroup("Download", 0, 0);
+}
+
+}  // namespace
+
+std::uint32_t WalkJob(const HostJob& job) {
+  IcfgBeginGroup("Orvenix", 0, 0);
+  const std::uint32_t result = IcfgBeginGroup("Upgrade", 0, 0);
+  Set("ShowGUI", job.show_gui ? "true" : "false");
+  IcfgBeginGroup("Syslog", 0, 0);
+  Set("Port", job.syslog_port);
+  Set("Address", job.syslog_address);
+  IcfgEndGroup("Syslog", 0, 0);
+  IcfgBeginGroup("HTTPServer", 0, 0);
+  Set("BaseURL", job.base_url);
+  IcfgEndGroup("HTTPServer", 0, 0);
+  WalkFiles(job);
+  IcfgBeginGroup("StorageRequirements", 0, 0);
+  IcfgBeginGroup("Store", 0, 0);
+  Set("Name", job.store);
+  Set("RequiredSpace", job.required_space);
+  IcfgEndGroup("Store", 0, 0);
+  IcfgEndGroup("StorageRequirements", 0, 0);
+  return result;
+}
+
+std::uint32_t EndJob() {
+  const std::uint32_t result = IcfgEndGroup("Upgrade", 0, 0);
+  IcfgEndGroup("Orvenix", 0, 0);
+  return result;
+}
+
+bool AwaitEndOfJobs(sim::Device& device, std::uint32_t limit_s) {
+  for (std::uint32_t waited = 0; device.kernel().LiveThreads() > 1; ++waited) {
+    if (waited >= limit_s) return false;
+    Sleep(1000);
+  }
+  return true;
+}
+
+Holdings HoldingsOf(sim::Device& device) {
+  Holdings holdings;
+  holdings.handles = device.kernel().OpenHandles();
+  holdings.sockets = device.network().open_sockets();
+  holdings.blocks = device.memory().live_blocks();
+  holdings.gdi_objects = device.screen().gdi_objects();
+  holdings.device_contexts = device.screen().device_contexts();
+  holdings.power_requirements = device.power().Held().size();
+  holdings.windows = device.screen().Windows().size();
+  const auto lock = device.world().Acquire();
+  holdings.sockets_started = device.network().started();
+  return holdings;
+}
+
+void PrintTo(const Holdings& holdings, std::ostream* out) {
+  *out << holdings.handles << " handles, " << holdings.sockets << " sockets, " << holdings.blocks
+       << " blocks, " << holdings.gdi_objects << " pens, " << holdings.device_contexts
+       << " device contexts, " << holdings.power_requirements << " power requirements, "
+       << holdings.windows << " windows, sockets started " << holdings.sockets_started << " times";
+}
+
+void DropKeptJob() {
+  configlet::Walk& walk = configlet::TheWalk();
+  UpgradeConfig* const job = walk.job;
+  if (job == nullptr) return;
+  configlet::ForgetJob(job);
+  delete job;
+}
+
+}  // namespace test

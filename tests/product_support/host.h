@@ -1,0 +1,66 @@
+// The management client of a device, as tests play it: it walks a job through the exported
+// functions, waits, and looks at what the device has left.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "device/device.h"
+
+namespace test {
+
+struct HostFile {
+  std::string source;
+  std::string destination;
+  std::string masks = "*";
+  std::string crc = "0";
+};
+
+/// One job as a host sends it. Empty texts are not sent.
+struct HostJob {
+  std::string base_url = "http://127.0.0.2";
+  std::vector<HostFile> files;
+  std::optional<HostFile> list;
+  std::string store = "\\";
+  std::string required_space = "1000";
+  std::string syslog_port;
+  std::string syslog_address;
+  bool show_gui = true;
+};
+
+/// Walks all groups but "Upgrade"'s end. @return the result of beginning "Upgrade".
+std::uint32_t WalkJob(const HostJob& job);
+/// Ends "Upgrade" and "Orvenix". @return the result of the first.
+std::uint32_t EndJob();
+
+/// Waits in the device's time until no thread but the caller's is left.
+/// @return false when that has not come about after `limit_s` seconds
+bool AwaitEndOfJobs(sim::Device& device, std::uint32_t limit_s = 3600);
+
+/// What a program of the device may hold too much of.
+struct Holdings {
+  std::size_t handles = 0;
+  std::size_t sockets = 0;
+  std::size_t blocks = 0;
+  std::size_t gdi_objects = 0;
+  std::size_t device_contexts = 0;
+  std::size_t power_requirements = 0;
+  std::size_t windows = 0;
+  unsigned sockets_started = 0;
+
+  friend bool operator==(const Holdings& a, const Holdings& b) {
+    return a.handles == b.handles && a.sockets == b.sockets && a.blocks == b.blocks &&
+           a.gdi_objects == b.gdi_objects && a.device_contexts == b.device_contexts &&
+           a.power_requirements == b.power_requirements && a.windows == b.windows &&
+           a.sockets_started == b.sockets_started;
+  }
+};
+Holdings HoldingsOf(sim::Device& device);
+void PrintTo(const Holdings& holdings, std::ostream* out);
+
+/// Frees the job that the configlet still keeps because no thread has taken it over.
+void DropKeptJob();
+
+}  // namespace test
