@@ -13,6 +13,8 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr std::string_view kVolume = "volume ";
+/// Belongs to the management client, which a device has before any upgrade.
+constexpr const char* kClientFolder = "storage/Tarnwell/TWSubSystems";
 
 /// The volume of this path; a new one when the profile has none.
 sim::VolumeProfile& VolumeNamed(sim::Profile& profile, std::string_view path) {
@@ -85,7 +87,7 @@ sim::Profile MakeDeviceFolder(const fs::path& folder, const fs::path& profile,
   std::string error_text;
   sim::Profile made = profile.empty() ? sim::Profile{} : Load(profile);
   for (const std::string& setting : settings) ApplySetting(setting, made);
-  fs::create_directories(folder, error);
+  fs::create_directories(folder / kClientFolder, error);
   const fs::path file = folder / kDeviceProfile;
   if (!sim::SaveProfile(file, made, error_text)) {
     throw Failure(ExitCode::kCannotWrite, file.string(), error_text);

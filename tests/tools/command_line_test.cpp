@@ -3,18 +3,14 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
-#include <sys/wait.h>
-#include <unistd.h>
 
-#include <array>
-#include <cstdio>
 #include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
 
-#include "server/scratch_folder.h"
 #include "tools/exit_codes.h"
 #include "tools/file_text.h"
+#include "tools/program.h"
 
 namespace tools {
 namespace {
@@ -23,38 +19,11 @@ using ::testing::HasSubstr;
 using ::testing::MatchesRegex;
 using ::testing::StartsWith;
 
-struct Ended {
-  int code = -1;
-  std::string output;
-  std::string errors;
-};
-
-/// Runs the program in a folder of its own with a line of shell words.
-class CommandLineTest : public ::testing::Test {
- protected:
-  Ended Run(const std::string& words) const {
-    const std::string command =
-        "cd '" + scratch_.path().string() + "' && '" ORVENIX_PROGRAM "' " + words + " 2>errors.txt";
-    Ended ended;
-    FILE* pipe = ::popen(command.c_str(), "r");
-    std::array<char, 4096> block{};
-    for (std::size_t got; (got = std::fread(block.data(), 1, block.size(), pipe)) > 0;) {
-      ended.output.append(block.data(), got);
-    }
-    const int status = ::pclose(pipe);
-    ended.code = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-    ended.errors = ReadWholeFile(scratch_.path() / "errors.txt");
-    return ended;
-  }
-
-  ScratchFolder scratch_;
-};
-
 TEST_F(CommandLineTest, ListsItsVerbsAndExitCodes) {
   const Ended help = Run("--help");
 
   EXPECT_EQ(help.code, 0);
-  for (const char* verb : {"bundle", "serve"}) {
+  for (const char* verb : {"bundle", "serve", "device", "run"}) {
     EXPECT_THAT(help.output, HasSubstr(std::string("  ") + verb + " ")) << verb;
   }
   for (const ExitCodeRow& row : kExitCodes) {
@@ -64,7 +33,8 @@ TEST_F(CommandLineTest, ListsItsVerbsAndExitCodes) {
 }
 
 TEST_F(CommandLineTest, ShowsAnExampleForEveryVerb) {
-  for (const char* verb : {"bundle make", "serve"}) {
+  for (const char* verb :
+       {"bundle make", "serve", "device new", "device show", "device screen", "run"}) {
     const Ended help = Run(std::string(verb) + " --help");
     EXPECT_EQ(help.code, 0) << verb;
     EXPECT_THAT(help.output, HasSubstr("Example:\n  orvenix " + std::string(verb))) << verb;
@@ -89,6 +59,17 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
       {"serve nowhere", ExitCode::kBadInput, "nowhere: there is no such bundle"},
       {"serve errors.txt", ExitCode::kBadInput, "errors.txt: does not belong to a bundle"},
       {"serve . --address 203.0.113.1 --port 8080", ExitCode::kCannotListen, "203.0.113.1:8080: "},
+      {"device", ExitCode::kUsage, "subcommand is required"},
+      {"device new . --set width=3", ExitCode::kCannotWrite, ".: is there already"},
+      {"device new d --set width", ExitCode::kUsage, "\"width\" is no setting"},
+      {"device new d --set screen.wings=2", ExitCode::kUsage, "no setting \"screen.wings\""},
+      {"device new d --set screen.width=wide", ExitCode::kUsage, "\"wide\" is no number"},
+      {"device new d --profile nowhere", ExitCode::kBadInput, "nowhere"},
+      {"device show nowhere", ExitCode::kBadInput, "nowhere: is not a device"},
+      {"device screen nowhere", ExitCode::kBadInput, "nowhere: is not a device"},
+      {"run nowhere.xml --device d", ExitCode::kBadInput, "nowhere.xml: there is no such file"},
+      {"run errors.txt --device d", ExitCode::kBadInput, "errors.txt:1: not well-formed XML"},
+      {"run nowhere.xml", ExitCode::kUsage, "--device is required"},
       {"serve . --address elsewhere", ExitCode::kCannotListen, "elsewhere:8080: "},
   };
   for (const MistakeCase& c : kCases) {
@@ -122,69 +103,7 @@ TEST_F(CommandLineTest, MakesABundle) {
   EXPECT_EQ(ReadWholeFile(scratch_.path() / "out/tree/bundle/with blank.txt"), "12345");
 }
 
-/// The server as a process of its own that is interrupted like one.
-class ServeTest : public CommandLineTest {
- protected:
-  /// Starts it and waits until it says where it listens.
-  void Start(const std::vector<std::string>& options) {
-    int ends[2];
-    ASSERT_EQ(::pipe(ends), 0);
-    process_ = ::fork();
-    ASSERT_GE(process_, 0);
-    if (process_ == 0) Exec(options, ends[1]);
-    ::close(ends[1]);
-    output_ = ::fdopen(ends[0], "r");
-    const auto listening = ReadLine();
-    ASSERT_EQ(listening.at("event"), "listening");
-    port_ = listening.at("port");
-  }
-  void TearDown() override {
-    if (output_ != nullptr) ::fclose(output_);
-    if (process_ > 0) {
-      ::kill(process_, SIGKILL);
-      ::waitpid(process_, nullptr, 0);
-    }
-  }
-  nlohmann::json ReadLine() const {
-    std::string line;
-    for (int letter; (letter = std::fgetc(output_)) != EOF && letter != '\n';) {
-      line += static_cast<char>(letter);
-    }
-    return line.empty() ? nlohmann::json::object() : nlohmann::json::parse(line);
-  }
-  int Wait() {
-    int status = 0;
-    ::waitpid(process_, &status, 0);
-    process_ = -1;
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  }
-  /// What curl says to a request as a device writes it.
-  std::string Fetch(const std::string& path, const std::string& more = "") const {
-    const std::string command = "curl -s --max-time 20 --request-target '" + path + "' " + more +
-                                " http://127.0.0.2:" + std::to_string(port_) + "/";
-    std::string got;
-    FILE* pipe = ::popen(command.c_str(), "r");
-    for (int letter; (letter = std::fgetc(pipe)) != EOF;) got += static_cast<char>(letter);
-    ::pclose(pipe);
-    return got;
-  }
-
-  pid_t process_ = -1;
-  FILE* output_ = nullptr;
-  int port_ = 0;
-
- private:
-  [[noreturn]] void Exec(const std::vector<std::string>& options, int output) const {
-    std::vector<std::string> words{ORVENIX_PROGRAM, "serve"};
-    words.insert(words.end(), options.begin(), options.end());
-    std::vector<char*> arguments;
-    for (std::string& word : words) arguments.push_back(word.data());
-    arguments.push_back(nullptr);
-    if (::chdir(scratch_.path().c_str()) != 0 || ::dup2(output, STDOUT_FILENO) < 0) ::_exit(126);
-    ::execv(ORVENIX_PROGRAM, arguments.data());
-    ::_exit(127);
-  }
-};
+using ServeTest = ServerProcessTest;
 
 TEST_F(ServeTest, ServesABundleToAClientThatNobodyHereWrote) {
   scratch_.Write("files/read me.txt", "hello\n");

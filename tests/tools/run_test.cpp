@@ -1,0 +1,125 @@
+// Whole jobs on simulated devices, through the program alone: bundle, server, device, run.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <sstream>
+
+#include "tools/exit_codes.h"
+#include "tools/program.h"
+
+namespace tools {
+namespace {
+
+namespace fs = std::filesystem;
+using ::testing::Contains;
+using ::testing::HasSubstr;
+
+std::vector<nlohmann::json> Events(const std::string& output) {
+  std::vector<nlohmann::json> events;
+  std::istringstream in(output);
+  for (std::string line; std::getline(in, line);) events.push_back(nlohmann::json::parse(line));
+  return events;
+}
+
+class RunTest : public ServerProcessTest {
+ protected:
+  void MakeFiles() const {
+    scratch_.Write("files/read me.txt", "hello\n");
+    scratch_.Write("files/empty", "");
+    scratch_.Write("files/sub/data.bin", std::string(200'000, 'd'));
+  }
+  void MakeDevice(const std::string& settings = "") const {
+    ASSERT_EQ(Run("device new device " + settings).code, 0);
+  }
+  /// A bundle for a server that listens on the port of the running one.
+  void MakeBundleFor(int port) const {
+    ASSERT_EQ(Run("bundle make files out --address 127.0.0.2 --port " + std::to_string(port)).code,
+              0);
+  }
+};
+
+TEST_F(RunTest, BringsEveryFileToTheDeviceAndTellsWhatHappens) {
+  MakeFiles();
+  MakeBundleFor(8080);
+  Start({"out", "--port", "0", "--json", "--report", "report.json"});
+  MakeBundleFor(port_);
+  MakeDevice();
+  scratch_.Write("device/storage/Application/read me.txt", "hello\n");
+  scratch_.Write("device/storage/Application/sub/data.bin", "spoilt");
+
+  const Ended run = Run("run out/job.xml --device device --screens screens --json");
+
+  ASSERT_EQ(run.code, 0) << run.errors;
+  const auto events = Events(run.output);
+  const nlohmann::json& ended = events.back();
+  EXPECT_EQ(ended.at("outcome"), "ok");
+  EXPECT_EQ(ended.at("files").size(), 3U);
+  const auto shown = [&events](const std::string& text) {
+    return std::any_of(events.begin(), events.end(), [&text](const nlohmann::json& event) {
+      return event.at("event") == "status" && event.at("text") == text;
+    });
+  };
+  EXPECT_TRUE(shown("Upgrade Initialization..."));
+  EXPECT_TRUE(shown("Upgrade Complete"));
+  EXPECT_EQ(ReadWholeFile(scratch_.path() / "device/storage/Application/sub/data.bin"),
+            std::string(200'000, 'd'));
+  EXPECT_TRUE(fs::exists(scratch_.path() / "screens/paint-000001.png"));
+
+  const Ended screen = Run("device screen device --picture last.png --json");
+  EXPECT_THAT(nlohmann::json::parse(screen.output).at("lines"), Contains("Upgrade Complete"));
+  EXPECT_TRUE(fs::exists(scratch_.path() / "last.png"));
+  const Ended show = Run("device show device");
+  EXPECT_THAT(show.output, HasSubstr("\\Application\\sub\\data.bin"));
+  EXPECT_THAT(show.output, HasSubstr("end of \\FileXfer.log:"));
+
+  ::kill(process_, SIGINT);
+  EXPECT_EQ(Wait(), 0);
+  const auto report = nlohmann::json::parse(ReadWholeFile(scratch_.path() / "report.json"));
+  const auto& device = report.at("devices").at(0);
+  EXPECT_EQ(device.at("reports"), 1);
+  EXPECT_EQ(device.at("report").at("error"), "");
+  for (const auto& file : device.at("files")) {
+    EXPECT_NE(file.at("path"), "bundle/read me.txt") << "it was right already";
+  }
+}
+
+TEST_F(RunTest, TellsThatTheServerCouldNotBeReached) {
+  MakeFiles();
+  MakeBundleFor(9);
+  MakeDevice();
+
+  const Ended run = Run("run out/job.xml --device device --timeout 1");
+
+  EXPECT_EQ(run.code, static_cast<int>(ExitCode::kUnreachable)) << run.errors;
+  EXPECT_THAT(run.errors, HasSubstr("is the server running at http://127.0.0.2:9?"));
+}
+
+TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
+  MakeFiles();
+  MakeBundleFor(8080);
+  MakeDevice("--set power.ac_line=0 --set power.battery_flag=4");
+
+  const Ended power = Run("run out/job.xml --device device");
+  EXPECT_EQ(power.code, static_cast<int>(ExitCode::kNoPower)) << power.errors;
+  EXPECT_THAT(power.errors, HasSubstr("out/job.xml:"));
+
+  std::string job = ReadWholeFile(scratch_.path() / "out/job.xml");
+  job.replace(job.find("200006"), 6, "2000000000");
+  scratch_.Write("big.xml", job);
+  fs::remove_all(scratch_.path() / "device");
+  MakeDevice();
+  const Ended space = Run("run big.xml --device device");
+  EXPECT_EQ(space.code, static_cast<int>(ExitCode::kNoSpace)) << space.errors;
+
+  job.replace(job.find("HTTPServer"), 10, "HTTPSender");
+  scratch_.Write("unknown.xml", job);
+  const Ended unknown = Run("run unknown.xml --device device");
+  EXPECT_EQ(unknown.code, static_cast<int>(ExitCode::kUnknownName)) << unknown.errors;
+  EXPECT_THAT(unknown.errors, HasSubstr("knows no group or field \"HTTPSender\""));
+}
+
+}  // namespace
+}  // namespace tools

@@ -1,0 +1,52 @@
+#include "tools/run_view.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include "tools/device_table.h"
+
+namespace tools {
+namespace {
+
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
+using Lines = std::vector<std::string>;
+
+TEST(NewLinesTest, FindsWhatCameAfterTheLinesThatWereKnown) {
+  EXPECT_THAT(NewLines({}, {"a", "b"}), ElementsAre("a", "b"));
+  EXPECT_THAT(NewLines({"a", "b"}, {"a", "b"}), IsEmpty());
+  EXPECT_THAT(NewLines({"a", "b"}, {"a", "b", "c"}), ElementsAre("c"));
+  EXPECT_THAT(NewLines({"a", "b"}, {}), IsEmpty());
+}
+
+TEST(NewLinesTest, FollowsAListThatHasMovedOn) {
+  EXPECT_THAT(NewLines({"a", "b", "c"}, {"b", "c", "d"}), ElementsAre("d"));
+  EXPECT_THAT(NewLines({"a", "b", "c"}, {"c", "d", "e"}), ElementsAre("d", "e"));
+  EXPECT_THAT(NewLines({"a", "b", "c"}, {"x", "y", "z"}), ElementsAre("x", "y", "z"));
+}
+
+TEST(NewLinesTest, TakesARepeatedLineForANewOneOnlyWhenItMustBeOne) {
+  EXPECT_THAT(NewLines({"a", "a"}, {"a", "a", "a"}), ElementsAre("a"));
+  EXPECT_THAT(NewLines({"a", "b"}, {"b", "b"}), ElementsAre("b"));
+}
+
+TEST(FormatBarTest, FillsTheBarByUnits) {
+  EXPECT_EQ(FormatBar({19, 38}, 10), "[#####.....]  50%");
+  EXPECT_EQ(FormatBar({38, 38}, 10), "[##########] 100%");
+  EXPECT_EQ(FormatBar({0, 48}, 4), "[....]   0%");
+}
+
+TEST(FormatBarTest, ShowsAScreenWithoutRoomForABarAsEmpty) {
+  EXPECT_EQ(FormatBar({5, 0}, 4), "[....]   0%");
+}
+
+TEST(FormatBytesTest, UsesTheUnitThatLeavesAFewDigits) {
+  EXPECT_EQ(FormatBytes(0), "0 B");
+  EXPECT_EQ(FormatBytes(999), "999 B");
+  EXPECT_EQ(FormatBytes(1024), "1.0 KiB");
+  EXPECT_EQ(FormatBytes(41'943'040), "40.0 MiB");
+  EXPECT_EQ(FormatBytes(std::uint64_t{5} << 30U), "5.0 GiB");
+}
+
+}  // namespace
+}  // namespace tools
