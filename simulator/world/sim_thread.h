@@ -1,6 +1,8 @@
 // What the simulator knows of one simulated thread.
 #pragma once
 
+#include <semaphore.h>
+
 #include <atomic>
 #include <condition_variable>
 #include <csetjmp>
@@ -13,6 +15,24 @@
 #include "world/world.h"
 
 namespace sim {
+
+/// What a thread of the virtual world waits for: its turn, given once for each time it is awaited.
+/// A semaphore, because a condition variable would wake the thread only to wait for the lock.
+class Turn {
+ public:
+  Turn() { sem_init(&given_, 0, 0); }
+  ~Turn() { sem_destroy(&given_); }
+  Turn(const Turn&) = delete;
+  Turn& operator=(const Turn&) = delete;
+  void Give() { sem_post(&given_); }
+  void Await() {
+    while (sem_wait(&given_) != 0) {
+    }
+  }
+
+ private:
+  sem_t given_;
+};
 
 /// Told, with the lock held, when a thread ends that it was registered with.
 class ThreadEndListener {
@@ -45,7 +65,8 @@ struct SimThread {
   SimThread* outer = nullptr;  ///< the part that the host thread played when it attached again
   std::uint32_t code_to_leave_with = 0;  ///< when it is terminated
   std::uint32_t code_of_body = 0;        ///< when it is not; no lock needed
-  std::condition_variable wake;
+  Turn turn;                             ///< in the virtual world
+  std::condition_variable wake;          ///< in the real one
   bool notified = false;
   bool timed_out = false;
   bool polling = false;

@@ -36,8 +36,14 @@ class VirtualWorld final : public WorldCore {
     self.time_asked = 0;
     EnterQueues(self, queues);
     if (deadline) StartTimer(self, *deadline);
-    PassBaton();
-    AwaitBaton(self, lock);
+    SimThread* const next = PassBaton();
+    if (next != &self) {
+      // The next thread is woken with the lock free: it needs it at once.
+      lock.unlock();
+      if (next != nullptr) next->turn.Give();
+      self.turn.Await();
+      lock.lock();
+    }
     if (self.terminate) Leave(self);
     return self.timed_out ? Wake::kTimeout : Wake::kNotified;
   }
@@ -72,7 +78,7 @@ class VirtualWorld final : public WorldCore {
       running_ = thread.outer;
       running_->state = SimThread::State::kRunning;
     } else {
-      PassBaton();
+      GiveTurn(PassBaton());
     }
   }
 
@@ -85,7 +91,7 @@ class VirtualWorld final : public WorldCore {
 
   void AwaitFirstTurn(SimThread& thread, Lock& lock) override { AwaitBaton(thread, lock); }
 
-  void Ended(SimThread& /*thread*/) override { PassBaton(); }
+  void Ended(SimThread& /*thread*/) override { GiveTurn(PassBaton()); }
 
   // The clock moves only when a thread gives up the baton.
   void ActionAdded() override {}
@@ -94,27 +100,34 @@ class VirtualWorld final : public WorldCore {
   void MakeReady(SimThread& thread) {
     thread.state = SimThread::State::kReady;
     ready_.push_back(&thread);
-    if (running_ == nullptr && !passing_) PassBaton();
+    if (running_ == nullptr && !passing_) GiveTurn(PassBaton());
   }
 
-  void AwaitBaton(SimThread& self, Lock& lock) const {
-    while (running_ != &self) self.wake.wait(lock);
+  static void AwaitBaton(SimThread& self, Lock& lock) {
+    lock.unlock();
+    self.turn.Await();
+    lock.lock();
   }
 
-  /// Lets the next thread run, and moves the clock when none is ready.
-  void PassBaton() {
+  static void GiveTurn(SimThread* thread) {
+    if (thread != nullptr) thread->turn.Give();
+  }
+
+  /// Decides who runs next, and moves the clock while nobody is ready.
+  /// @return who it is, not woken yet; null when the world rests.
+  SimThread* PassBaton() {
     running_ = nullptr;
     passing_ = true;
     while (ready_.empty() && !timers().empty()) AdvanceClock();
     passing_ = false;
     if (ready_.empty()) {
       DieWhenStuck();
-      return;
+      return nullptr;
     }
     running_ = ready_.front();
     ready_.pop_front();
     running_->state = SimThread::State::kRunning;
-    running_->wake.notify_one();
+    return running_;
   }
 
   /// To the earliest timer; everything due by then happens, in order.
