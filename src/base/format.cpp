@@ -84,31 +84,26 @@ const char* ReadSize(const char* at, std::size_t& value) noexcept {
   return at;
 }
 
-/// Lets functions share one walk over the arguments: a va_list itself may be an array or a record.
-struct Arguments {
-  va_list list;
-};
-
-const char* ReadWidth(const char* at, Conversion& how, Arguments& arguments) noexcept {
+const char* ReadWidth(const char* at, Conversion& how, va_list* arguments) noexcept {
   if (*at != '*') return ReadSize(at, how.width);
-  const int width = va_arg(arguments.list, int);
+  const int width = va_arg(*arguments, int);
   how.left = how.left || width < 0;
   how.width = width < 0 ? 0U - static_cast<unsigned>(width) : static_cast<unsigned>(width);
   return at + 1;
 }
 
-const char* ReadPrecision(const char* at, Conversion& how, Arguments& arguments) noexcept {
+const char* ReadPrecision(const char* at, Conversion& how, va_list* arguments) noexcept {
   if (*at != '.') return at;
   how.has_precision = true;
   if (*++at != '*') return ReadSize(at, how.precision);
-  const int precision = va_arg(arguments.list, int);
+  const int precision = va_arg(*arguments, int);
   how.has_precision = precision >= 0;
   how.precision = precision < 0 ? 0 : static_cast<std::size_t>(precision);
   return at + 1;
 }
 
 /// Reads what stands between a '%' and its letter. @return the letter's place.
-const char* ReadConversion(const char* at, Conversion& how, Arguments& arguments) noexcept {
+const char* ReadConversion(const char* at, Conversion& how, va_list* arguments) noexcept {
   for (; *at == '-' || *at == '0'; ++at) (*at == '-' ? how.left : how.zeros) = true;
   at = ReadWidth(at, how, arguments);
   at = ReadPrecision(at, how, arguments);
@@ -122,22 +117,22 @@ void PutSigned(Sink& sink, const Conversion& how, std::int32_t value) noexcept {
 }
 
 /// @return false, with no argument taken, when the letter is unknown.
-bool PutConversion(Sink& sink, const Conversion& how, char letter, Arguments& arguments) noexcept {
+bool PutConversion(Sink& sink, const Conversion& how, char letter, va_list* arguments) noexcept {
   switch (letter) {
     case 'd':
-    case 'i': PutSigned(sink, how, va_arg(arguments.list, std::int32_t)); return true;
+    case 'i': PutSigned(sink, how, va_arg(*arguments, std::int32_t)); return true;
     case 'u':
-      PutNumber(sink, how, va_arg(arguments.list, std::uint32_t), 10, kLower, false);
+      PutNumber(sink, how, va_arg(*arguments, std::uint32_t), 10, kLower, false);
       return true;
     case 'x':
-      PutNumber(sink, how, va_arg(arguments.list, std::uint32_t), 16, kLower, false);
+      PutNumber(sink, how, va_arg(*arguments, std::uint32_t), 16, kLower, false);
       return true;
     case 'X':
-      PutNumber(sink, how, va_arg(arguments.list, std::uint32_t), 16, kUpper, false);
+      PutNumber(sink, how, va_arg(*arguments, std::uint32_t), 16, kUpper, false);
       return true;
-    case 's': PutText(sink, how, va_arg(arguments.list, const char*)); return true;
+    case 's': PutText(sink, how, va_arg(*arguments, const char*)); return true;
     case 'c': {
-      const char c = static_cast<char>(va_arg(arguments.list, int));
+      const char c = static_cast<char>(va_arg(*arguments, int));
       PutPadded(sink, how, "", &c, 1);
       return true;
     }
@@ -151,8 +146,8 @@ bool PutConversion(Sink& sink, const Conversion& how, char letter, Arguments& ar
 std::size_t FormatV(char* out, std::size_t capacity, const char* format,
                     va_list arguments) noexcept {
   if (capacity == 0) return 0;
-  Arguments rest;
-  va_copy(rest.list, arguments);
+  va_list rest;  // functions share one walk over it; `arguments` itself may be an array's address
+  va_copy(rest, arguments);
   Sink sink(out, capacity);
   for (const char* at = format; *at != '\0'; ++at) {
     if (*at != '%') {
@@ -161,12 +156,12 @@ std::size_t FormatV(char* out, std::size_t capacity, const char* format,
     }
     const char* const start = at;
     Conversion how;
-    at = ReadConversion(start + 1, how, rest);
-    if (PutConversion(sink, how, *at, rest)) continue;
+    at = ReadConversion(start + 1, how, &rest);
+    if (PutConversion(sink, how, *at, &rest)) continue;
     if (*at == '\0') --at;
     sink.Put(start, static_cast<std::size_t>(at - start) + 1);
   }
-  va_end(rest.list);
+  va_end(rest);
   return sink.Finish();
 }
 

@@ -18,11 +18,13 @@
 
 namespace http {
 
+// NOLINTBEGIN(readability-identifier-naming,bugprone-dynamic-static-initializers): agreed names
 /// Bytes of this job that arrived by HTTP, in files that were complete and checked. Sent with every
 /// request and with the report; the upgrade thread sets it to 0 at its start.
 extern std::atomic<std::uint32_t> BundleRx;
 /// 1 while files are fetched because multicast may not have delivered them, else 0. Sent likewise.
 extern std::atomic<std::uint32_t> HttpFallback;
+// NOLINTEND(readability-identifier-naming,bugprone-dynamic-static-initializers)
 /// Both as they stand.
 [[nodiscard]] Counters CurrentCounters() noexcept;
 
