@@ -121,4 +121,16 @@ TEST(GetExitCodeProcessTest, FailsForWhatIsNoProcess) {
   EXPECT_EQ(exit_code, kPoison);
 }
 
+TEST(TerminateProcessTest, FailsForWhatIsNoProcess) {
+  const HANDLE event = CreateEventW(nullptr, TRUE, FALSE, nullptr);
+  ASSERT_NE(event, nullptr);
+  SetLastError(kPoison);
+
+  EXPECT_FALSE(TerminateProcess(event, 1));
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_INVALID_HANDLE});
+  EXPECT_TRUE(CloseHandle(event)) << "the handle is still good";
+
+  EXPECT_FALSE(TerminateProcess(nullptr, 1));
+}
+
 }  // namespace
