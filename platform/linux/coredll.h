@@ -27,11 +27,11 @@
 #undef FD_SETSIZE
 #define FD_SETSIZE CE_FD_SETSIZE
 #define FD_ZERO(set) (static_cast<void>((set)->fd_count = 0))
-#define FD_SET(socket, set)                                        \
-  do {                                                             \
-    if ((set)->fd_count < static_cast<unsigned>(CE_FD_SETSIZE)) {  \
-      (set)->fd_array[(set)->fd_count++] = (socket);               \
-    }                                                              \
+#define FD_SET(socket, set)                                       \
+  do {                                                            \
+    if ((set)->fd_count < static_cast<unsigned>(CE_FD_SETSIZE)) { \
+      (set)->fd_array[(set)->fd_count++] = (socket);              \
+    }                                                             \
   } while (false)
 inline bool ce_FD_ISSET(SOCKET socket, const ce_fd_set* set) {
   for (std::uint32_t i = 0; i < set->fd_count; ++i) {

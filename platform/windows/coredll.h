@@ -10,9 +10,11 @@
 #endif
 #define WIN32_LEAN_AND_MEAN
 #define NOMINMAX
+// The order counts.
+// clang-format off
 #include <winsock2.h>
-// The order counts: winsock2.h before windows.h.
 #include <windows.h>
+// clang-format on
 #include <tlhelp32.h>
 #include <ws2tcpip.h>
 

@@ -17,15 +17,15 @@ class World;
 class Faults;
 class Trace;
 class HandleTable;
-class Kernel;     // threads and named objects
-class Storage;    // files and volumes
+class Kernel;   // threads and named objects
+class Storage;  // files and volumes
 class Registry;
-class Memory;     // LocalAlloc, and the division between store and program memory
+class Memory;  // LocalAlloc, and the division between store and program memory
 class Power;
 class Processes;
-class Screen;     // windows and what they show
-class Network;    // the device's sockets
-class Debug;      // OutputDebugStringW, NKDbgPrintfW
+class Screen;   // windows and what they show
+class Network;  // the device's sockets
+class Debug;    // OutputDebugStringW, NKDbgPrintfW
 
 /// Every part is made with the device and lives as long. `folder` is the device on disk:
 /// `storage/` is its file system, `registry.reg` its registry, `device.profile` its profile.

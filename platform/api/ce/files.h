@@ -56,8 +56,7 @@ extern "C" {
 HANDLE CreateFileW(const WCHAR* name, DWORD access, DWORD share, SECURITY_ATTRIBUTES* security,
                    DWORD disposition, DWORD attributes, HANDLE template_file);
 BOOL ReadFile(HANDLE file, void* buffer, DWORD size, DWORD* read, OVERLAPPED* overlapped);
-BOOL WriteFile(HANDLE file, const void* buffer, DWORD size, DWORD* written,
-               OVERLAPPED* overlapped);
+BOOL WriteFile(HANDLE file, const void* buffer, DWORD size, DWORD* written, OVERLAPPED* overlapped);
 DWORD SetFilePointer(HANDLE file, LONG distance, LONG* distance_high, DWORD method);
 DWORD GetFileSize(HANDLE file, DWORD* size_high);
 BOOL SetEndOfFile(HANDLE file);

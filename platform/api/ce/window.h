@@ -51,9 +51,9 @@ inline constexpr int BLACK_PEN = 7;
 inline constexpr int NULL_PEN = 8;
 inline constexpr int SYSTEM_FONT = 13;
 
-#define RGB(red, green, blue)                                                     \
-  (static_cast<COLORREF>(static_cast<BYTE>(red)) |                                \
-   (static_cast<COLORREF>(static_cast<BYTE>(green)) << 8U) |                      \
+#define RGB(red, green, blue)                                \
+  (static_cast<COLORREF>(static_cast<BYTE>(red)) |           \
+   (static_cast<COLORREF>(static_cast<BYTE>(green)) << 8U) | \
    (static_cast<COLORREF>(static_cast<BYTE>(blue)) << 16U))
 
 using WNDPROC = LRESULT(CALLBACK*)(HWND window, UINT message, WPARAM wparam, LPARAM lparam);
