@@ -58,7 +58,7 @@ FileRecords::FileRecords(std::filesystem::path file) : file_(std::move(file)) {
     ReadLine(rest.substr(0, end));
     rest.remove_prefix(end + 1);
   }
-  Rewrite();
+  RewriteOrThrow();
 }
 
 std::optional<FileRecord> FileRecords::Find(const std::string& path) const {
@@ -91,7 +91,7 @@ void FileRecords::Prune(const std::function<bool(const std::string&)>& exists) {
   for (auto record = records_.begin(); record != records_.end();) {
     record = exists(record->first) ? std::next(record) : records_.erase(record);
   }
-  Rewrite();
+  RewriteOrThrow();
 }
 
 void FileRecords::ReadLine(std::string_view line) {
@@ -137,25 +137,26 @@ void FileRecords::ApplyRename(const std::string& from, const std::string& to) {
 
 void FileRecords::Append(const std::string& line) {
   ++lines_;
-  if (lines_ > 2 * records_.size() + kSpareLines) {
-    Rewrite();
-    return;
-  }
+  if (lines_ > 2 * records_.size() + kSpareLines && Rewrite()) return;
   // A full host disk costs the record, not the file: attributes are the lesser loss.
   static_cast<void>(WriteAll(journal_.get(), line));
 }
 
-void FileRecords::Rewrite() {
+bool FileRecords::Rewrite() {
+  // Tried again only after as many lines more, also when it fails.
+  lines_ = records_.size();
   std::string text;
   for (const auto& [path, record] : records_) text += SetLine(path, record);
-  if (!ReplaceHostText(file_, text)) {
-    throw std::runtime_error("cannot write " + file_.string() + ": " + std::strerror(errno));
-  }
-  lines_ = records_.size();
-  journal_ = UniqueFd(::open(file_.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC | O_NOFOLLOW));
-  if (!journal_) {
-    throw std::runtime_error("cannot write " + file_.string() + ": " + std::strerror(errno));
-  }
+  if (!ReplaceHostText(file_, text)) return false;
+  UniqueFd journal(::open(file_.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC | O_NOFOLLOW));
+  if (!journal) return false;
+  journal_ = std::move(journal);
+  return true;
+}
+
+void FileRecords::RewriteOrThrow() {
+  if (Rewrite()) return;
+  throw std::runtime_error("cannot write " + file_.string() + ": " + std::strerror(errno));
 }
 
 }  // namespace sim

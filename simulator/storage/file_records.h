@@ -51,7 +51,9 @@ class FileRecords {
   void ApplyErase(const std::string& path);
   void ApplyRename(const std::string& from, const std::string& to);
   void Append(const std::string& line);
-  void Rewrite();
+  /// @return false, with errno set, when the host refuses; the old file then stays.
+  bool Rewrite();
+  void RewriteOrThrow();
 
   const std::filesystem::path file_;
   mutable std::mutex mutex_;

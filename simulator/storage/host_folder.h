@@ -4,8 +4,6 @@
 // open folder and refuses symbolic links, so that nothing leads out of the device's folder.
 #pragma once
 
-#include <sys/types.h>
-
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -23,9 +21,9 @@ namespace sim {
 struct HostEntry {
   std::string name;  ///< on the host, in the spelling it has there
   bool folder = false;
-  std::uint64_t size = 0;  ///< bytes; 0 for a folder
-  dev_t device = 0;
-  ino_t inode = 0;
+  std::uint64_t size = 0;    ///< bytes; 0 for a folder
+  std::uint64_t device = 0;  ///< with the inode it tells files apart, whatever their names
+  std::uint64_t inode = 0;
   FileTicks modified = 0;  ///< by the host's clock
 };
 

@@ -25,9 +25,9 @@ struct FileNode {
   FileNode(Volume& on, std::string below_storage) : volume(on), path(std::move(below_storage)) {}
 
   Volume& volume;
-  const std::string path;  ///< an open file and its folders keep their names
-  dev_t device = 0;
-  ino_t inode = 0;
+  const std::string path;    ///< an open file and its folders keep their names
+  std::uint64_t device = 0;  ///< of the host, as in HostEntry
+  std::uint64_t inode = 0;
 
   std::mutex mutex;  ///< of the size, the record and the content
   std::uint64_t size = 0;

@@ -160,7 +160,7 @@ class Storage {
   std::unique_ptr<FileRecords> records_;
   std::vector<std::unique_ptr<Volume>> volumes_;  ///< the root first
   mutable std::mutex mutex_;
-  std::map<std::pair<dev_t, ino_t>, std::weak_ptr<FileNode>> nodes_;
+  std::map<std::pair<std::uint64_t, std::uint64_t>, std::weak_ptr<FileNode>> nodes_;
   std::set<OpenFile*> open_files_;
   Streams streams_;
   Mappings mappings_;
