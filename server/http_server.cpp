@@ -8,6 +8,7 @@
 #include <asio/ip/address.hpp>
 #include <asio/ip/tcp.hpp>
 #include <asio/steady_timer.hpp>
+#include <exception>
 #include <set>
 #include <system_error>
 #include <utility>

@@ -1,7 +1,5 @@
 #include "server/ledger.h"
 
-#include <utility>
-
 namespace server {
 namespace {
 
@@ -80,7 +78,7 @@ DeviceRecord& DeviceLedger::OnRequest(const Request& request, std::string_view a
   Event event = About(EventKind::kRequest, device, now);
   event.path = device.last_path;
   event.bytes = size;
-  Tell(std::move(event));
+  Tell(event);
   return device;
 }
 
@@ -93,7 +91,7 @@ void DeviceLedger::OnNotFound(const Request& request, std::string_view address, 
   device.total = request.total;
   Event event = About(EventKind::kNotFound, device, now);
   event.path = device.last_path;
-  Tell(std::move(event));
+  Tell(event);
 }
 
 void DeviceLedger::OnBytes(DeviceRecord& device, std::string_view path, std::size_t count,
@@ -112,7 +110,7 @@ void DeviceLedger::OnSent(DeviceRecord& device, std::string_view path, std::uint
   Event event = About(EventKind::kSent, device, now);
   event.path = Printable(path, kMaxShownPath);
   event.bytes = size;
-  Tell(std::move(event));
+  Tell(event);
 }
 
 void DeviceLedger::OnAborted(DeviceRecord& device, std::string_view path, std::uint64_t sent,
@@ -122,7 +120,7 @@ void DeviceLedger::OnAborted(DeviceRecord& device, std::string_view path, std::u
   event.path = Printable(path, kMaxShownPath);
   event.bytes = sent;
   event.detail = why;
-  Tell(std::move(event));
+  Tell(event);
 }
 
 void DeviceLedger::OnReport(const Request& request, std::string_view address, Time now) {
@@ -133,7 +131,7 @@ void DeviceLedger::OnReport(const Request& request, std::string_view address, Ti
   Event event = About(EventKind::kReport, device, now);
   event.bytes = device.report->bundle_rx;
   event.detail = request.error;
-  Tell(std::move(event));
+  Tell(event);
 }
 
 void DeviceLedger::OnBadRequest(std::string_view address, std::string_view why, Time now) {
@@ -143,10 +141,10 @@ void DeviceLedger::OnBadRequest(std::string_view address, std::string_view why, 
   event.when = now;
   event.address = address;
   event.detail = why;
-  Tell(std::move(event));
+  Tell(event);
 }
 
-void DeviceLedger::Tell(Event event) const {
+void DeviceLedger::Tell(const Event& event) const {
   if (listener_) listener_(event);
 }
 

@@ -106,7 +106,7 @@ class DeviceLedger {
 
  private:
   DeviceRecord& Find(const Request& request, std::string_view address, Time now);
-  void Tell(Event event) const;
+  void Tell(const Event& event) const;
 
   const std::size_t max_devices_;
   std::map<std::string, DeviceRecord, std::less<>> devices_;

@@ -16,7 +16,7 @@ namespace server {
 namespace {
 
 constexpr std::size_t kMaxPath = 1024;
-constexpr std::size_t kReadBlock = 64 * 1024;
+constexpr std::size_t kReadBlock = 65536;
 
 class Descriptor {
  public:
