@@ -29,6 +29,13 @@ inline sim::Profile ProfileWithScreen(int width, int height) {
   return profile;
 }
 
+inline void ExpectArea(const RECT& actual, const RECT& expected, const char* what) {
+  EXPECT_EQ(actual.left, expected.left) << what;
+  EXPECT_EQ(actual.top, expected.top) << what;
+  EXPECT_EQ(actual.right, expected.right) << what;
+  EXPECT_EQ(actual.bottom, expected.bottom) << what;
+}
+
 /// The window's state lives as long as its process: every test begins with that of a new one.
 inline void BecomeANewProcess() {
   window_state.line_capacity.set(kLineCapacity);
