@@ -18,7 +18,7 @@ constexpr std::uintptr_t kHighestHandle = 0x00FFFFFF;
 
 /// A thread that calls this often and never waits is caught in a loop: nothing else of its virtual
 /// world will ever run again.
-constexpr std::uint32_t kCallsWithoutWait = 20'000'000;
+constexpr std::uint32_t kCallsWithoutWait = 5'000'000;
 
 [[noreturn]] void DieInLoop(const SimThread& thread, const char* call) {
   std::fprintf(stderr, "cesim: thread %u \"%s\" never waits, its last call is %s\n", thread.id,

@@ -1,7 +1,6 @@
 // What a device's programs tell a debugger.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <functional>

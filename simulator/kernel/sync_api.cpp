@@ -1,6 +1,4 @@
 // Events, mutexes, semaphores and waits.
-#include <type_traits>
-
 #include "ce/kernel.h"
 #include "device/device.h"
 #include "faults/api_call.h"

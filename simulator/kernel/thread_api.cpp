@@ -1,5 +1,4 @@
 // Threads, time and the last error.
-#include <cstdio>
 #include <system_error>
 
 #include "ce/kernel.h"

@@ -247,11 +247,12 @@ void WorldCore::EndThreadsWhere(const std::function<bool(const SimThread&)>& cho
   const bool of_this_world = current_thread != nullptr && current_thread->world == this;
   for (SimThread* thread : ending) {
     const auto gone = [thread] { return thread->state == SimThread::State::kFinished; };
-    if (of_this_world) {
-      WaitUntil(lock, {&thread->finished}, std::nullopt, gone);
-    } else if (!thread_ended_.wait_for(lock, kEndPatience, gone)) {
-      Die("a thread that was to end never came to a blocking call");
-    }
+    // No limit of virtual time would tell: a thread that never blocks does not let it pass.
+    const std::optional<Micros> limit =
+        is_virtual() ? std::nullopt : std::optional<Micros>(now() + kEndPatience);
+    const bool ended = of_this_world ? WaitUntil(lock, {&thread->finished}, limit, gone)
+                                     : thread_ended_.wait_for(lock, kEndPatience, gone);
+    if (!ended) Die("a thread that was to end never came to a blocking call");
   }
   JoinEnded();
 }

@@ -72,7 +72,8 @@ class WorldCore : public World {
 
  private:
   void ThreadMain(SimThread& thread);
-  void RunBody(SimThread& thread);
+  /// Returns when the body does, or is left by Leave.
+  static void RunBody(SimThread& thread);
   void EndThreadsWhere(const std::function<bool(const SimThread&)>& chosen);
   void JoinEnded();
 

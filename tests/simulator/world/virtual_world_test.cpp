@@ -416,6 +416,11 @@ TEST_F(VirtualWorldDeathTest, EndsARunWhoseClockRunsAway) {
   EXPECT_DEATH(while (true) Sleep(1000000000), "the simulated clock ran away");
 }
 
+TEST_F(VirtualWorldDeathTest, EndsAThreadThatCallsForEverWithoutWaiting) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  EXPECT_DEATH(while (true) GetLastError(), "\"test\" never waits, its last call is GetLastError");
+}
+
 TEST_F(VirtualWorldDeathTest, WaitsOnTheHostsFilesHaveNoPlaceHere) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(
