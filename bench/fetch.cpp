@@ -1,0 +1,98 @@
+// Fetches files with the product's own HTTP client, as the upgrade thread does: real sockets, real
+// files on a simulated device, CRC-32 of each. Prints one JSON line of figures.
+//
+//   bench_fetch DEVICE_FOLDER http://127.0.0.2:PORT SOURCE COUNT
+//
+// SOURCE may hold a %d, which is replaced by 1 to COUNT.
+
+#include <sys/resource.h>
+// The platform's names come after the host's.
+#include <coredll.h>
+
+#include <chrono>
+#include <cstdint>
+#include <filesystem>
+#include <fstream>
+#include <string>
+
+#include "device/device.h"
+#include "device/wide_text.h"
+#include "http/http_client.h"
+#include "kernel/kernel.h"
+#include "world/world.h"
+
+namespace {
+
+/// Of either of a process's two times.
+template <typename Time>
+double Seconds(const Time& time) {
+  return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
+}
+
+/// The most memory this program has held, in KiB. The figure of getrusage begins with the parent's.
+long PeakKib() {
+  std::ifstream status("/proc/self/status");
+  for (std::string line; std::getline(status, line);) {
+    if (line.rfind("VmHWM:", 0) == 0) return std::atol(line.c_str() + 6);
+  }
+  return 0;
+}
+
+/// @return false when the file did not arrive whole and checked.
+bool Fetch(http::CHTTPClient& client, const std::string& url, const std::string& destination) {
+  http::UrlText path;
+  client.SetDestination(device::WideText<>(destination.c_str()).c_str());
+  return client.OpenURL(device::WideText<640>(url.c_str()).c_str(), path) &&
+         client.Get(path.c_str());
+}
+
+std::string Numbered(std::string text, int number) {
+  const std::size_t at = text.find("%d");
+  return at == std::string::npos ? text : text.replace(at, 2, std::to_string(number));
+}
+
+}  // namespace
+
+int main(int count, char** arguments) {
+  if (count != 5) {
+    std::fprintf(stderr, "usage: bench_fetch DEVICE_FOLDER http://ADDRESS:PORT SOURCE COUNT\n");
+    return 2;
+  }
+  const std::filesystem::path folder = arguments[1];
+  std::filesystem::create_directories(folder);
+  const std::string server = arguments[2];
+  const std::string source = arguments[3];
+  const int files = std::atoi(arguments[4]);
+
+  sim::Profile profile;
+  profile.store_pages = 160000;  // 640,000 KiB: room for the large file
+  const auto world = sim::World::MakeReal();
+  sim::Device device(*world, profile, folder);
+  const sim::AttachedThread host(device);
+  WSADATA winsock;
+  WSAStartup(MAKEWORD(1, 1), &winsock);
+
+  int good = 0;
+  const auto start = std::chrono::steady_clock::now();
+  {
+    http::CHTTPClient client;
+    client.SetIdentity({"T", "Q", "52", "MR700123", "TQ52MR700123"});
+    for (int i = 1; i <= files; ++i) {
+      const std::string path = Numbered(source, i);
+      good += Fetch(client, server + "/" + path + ":1,1", Numbered("\\f%d.bin", i)) ? 1 : 0;
+    }
+  }
+  const std::chrono::duration<double> wall = std::chrono::steady_clock::now() - start;
+  WSACleanup();
+
+  double slept = 0;
+  for (const sim::SleepRecord& sleep : device.kernel().Sleeps()) slept += sleep.length_ms / 1000.0;
+  rusage usage{};
+  getrusage(RUSAGE_SELF, &usage);
+  std::printf(
+      "{\"files\": %d, \"good\": %d, \"wall_s\": %.6f, \"pauses_s\": %.3f, \"cpu_s\": %.6f, "
+      "\"peak_kib\": %ld}\n",
+      files, good, wall.count(), slept, Seconds(usage.ru_utime) + Seconds(usage.ru_stime),
+      PeakKib());
+  return good == files ? 0 : 1;
+}
