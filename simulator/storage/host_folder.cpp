@@ -27,23 +27,6 @@ FileTicks TicksOf(const timespec& time) {
          static_cast<FileTicks>(time.tv_nsec / 100);
 }
 
-/// @return all names of the folder that the device can say.
-std::vector<std::u16string> ReadNames(int folder) {
-  std::vector<std::u16string> names;
-  const int fd = ::openat(folder, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  if (fd < 0) return names;
-  const std::unique_ptr<DIR, CloseDir> stream(::fdopendir(fd));
-  if (stream == nullptr) {
-    ::close(fd);
-    return names;
-  }
-  std::u16string name;
-  while (const dirent* entry = ::readdir(stream.get())) {
-    if (FromHostText(entry->d_name, name) && ValidName(name)) names.push_back(name);
-  }
-  return names;
-}
-
 }  // namespace
 
 UniqueFd OpenFolder(int parent, const std::string& name) {
@@ -64,17 +47,20 @@ std::optional<HostEntry> StatEntry(int folder, const std::string& name) {
   return entry;
 }
 
-std::optional<HostEntry> FindEntry(int folder, std::u16string_view name) {
-  if (std::optional<HostEntry> exact = StatEntry(folder, ToHostText(name))) return exact;
-  std::vector<std::u16string> alike;
-  for (std::u16string& other : ReadNames(folder)) {
-    if (SameName(other, name)) alike.push_back(std::move(other));
+std::vector<std::u16string> ReadNames(int folder) {
+  std::vector<std::u16string> names;
+  const int fd = ::openat(folder, ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (fd < 0) return names;
+  const std::unique_ptr<DIR, CloseDir> stream(::fdopendir(fd));
+  if (stream == nullptr) {
+    ::close(fd);
+    return names;
   }
-  std::sort(alike.begin(), alike.end());
-  for (const std::u16string& other : alike) {
-    if (std::optional<HostEntry> entry = StatEntry(folder, ToHostText(other))) return entry;
+  std::u16string name;
+  while (const dirent* entry = ::readdir(stream.get())) {
+    if (FromHostText(entry->d_name, name) && ValidName(name)) names.push_back(name);
   }
-  return std::nullopt;
+  return names;
 }
 
 std::vector<std::u16string> ListNames(int folder) {

@@ -33,9 +33,8 @@ struct HostEntry {
 /// The entry with exactly this name on the host.
 [[nodiscard]] std::optional<HostEntry> StatEntry(int folder, const std::string& name);
 
-/// The entry that the device means by `name`: the same spelling if there is one, otherwise the
-/// first, in sorted order, that differs in letter case only.
-[[nodiscard]] std::optional<HostEntry> FindEntry(int folder, std::u16string_view name);
+/// All names in `folder` that the device can say, in no order.
+[[nodiscard]] std::vector<std::u16string> ReadNames(int folder);
 
 /// Names of the device's files and folders in `folder`, in the order in which the device lists
 /// them: without regard to case.

@@ -26,7 +26,7 @@ DWORD Storage::LocateParsed(const DevicePath& path, Location& location) {
     if (!volume->present() && !location.volume_root) return ERROR_PATH_NOT_FOUND;
   }
   for (std::size_t i = 0; i + 1 < path.names.size(); ++i) {
-    const std::optional<HostEntry> folder = FindEntry(location.folder, path.names[i]);
+    const std::optional<HostEntry> folder = folder_names_.Find(location.folder, path.names[i]);
     if (!folder || !folder->folder) return ERROR_PATH_NOT_FOUND;
     UniqueFd next = OpenFolder(location.folder, folder->name);
     if (!next) return ERROR_PATH_NOT_FOUND;
@@ -35,7 +35,7 @@ DWORD Storage::LocateParsed(const DevicePath& path, Location& location) {
     location.folder_path += folder->name + '/';
   }
   location.leaf = path.names.back();
-  location.entry = FindEntry(location.folder, location.leaf);
+  location.entry = folder_names_.Find(location.folder, location.leaf);
   if (path.closed && location.entry && !location.entry->folder) return ERROR_PATH_NOT_FOUND;
   location.closed = path.closed;
   return ERROR_SUCCESS;

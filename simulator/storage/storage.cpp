@@ -78,7 +78,7 @@ void Storage::ReadProfile() {
 }
 
 void Storage::MakeVolumeFolder(const Volume& volume) {
-  const std::optional<HostEntry> there = FindEntry(root_fd_.get(), volume.name());
+  const std::optional<HostEntry> there = folder_names_.Find(root_fd_.get(), volume.name());
   if (there && there->folder) return;
   const std::string name = ToHostText(volume.name());
   if (!MakeFolder(root_fd_.get(), name)) ThrowHostError(folder_ / name);
@@ -170,13 +170,13 @@ std::size_t Storage::open_files() const {
   return open_files_.size();
 }
 
-DWORD Storage::FreeSpace(const WCHAR* name, Space::Figures& room) const {
+DWORD Storage::FreeSpace(const WCHAR* name, Space::Figures& room) {
   DevicePath path;
   if (const DWORD error = ParsePath(name, false, path); error != ERROR_SUCCESS) return error;
   const Hold hold(mutex_);
   Volume* volume = path.names.empty() ? volumes_[0].get() : VolumeNamed(path.names[0]);
   if (volume == nullptr) {
-    if (!FindEntry(root_fd_.get(), path.names[0])) return ERROR_PATH_NOT_FOUND;
+    if (!folder_names_.Find(root_fd_.get(), path.names[0])) return ERROR_PATH_NOT_FOUND;
     volume = volumes_[0].get();
   }
   if (!volume->present()) return ERROR_PATH_NOT_FOUND;

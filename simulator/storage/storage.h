@@ -23,6 +23,7 @@
 #include "memory/space.h"
 #include "storage/device_path.h"
 #include "storage/file_records.h"
+#include "storage/folder_names.h"
 #include "storage/host_folder.h"
 #include "storage/mapping.h"
 #include "storage/open_file.h"
@@ -112,7 +113,7 @@ class Storage {
   DWORD FindNext(Search& search, WIN32_FIND_DATAW& data);
   /// Answers for any path on a volume, whether or not it exists there. A name in the root that is
   /// neither file, folder nor volume is taken for a volume that the device does not have.
-  DWORD FreeSpace(const WCHAR* name, Space::Figures& room) const;
+  DWORD FreeSpace(const WCHAR* name, Space::Figures& room);
 
   [[nodiscard]] Streams& streams() { return streams_; }
   [[nodiscard]] Mappings& mappings() { return mappings_; }
@@ -160,6 +161,7 @@ class Storage {
   std::unique_ptr<FileRecords> records_;
   std::vector<std::unique_ptr<Volume>> volumes_;  ///< the root first
   mutable std::mutex mutex_;
+  FolderNames folder_names_;
   std::map<std::pair<std::uint64_t, std::uint64_t>, std::weak_ptr<FileNode>> nodes_;
   std::set<OpenFile*> open_files_;
   Streams streams_;
