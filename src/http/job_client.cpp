@@ -65,7 +65,11 @@ CHTTPClient* JobClient() noexcept {
 }
 
 CHTTPClient* CreateJobClient(const UpgradeConfig& job) noexcept {
-  if (state.client != nullptr || !MakeClient()) return state.client;
+  if (state.client != nullptr) {
+    if (!state.sockets_started) StartSockets();
+    return state.client;
+  }
+  if (!MakeClient()) return nullptr;
   state.client->set_timeout_ms(kFetchTimeoutMs);
   state.client->SetIdentity(
       {job.GetType(), job.GetFamily(), job.GetModel(), job.GetSerialNumber(), job.GetUniqueId()});

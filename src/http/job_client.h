@@ -13,7 +13,7 @@ namespace http {
 
 /// The client for fetching the job's files: made, with Windows Sockets started, when there is none.
 /// A new one waits 20,000 ms, names the device by the job's identity texts and moves the progress
-/// window's file bar.
+/// window's file bar. Starting Windows Sockets is tried again at every call until it succeeds.
 /// @return null when there is no memory for one.
 [[nodiscard]] CHTTPClient* CreateJobClient(const UpgradeConfig& job) noexcept;
 

@@ -20,7 +20,8 @@ struct Transfer {
   base::FixedText<kNarrowUrlSize> url;
   device::WideText<http::kUrlCapacity> wide_url;
   http::UrlText path;
-  device::WideText<kPathSize> destination;
+  const char* destination;
+  device::WideText<kPathSize> wide_destination;
 };
 constexpr std::size_t kTransferBuffer = 4096;
 static_assert(sizeof(Transfer) <= kTransferBuffer, "one page holds it");
@@ -30,8 +31,11 @@ bool Attempt(http::CHTTPClient& client, Transfer& transfer, OnFailedGet failed_g
   report::Log("Orvenix - before OpenURL\r\n");
   report::Log("%s", transfer.url.c_str());
   report::Log("\r\n");
+  // Converted for each attempt: a conversion that failed once must not spoil all that follow.
+  transfer.wide_url.Assign(transfer.url.view());
+  transfer.wide_destination.Assign(transfer.destination);
   if (client.OpenURL(transfer.wide_url.c_str(), transfer.path)) {
-    client.SetDestination(transfer.destination.c_str());
+    client.SetDestination(transfer.wide_destination.c_str());
     if (client.Get(transfer.path.c_str()) || failed_get == OnFailedGet::kTakeAsDone) return true;
   }
   Sleep(kPauseAfterFailureMs);
@@ -71,11 +75,10 @@ bool FetchFile(Run& run, const char* source, const char* destination,
   // Made once: all attempts to get one file name the same number.
   transfer.url = FileUrl(run.job.GetBaseURL(), run.job.GetHTTPPort(), source, run.fetch_attempt,
                          run.files_to_fetch);
-  transfer.wide_url.Assign(transfer.url.view());
-  transfer.destination.Assign(destination);
+  transfer.destination = destination;
   bool done = false;
   while (!done) {
-    done = Attempt(*client, transfer, failed_get);
+    done = Attempt(*http::CreateJobClient(run.job), transfer, failed_get);
     ++run.fetch_attempt;
     client->Close();
     client->CloseFile();

@@ -102,9 +102,11 @@ void PrintTo(const Holdings& holdings, std::ostream* out) {
 void DropKeptJob() {
   configlet::Walk& walk = configlet::TheWalk();
   UpgradeConfig* const job = walk.job;
-  if (job == nullptr) return;
-  configlet::ForgetJob(job);
+  if (job != nullptr) configlet::ForgetJob(job);
   delete job;
+  walk.download_file.Forget();
+  walk.storage.Forget();
+  walk.registry_test.Forget();
 }
 
 }  // namespace test

@@ -60,7 +60,8 @@ struct Holdings {
 Holdings HoldingsOf(sim::Device& device);
 void PrintTo(const Holdings& holdings, std::ostream* out);
 
-/// Frees the job that the configlet still keeps because no thread has taken it over.
+/// Frees the job, and the records for one, that the configlet still keeps because no thread has
+/// taken them over.
 void DropKeptJob();
 
 }  // namespace test

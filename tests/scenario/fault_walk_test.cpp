@@ -1,0 +1,180 @@
+// Every API call of an upgrade is made to fail, one call a run.
+//
+// A run is a small job on a fresh device: a list file that is not there, a right file, a damaged
+// one. Its n-th call that can fail does so, for every n up to the last call of the job. Whatever
+// call that is, the program must not crash or hang, must keep nothing, must leave the right file
+// alone and must never leave a damaged file that looks complete.
+#include <gmock/gmock.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cstdlib>
+#include <iostream>
+#include <iterator>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "faults/faults.h"
+#include "http/job_client.h"
+#include "kernel/kernel.h"
+#include "memory/memory.h"
+#include "orvenix/configlet.h"
+#include "product_support/host.h"
+#include "product_support/upgrade_server.h"
+#include "support/device_files.h"
+#include "support/device_test.h"
+#include "upgrade/run_state/run_state.h"
+
+namespace {
+
+using test::CrcText;
+using test::GetFile;
+
+constexpr int kShards = 16;
+
+const std::string kRight = "right from the beginning";
+const std::string kNew(3000, 'n');
+const std::string kDamaged(3000, 'd');
+
+/// Calls that give something back or end a thread. When one fails, what it should have given back
+/// is kept (a file that cannot be closed stays open, and is asked for again and again), and no
+/// program could do anything about it.
+constexpr std::string_view kReleases[] = {
+    "CloseHandle",     "FindClose",   "RegCloseKey",   "ReleasePowerRequirement",
+    "UnmapViewOfFile", "WSACleanup",  "DestroyWindow", "CloseToolhelp32Snapshot",
+    "TerminateThread", "closesocket", "PostMessageW"};
+
+bool IsRelease(const std::string& call) {
+  return std::find(std::begin(kReleases), std::end(kReleases), call) != std::end(kReleases);
+}
+
+/// Far more than a job takes whose every wait runs into its limit, in seconds.
+constexpr std::uint32_t kLimit = 900;
+
+/// One run.
+class Walk {
+ public:
+  explicit Walk(std::uint64_t nth)
+      : nth_(nth),
+        world_(sim::World::MakeVirtual()),
+        device_(std::make_unique<sim::Device>(*world_, sim::Profile{}, folder_.path() / "device")),
+        host_(std::make_unique<sim::AttachedThread>(*device_, "host")),
+        server_(std::make_unique<test::UpgradeServer>(*world_)) {
+    PrepareJob();
+    before_ = test::HoldingsOf(*device_);
+  }
+  ~Walk() {
+    server_.reset();
+    host_.reset();
+    device_.reset();
+  }
+  Walk(const Walk&) = delete;
+  Walk& operator=(const Walk&) = delete;
+
+  void Run() {
+    device_->faults().Add({"*", nth_, 1, 0});
+    IcfgInitialize();
+    const std::uint32_t began = test::WalkJob(job_);
+    const std::uint32_t result = test::EndJob();
+    EXPECT_EQ(began, ICFG_OK);
+    EXPECT_TRUE(result == ICFG_OK || result == ICFG_NO_POWER || result == ICFG_NO_SPACE) << result;
+    ended_ = test::AwaitEndOfJobs(*device_, kLimit);
+    call_ = device_->faults().last_fired();
+    device_->faults().Clear();
+  }
+
+  /// False once the job makes fewer than n calls.
+  [[nodiscard]] bool fired() const { return !call_.empty(); }
+  [[nodiscard]] const std::string& call() const { return call_; }
+
+  void Check() {
+    EXPECT_EQ(device_->memory().bad_frees(), 0U);
+    if (!IsRelease(call_)) CheckEnd();
+    EXPECT_EQ(GetFile("\\right.txt"), kRight);
+    const auto repaired = GetFile("\\damaged.bin");
+    if (fired()) {
+      EXPECT_TRUE(repaired == kNew || repaired == kDamaged || IsRelease(call_))
+          << repaired.value_or("(none)");
+    } else {
+      EXPECT_EQ(repaired, kNew);
+    }
+  }
+
+ private:
+  void CheckEnd() {
+    EXPECT_TRUE(ended_) << "a thread hangs";
+    EXPECT_FALSE(upgrade::UpgradeInProgress());
+    EXPECT_EQ(http::JobClient(), nullptr);
+    test::DropKeptJob();
+    EXPECT_EQ(test::HoldingsOf(*device_), before_);
+  }
+
+  void PrepareJob() {
+    test::PutFile("\\right.txt", kRight);
+    test::PutFile("\\damaged.bin", kDamaged);
+    const std::string list =
+        "files/right.txt,\\right.txt,*," + server_->Put("files/right.txt", kRight) + ",24\r\n" +
+        "files/new.bin,\\damaged.bin,*," + server_->Put("files/new.bin", kNew) + ",3000\r\n";
+    job_.list =
+        test::HostFile{"files/list.txt", "\\list.txt", "*", server_->Put("files/list.txt", list)};
+  }
+
+  const std::uint64_t nth_;
+  test::TemporaryFolder folder_;
+  std::unique_ptr<sim::World> world_;
+  std::unique_ptr<sim::Device> device_;
+  std::unique_ptr<sim::AttachedThread> host_;
+  std::unique_ptr<test::UpgradeServer> server_;
+  test::HostJob job_;
+  test::Holdings before_;
+  bool ended_ = false;
+  std::string call_;
+};
+
+/// Makes one run in a process of its own, so that a run that goes wrong spoils no other.
+enum class Outcome : std::uint8_t { kPassed = 0, kNotFired = 1, kFailed = 2 };
+Outcome RunCall(std::uint64_t nth) {
+  std::cout.flush();
+  const pid_t child = fork();
+  if (child == 0) {
+    Outcome outcome = Outcome::kFailed;
+    {
+      Walk walk(nth);
+      walk.Run();
+      SCOPED_TRACE("call " + std::to_string(nth) + " failed: " + walk.call());
+      walk.Check();
+      outcome = walk.fired() ? Outcome::kPassed : Outcome::kNotFired;
+    }
+    std::cout.flush();
+    _exit(static_cast<int>(::testing::Test::HasFailure() ? Outcome::kFailed : outcome));
+  }
+  int status = 0;
+  if (child < 0 || waitpid(child, &status, 0) != child || !WIFEXITED(status)) {
+    return Outcome::kFailed;
+  }
+  return static_cast<Outcome>(std::min(WEXITSTATUS(status), 2));
+}
+
+class FaultWalkTest : public ::testing::TestWithParam<int> {};
+
+// Each shard takes every sixteenth call: a failure names the call, and its number is enough to
+// repeat the run.
+TEST_P(FaultWalkTest, SurvivesTheFailureOfEachCallInTurn) {
+  std::uint64_t nth = static_cast<std::uint64_t>(GetParam()) + 1;
+  // Collected first: a process inherits the failures that were noted before it began.
+  std::vector<std::uint64_t> failed;
+  for (Outcome outcome = Outcome::kPassed; outcome != Outcome::kNotFired; nth += kShards) {
+    ASSERT_LT(nth, 20000U) << "the job does not end";
+    outcome = RunCall(nth);
+    if (outcome == Outcome::kFailed) failed.push_back(nth);
+  }
+  EXPECT_THAT(failed, ::testing::IsEmpty());
+  RecordProperty("calls", static_cast<int>(nth));
+}
+
+INSTANTIATE_TEST_SUITE_P(EverySixteenth, FaultWalkTest, ::testing::Range(0, kShards));
+
+}  // namespace
