@@ -8,7 +8,7 @@
 #include "orvenix/pointer_list.h"
 
 /// One file to fetch. Made with LocalAlloc and zeroed; all texts are zero-terminated.
-struct tagDownloadFile {
+struct tagDownloadFile {  // NOLINT(readability-identifier-naming): callers know this name
   char source[260];       ///< path or name on the server
   char destination[260];  ///< path on the device
   char crc[32];           ///< expected CRC-32 as text, unsigned decimal
@@ -18,14 +18,14 @@ struct tagDownloadFile {
 };
 
 /// Space that must be free in one store. Made with LocalAlloc.
-struct tagStorageReq {
+struct tagStorageReq {      // NOLINT(readability-identifier-naming): callers know this name
   char name[260];           ///< the store's folder, or "RAM:"
   char required_space[32];  ///< bytes as decimal text
 };
 
 /// One registry test. Made with LocalAlloc and zeroed.
-struct tagRegistryTest {
-  char root[260];  ///< "HKEY_LOCAL_MACHINE", ...
+struct tagRegistryTest {  // NOLINT(readability-identifier-naming): callers know this name
+  char root[260];         ///< "HKEY_LOCAL_MACHINE", ...
   char key[260];
   char value_name[260];
   char value[260];  ///< what the registry's value is compared with
