@@ -62,6 +62,7 @@ extern "C" int MultiByteToWideChar(UINT code_page, DWORD flags, const char* text
   return Deliver(call, converted, wide, size);
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's own parameters
 extern "C" int WideCharToMultiByte(UINT code_page, DWORD flags, const WCHAR* wide, int length,
                                    char* text, int size, const char* default_char,
                                    BOOL* used_default) {

@@ -50,15 +50,16 @@ Setting<Record> Number(std::string_view section, std::string_view key, Member Re
   return {section, key, comment, read, write};
 }
 
+Complaint TakeAnyText(std::string_view /*text*/) {
+  return {};
+}
+
 template <typename Record>
-Setting<Record> Text(
-    std::string_view section, std::string_view key, std::string Record::*member,
-    std::string_view comment,
-    std::function<Complaint(std::string_view)> check = [](std::string_view) {
-      return Complaint{};
-    }) {
+Setting<Record> Text(std::string_view section, std::string_view key, std::string Record::*member,
+                     std::string_view comment,
+                     Complaint (*check)(std::string_view text) = TakeAnyText) {
   const auto read = [member, check](Record& record, std::string_view text) {
-    const Complaint complaint = check(text);
+    Complaint complaint = check(text);
     if (complaint.empty()) record.*member = text;
     return complaint;
   };
