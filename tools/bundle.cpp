@@ -10,6 +10,7 @@
 
 #include "base/crc32.h"
 #include "base/text.h"
+#include "server/site.h"
 #include "tools/bundle_rules.h"
 #include "tools/failure.h"
 #include "tools/file_text.h"
@@ -47,6 +48,15 @@ std::vector<InputFile> FindInput(const fs::path& folder) {
   std::sort(found.begin(), found.end(),
             [](const InputFile& a, const InputFile& b) { return a.relative < b.relative; });
   return found;
+}
+
+std::uint32_t AttributeNamed(const std::string& name) {
+  if (name == "read-only") return server::kAttributeReadOnly;
+  if (name == "hidden") return server::kAttributeHidden;
+  if (name == "system") return server::kAttributeSystem;
+  if (name == "archive") return server::kAttributeArchive;
+  throw Failure(ExitCode::kUsage, "--attributes", "\"" + name + "\" is no attribute",
+                "use read-only, hidden, system, archive");
 }
 
 std::uint32_t AttributesOf(const std::string& relative, const BundleOptions& options) {
@@ -253,18 +263,10 @@ std::string FormatBundleJob(const Bundle& bundle, const BundleOptions& options) 
 }
 
 std::uint32_t ParseAttributes(const std::string& names) {
-  static const std::map<std::string, std::uint32_t> kBits = {
-      {"read-only", 0x01}, {"hidden", 0x02}, {"system", 0x04}, {"archive", 0x20}};
   std::uint32_t mask = 0;
   for (std::size_t start = 0; start <= names.size();) {
     const std::size_t end = std::min(names.find(',', start), names.size());
-    const auto bit = kBits.find(names.substr(start, end - start));
-    if (bit == kBits.end()) {
-      throw Failure(ExitCode::kUsage, "--attributes",
-                    "\"" + names.substr(start, end - start) + "\" is no attribute",
-                    "use read-only, hidden, system, archive");
-    }
-    mask |= bit->second;
+    mask |= AttributeNamed(names.substr(start, end - start));
     start = end + 1;
   }
   return mask;

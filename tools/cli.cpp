@@ -18,7 +18,7 @@ std::string ExitCodeHelp() {
     number.insert(0, 4 - number.size(), ' ');
     std::string name = row.name;
     name.resize(17, ' ');
-    help += number + "  " + name + row.meaning + "\n";
+    help.append(number).append("  ").append(name).append(row.meaning).append("\n");
   }
   return help + "\nEvery verb explains itself: orvenix VERB --help";
 }

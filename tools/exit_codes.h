@@ -1,4 +1,4 @@
-// How the program `orvenix` ends. This table is the one place: --help prints it, the README
+// How the program `orvenix` ends. This table is the one place: --help prints it, docs/tools.md
 // repeats it, and a test compares the two.
 #pragma once
 

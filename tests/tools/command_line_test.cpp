@@ -32,6 +32,16 @@ TEST_F(CommandLineTest, ListsItsVerbsAndExitCodes) {
   }
 }
 
+TEST_F(CommandLineTest, HasTheExitCodesThatItsDocumentLists) {
+  std::string table;
+  for (const ExitCodeRow& row : kExitCodes) {
+    table += "| " + std::to_string(static_cast<int>(row.code)) + " | " + row.name + " | " +
+             row.meaning + " |\n";
+  }
+
+  EXPECT_THAT(ReadWholeFile(ORVENIX_TOOLS_DOCUMENT), HasSubstr("|---|---|---|\n" + table + "\n"));
+}
+
 TEST_F(CommandLineTest, ShowsAnExampleForEveryVerb) {
   for (const char* verb :
        {"bundle make", "serve", "device new", "device show", "device screen", "run"}) {
