@@ -26,7 +26,7 @@ class KernelObject {
   /// What a satisfied wait takes from the object (auto-reset event, semaphore count, ownership).
   /// @return true when the object had been abandoned by its last owner.
   virtual bool Take(SimThread& thread);
-  [[nodiscard]] virtual bool waitable() const { return false; }
+  [[nodiscard]] virtual bool can_be_awaited() const { return false; }
   /// Notify this queue when Signalled may have become true: every waiter looks for itself.
   [[nodiscard]] virtual WaitQueue& wait_queue() { return queue; }
   /// The stricter way: ends the waits that the object can end now, oldest first, and takes from the

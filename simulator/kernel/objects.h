@@ -13,7 +13,7 @@ class ThreadObject final : public KernelObject {
   [[nodiscard]] bool Signalled(const SimThread& /*waiter*/) const override {
     return thread_.state == SimThread::State::kFinished;
   }
-  [[nodiscard]] bool waitable() const override { return true; }
+  [[nodiscard]] bool can_be_awaited() const override { return true; }
   [[nodiscard]] WaitQueue& wait_queue() override { return thread_.finished; }
   [[nodiscard]] SimThread& thread() const { return thread_; }
 
@@ -26,7 +26,7 @@ class EventObject final : public KernelObject {
   EventObject(bool manual_reset, bool set) : manual_reset_(manual_reset), set_(set) {}
   [[nodiscard]] bool Signalled(const SimThread& /*waiter*/) const override { return set_; }
   bool Take(SimThread& thread) override;
-  [[nodiscard]] bool waitable() const override { return true; }
+  [[nodiscard]] bool can_be_awaited() const override { return true; }
 
   void Set();
   void Reset() { set_ = false; }
@@ -48,7 +48,7 @@ class MutexObject final : public KernelObject, public ThreadEndListener {
     return owner_ == nullptr || owner_ == &waiter;
   }
   bool Take(SimThread& thread) final;
-  [[nodiscard]] bool waitable() const override { return true; }
+  [[nodiscard]] bool can_be_awaited() const override { return true; }
   void ThreadEnded(SimThread& thread) override;
 
   /// @return false when `thread` does not own the mutex.
@@ -67,7 +67,7 @@ class SemaphoreObject final : public KernelObject {
   SemaphoreObject(LONG count, LONG maximum) : count_(count), maximum_(maximum) {}
   [[nodiscard]] bool Signalled(const SimThread& /*waiter*/) const override { return count_ > 0; }
   bool Take(SimThread& thread) override;
-  [[nodiscard]] bool waitable() const override { return true; }
+  [[nodiscard]] bool can_be_awaited() const override { return true; }
 
   /// @return false, with nothing changed, when the count would pass its maximum.
   bool Release(LONG count, LONG& previous);

@@ -55,7 +55,7 @@ DWORD Wait(ApiCall& call, DWORD count, const HANDLE* handles, bool all, DWORD ti
   ObjectWait::Objects objects;
   for (DWORD i = 0; i < count; ++i) {
     objects.push_back(call.device().handles().Find(handles[i]));
-    if (objects.back() == nullptr || !objects.back()->waitable()) {
+    if (objects.back() == nullptr || !objects.back()->can_be_awaited()) {
       return FailedWait(call, ERROR_INVALID_HANDLE, lock);
     }
   }

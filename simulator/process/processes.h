@@ -29,7 +29,7 @@ class Process final : public KernelObject {
   Process(std::uint32_t process_id, std::uint32_t parent_id, std::u16string executable)
       : id(process_id), parent(parent_id), name(std::move(executable)) {}
   [[nodiscard]] bool Signalled(const SimThread& /*thread*/) const override { return !running; }
-  [[nodiscard]] bool waitable() const override { return true; }
+  [[nodiscard]] bool can_be_awaited() const override { return true; }
 
   const std::uint32_t id;
   const std::uint32_t parent;
@@ -46,7 +46,7 @@ class ProcessThread final : public KernelObject {
   [[nodiscard]] bool Signalled(const SimThread& /*thread*/) const override {
     return !process_->running;
   }
-  [[nodiscard]] bool waitable() const override { return true; }
+  [[nodiscard]] bool can_be_awaited() const override { return true; }
   [[nodiscard]] WaitQueue& wait_queue() override { return process_->queue; }
 
  private:

@@ -13,6 +13,7 @@
 #include "profile/profile.h"
 
 // Present only under the address sanitizer: abandoned frames leave marks on the stack.
+// NOLINTNEXTLINE(bugprone-reserved-identifier, readability-identifier-naming): the sanitizer's name
 extern "C" __attribute__((weak)) void __asan_handle_no_return();
 
 namespace sim {
