@@ -1,4 +1,4 @@
-/* Starting an upgrade from outside the configlet. */
+// Starting an upgrade from outside the configlet; for C++.
 #pragma once
 
 #include <cstdint>
@@ -11,7 +11,8 @@
 /// One job runs at a time: when the thread of an earlier job has not ended yet, the call first
 /// waits for it, at most about 10 seconds.
 ///
-/// @param config  the job. The thread owns it from here on and frees it at its end; it may be null
+/// @param config  the job, made with `new`. The thread owns it from here on and frees it at its
+/// end; it may be null
 ///   or freed already by a job that ended during the wait, then nothing is started. When no thread
 ///   could be made, the job stays with the caller.
 /// @param mode  0: the files come by multicast and what is missing by HTTP; any other value: the

@@ -13,18 +13,19 @@ namespace {
 
 template <void (UpgradeConfig::*set)(const char*) noexcept>
 void JobText(Walk& walk, const char* value) noexcept {
-  if (walk.job != nullptr) (walk.job->*set)(value);
+  if (walk.open_job() != nullptr) (walk.open_job()->*set)(value);
 }
 
 template <void (UpgradeConfig::*set)(int) noexcept>
 void JobNumber(Walk& walk, const char* value) noexcept {
-  if (walk.job != nullptr) (walk.job->*set)(base::LeadingInt(value));
+  if (walk.open_job() != nullptr) (walk.open_job()->*set)(base::LeadingInt(value));
 }
 
 /// KEPT ODDITY: only the exact text "false" is false; "False", "0" and "" are true.
 template <void (UpgradeConfig::*set)(int) noexcept>
 void JobSwitch(Walk& walk, const char* value) noexcept {
-  if (walk.job != nullptr) (walk.job->*set)(std::string_view(value) == "false" ? 0 : 1);
+  if (walk.open_job() != nullptr)
+    (walk.open_job()->*set)(std::string_view(value) == "false" ? 0 : 1);
 }
 
 void Process(Walk& walk, const char* value) noexcept {

@@ -21,6 +21,7 @@ IcfgResult BeginTop(Walk& walk, std::uint32_t mode) noexcept {
   auto* const job = new UpgradeConfig;
   const WalkLock lock;
   walk.job = job;
+  walk.job_started = false;
   walk.download_file.Forget();
   walk.storage.Forget();
   walk.registry_test.Forget();
@@ -56,10 +57,10 @@ void HandOver(Walk& walk, CurrentRecord<Record>& current,
               void (UpgradeConfig::*add)(Record*) noexcept,
               const orvenix::PointerList<Record>& (UpgradeConfig::*list)()
                   const noexcept) noexcept {
-  const std::size_t before = (walk.job->*list)().size();
-  (walk.job->*add)(current.get());
+  const std::size_t before = (walk.open_job()->*list)().size();
+  (walk.open_job()->*add)(current.get());
   current.HandedOver();
-  if ((walk.job->*list)().size() == before) current.Forget();
+  if ((walk.open_job()->*list)().size() == before) current.Forget();
 }
 
 IcfgResult BeginDownloadFile(Walk& walk) noexcept {
@@ -76,8 +77,8 @@ IcfgResult BeginFileList(Walk& walk, std::uint32_t /*mode*/) noexcept {
 IcfgResult EndFileList(Walk& walk) noexcept {
   walk.in_file_list = false;
   const WalkLock lock;
-  if (walk.job == nullptr || walk.download_file.get() == nullptr) return IcfgResult::kOk;
-  walk.job->AddMCFileList(walk.download_file.get());
+  if (walk.open_job() == nullptr || walk.download_file.get() == nullptr) return IcfgResult::kOk;
+  walk.open_job()->AddMCFileList(walk.download_file.get());
   walk.download_file.HandedOver();
   return IcfgResult::kOk;
 }
@@ -95,9 +96,10 @@ IcfgResult BeginFile(Walk& walk, std::uint32_t /*mode*/) noexcept {
 }
 
 void EndCleanupFile(Walk& walk) noexcept {
-  if (walk.job != nullptr && !walk.cleanup_name.empty()) {
-    if (walk.cleanup_action == Walk::kSave) walk.job->AddFileSave(walk.cleanup_name.c_str());
-    if (walk.cleanup_action == Walk::kDelete) walk.job->AddFileDelete(walk.cleanup_name.c_str());
+  if (walk.open_job() != nullptr && !walk.cleanup_name.empty()) {
+    if (walk.cleanup_action == Walk::kSave) walk.open_job()->AddFileSave(walk.cleanup_name.c_str());
+    if (walk.cleanup_action == Walk::kDelete)
+      walk.open_job()->AddFileDelete(walk.cleanup_name.c_str());
   }
   ResetCleanup(walk);
 }
@@ -106,7 +108,8 @@ IcfgResult EndFile(Walk& walk) noexcept {
   const WalkLock lock;
   if (walk.in_disk_cleanup) {
     EndCleanupFile(walk);
-  } else if (walk.in_download && walk.job != nullptr && walk.download_file.get() != nullptr) {
+  } else if (walk.in_download && walk.open_job() != nullptr &&
+             walk.download_file.get() != nullptr) {
     HandOver(walk, walk.download_file, &UpgradeConfig::AddDownloadFile,
              &UpgradeConfig::DownloadFiles);
   }
@@ -121,7 +124,7 @@ IcfgResult BeginStore(Walk& walk, std::uint32_t /*mode*/) noexcept {
 
 IcfgResult EndStore(Walk& walk) noexcept {
   const WalkLock lock;
-  if (walk.job != nullptr && walk.storage.get() != nullptr) {
+  if (walk.open_job() != nullptr && walk.storage.get() != nullptr) {
     HandOver(walk, walk.storage, &UpgradeConfig::AddStorageReqEntry,
              &UpgradeConfig::StorageRequirements);
   }
@@ -143,7 +146,7 @@ IcfgResult BeginRegistry(Walk& walk, std::uint32_t /*mode*/) noexcept {
 /// reason.
 IcfgResult EndRegistry(Walk& walk) noexcept {
   const WalkLock lock;
-  if (walk.job != nullptr) {
+  if (walk.open_job() != nullptr) {
     HandOver(walk, walk.registry_test, &UpgradeConfig::AddRegistryTest,
              &UpgradeConfig::RegistryTests);
   }

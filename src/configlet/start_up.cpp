@@ -7,11 +7,11 @@
 #include "base/text.h"
 #include "configlet/walk.h"
 #include "device/handle.h"
-#include "orvenix/upgrade_thread.h"
 #include "report/log/log.h"
 #include "upgrade/progress.h"
 #include "upgrade/run_state/run_state.h"
 #include "upgrade/storage_check.h"
+#include "upgrade/turn.h"
 #include "upgrade/upgrade_thread.h"
 
 namespace configlet {
@@ -73,17 +73,40 @@ Preflight Check(const Walk& walk) noexcept {
   return Preflight::kReady;
 }
 
+/// Takes the job's place in the queue before its own thread, if one runs, can free it.
+std::uint32_t TakeNumber(Walk& walk, bool* was_started) noexcept {
+  const WalkLock lock;
+  *was_started = walk.job_started;
+  if (walk.job == nullptr) return 0;
+  walk.job_started = true;
+  walk.download_file.ForgetJobs();
+  walk.storage.ForgetJobs();
+  walk.registry_test.ForgetJobs();
+  return upgrade::TakeNumber(walk.job, 0);
+}
+
 void StartThread(Walk& walk) noexcept {
   report::Log("Orvenix - StartUpgradeThread\r\n");
   upgrade::SetJobFreedListener(ForgetJob);
-  const device::ThreadHandle thread(StartUpgradeThread(walk.job, 0));
-  if (!thread) upgrade::EndUpgrade();  // else the thread does that when it is through
+  bool was_started = false;
+  const device::ThreadHandle thread(upgrade::StartNumber(TakeNumber(walk, &was_started)));
+  if (thread) return;  // the thread clears the word when it is through
+  {
+    const WalkLock lock;
+    walk.job_started = walk.job != nullptr && was_started;
+  }
+  upgrade::EndUpgrade();
+}
+
+bool HasJob(const Walk& walk) noexcept {
+  const WalkLock lock;
+  return walk.job != nullptr;
 }
 
 }  // namespace
 
 IcfgResult StartJob(Walk& walk) noexcept {
-  if (walk.job == nullptr) {
+  if (!HasJob(walk)) {
     upgrade::EndUpgrade();
     return IcfgResult::kOk;
   }

@@ -50,6 +50,7 @@ class CurrentRecord {
 struct Walk {
   base::FixedText<128> group;    ///< begun most recently; its end does not bring the parent back
   UpgradeConfig* job = nullptr;  ///< being filled, and still after it was started
+  bool job_started = false;      ///< an upgrade thread reads `job`: nothing more goes into it
   bool in_file_list = false;
   bool in_disk_cleanup = false;
   bool in_download = false;
@@ -59,6 +60,9 @@ struct Walk {
   CurrentRecord<tagRegistryTest> registry_test;
   base::FixedText<260> cleanup_name;
   char cleanup_action = kNoAction;
+
+  /// The job as long as it may be filled. Hold a WalkLock.
+  [[nodiscard]] UpgradeConfig* open_job() const noexcept { return job_started ? nullptr : job; }
 
   static constexpr char kNoAction = ' ';
   static constexpr char kDelete = 'D';

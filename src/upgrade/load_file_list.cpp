@@ -16,6 +16,8 @@ namespace {
 constexpr int kAttempts = 3;
 /// Far beyond any list; a larger file is not one.
 constexpr std::uint32_t kLargestListFile = 16U * 1024 * 1024;
+/// As many records as leave the device memory to fetch with: a stranger's list could ask for more.
+constexpr std::uint32_t kMostRecords = 8192;
 
 /// Deletes a list file that is not the one that the job names.
 void DropWrongList(const tagDownloadFile& list, const char* path) noexcept {
@@ -69,8 +71,12 @@ void AddRecords(UpgradeConfig& job, device::File& file) noexcept {
   if (!bytes || !file.Read(bytes.get(), size, &length)) return;
   ListFileReader reader({bytes.get(), length});
   ListRecord record;
-  while (reader.Next(&record)) {
-    if (!AddRecord(job, record)) return;
+  for (std::uint32_t count = 0; reader.Next(&record); ++count) {
+    if (count == kMostRecords || !AddRecord(job, record)) {
+      report::Log("Orvenix - LoadFileList, list too long, %d records taken\r\n",
+                  static_cast<int>(count));
+      return;
+    }
   }
 }
 

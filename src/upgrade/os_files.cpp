@@ -46,8 +46,8 @@ void AppendCommandLine(UpgradeConfig& job, const FirmwarePackage& package) noexc
 /// A package in numbered parts.
 bool FetchParts(Run& run, const FirmwarePackage& package, bool result) noexcept {
   const PackageTexts texts(package);
-  AppendCommandLine(run.job, package);
   const std::uint32_t parts = package.count < 0 ? 0 : static_cast<std::uint32_t>(package.count);
+  if (parts > 0) AppendCommandLine(run.job, package);
   for (std::uint32_t part = 1; part <= parts; ++part) {
     char ending[24];
     base::Format(ending, sizeof ending, "%03u.zip", part);
@@ -55,7 +55,7 @@ bool FetchParts(Run& run, const FirmwarePackage& package, bool result) noexcept 
     PathText destination;
     if (!JoinPath(source, texts.source_folder, texts.base, ending) ||
         !JoinPath(destination, texts.destination_folder, texts.base, ending)) {
-      continue;
+      break;  // later numbers are not shorter
     }
     result = FetchShown(run, source, destination);
   }

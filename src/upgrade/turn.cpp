@@ -2,7 +2,7 @@
 
 #include <coredll.h>
 
-#include <atomic>
+#include "device/lock.h"
 
 namespace upgrade {
 namespace {
@@ -11,42 +11,53 @@ constexpr std::uint32_t kPlaces = 8;
 constexpr DWORD kLookEveryMs = 50;
 
 struct Place {
-  std::atomic<UpgradeConfig*> job;
-  std::atomic<std::int32_t> mode;
-  std::atomic<bool> presented;
+  UpgradeConfig* job;
+  std::int32_t mode;
+  bool presented;
+  bool given_back;  ///< no thread will come for this number
 };
 
-// Numbers go up by one; 0 is none. The host's thread alone writes `last_taken`, the thread whose
-// turn ends alone writes `serving`, so plain atomic values do.
-std::atomic<std::uint32_t> last_taken{0};
-std::atomic<std::uint32_t> serving{1};
+// Numbers go up by one; 0 is none. The lock also orders what one job's thread did before what the
+// next one's does.
+device::Lock lock;
+std::uint32_t last_taken = 0;
+std::uint32_t serving = 1;
 Place places[kPlaces];
 
 Place& PlaceOf(std::uint32_t number) noexcept {
   return places[number % kPlaces];
 }
 
+/// Lock held.
+void SkipNumbersGivenBack() noexcept {
+  while (serving <= last_taken && PlaceOf(serving).given_back) ++serving;
+}
+
+bool IsServing(std::uint32_t number) noexcept {
+  const device::LockGuard guard(lock);
+  return serving == number;
+}
+
 }  // namespace
 
 std::uint32_t TakeNumber(UpgradeConfig* job, std::int32_t mode) noexcept {
-  const std::uint32_t number = last_taken.load(std::memory_order_relaxed) + 1;
-  if (number - serving.load(std::memory_order_relaxed) >= kPlaces) return 0;
-  Place& place = PlaceOf(number);
-  place.job.store(job, std::memory_order_relaxed);
-  place.mode.store(mode, std::memory_order_relaxed);
-  place.presented.store(false, std::memory_order_relaxed);
-  last_taken.store(number, std::memory_order_relaxed);
+  const device::LockGuard guard(lock);
+  const std::uint32_t number = last_taken + 1;
+  if (number - serving >= kPlaces) return 0;
+  PlaceOf(number) = {job, mode, false, false};
+  last_taken = number;
   return number;
 }
 
 void GiveNumberBack(std::uint32_t number) noexcept {
-  PlaceOf(number).job.store(nullptr, std::memory_order_relaxed);
-  last_taken.store(number - 1, std::memory_order_relaxed);
+  const device::LockGuard guard(lock);
+  PlaceOf(number) = {nullptr, 0, false, true};
+  SkipNumbersGivenBack();
 }
 
 bool AwaitTurn(std::uint32_t number, std::uint32_t timeout_ms) noexcept {
   std::uint32_t waited_ms = 0;
-  while (serving.load(std::memory_order_relaxed) != number) {
+  while (!IsServing(number)) {
     if (waited_ms >= timeout_ms) return false;
     Sleep(kLookEveryMs);
     if (timeout_ms != INFINITE) waited_ms += kLookEveryMs;
@@ -55,25 +66,27 @@ bool AwaitTurn(std::uint32_t number, std::uint32_t timeout_ms) noexcept {
 }
 
 Handover HandoverOf(std::uint32_t number) noexcept {
+  const device::LockGuard guard(lock);
   const Place& place = PlaceOf(number);
-  return {place.job.load(std::memory_order_relaxed), place.mode.load(std::memory_order_relaxed),
-          place.presented.load(std::memory_order_relaxed)};
+  return {place.job, place.mode, place.presented};
 }
 
 void NotePresented(std::uint32_t number) noexcept {
-  PlaceOf(number).presented.store(true, std::memory_order_relaxed);
+  const device::LockGuard guard(lock);
+  PlaceOf(number).presented = true;
 }
 
 void ForgetJob(const UpgradeConfig* job) noexcept {
+  const device::LockGuard guard(lock);
   for (Place& place : places) {
-    if (place.job.load(std::memory_order_relaxed) == job) {
-      place.job.store(nullptr, std::memory_order_relaxed);
-    }
+    if (place.job == job) place.job = nullptr;
   }
 }
 
 void EndTurn(std::uint32_t number) noexcept {
-  serving.store(number + 1, std::memory_order_relaxed);
+  const device::LockGuard guard(lock);
+  serving = number + 1;
+  SkipNumbersGivenBack();
 }
 
 }  // namespace upgrade

@@ -18,12 +18,11 @@ struct Handover {
   bool presented = false;        ///< the progress window has been opened for it
 };
 
-/// Takes a place behind the jobs that were handed over before. Only one thread at a time may hand
-/// jobs over: numbers are given without a lock.
+/// Takes a place behind the jobs that were handed over before. Any thread, as all of these.
 /// @return the number, or 0 when too many wait already.
 std::uint32_t TakeNumber(UpgradeConfig* job, std::int32_t mode) noexcept;
 
-/// Gives up the number that was taken last, because no thread runs it.
+/// Gives a number up, because no thread runs it.
 void GiveNumberBack(std::uint32_t number) noexcept;
 
 /// Waits until it is this number's turn.

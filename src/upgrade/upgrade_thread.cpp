@@ -146,9 +146,10 @@ void ShowEnd() noexcept {
 }
 
 void FreeJob(UpgradeConfig* job) noexcept {
-  ForgetJob(job);
+  // The host's side first: then nobody can take another number for the job.
   const auto listener = job_freed_listener.load(std::memory_order_relaxed);
   if (listener != nullptr) listener(job);
+  ForgetJob(job);
   delete job;
 }
 
@@ -195,6 +196,8 @@ DWORD WINAPI UpgradeThread(void* argument) {
   if (handed.job != nullptr) {
     if (!handed.presented) Present(*handed.job, handed.mode);
     RunJob(handed.job, handed.mode);
+  } else {
+    EndUpgrade();
   }
   EndTurn(number);
   return 0;
@@ -217,20 +220,23 @@ void SetJobFreedListener(void (*listener)(const UpgradeConfig* job)) noexcept {
   job_freed_listener.store(listener, std::memory_order_relaxed);
 }
 
-}  // namespace upgrade
-
-extern "C" void* StartUpgradeThread(UpgradeConfig* config, std::int32_t mode) noexcept {
-  using namespace upgrade;
-  const std::uint32_t number = config == nullptr ? 0 : TakeNumber(config, mode);
+void* StartNumber(std::uint32_t number) noexcept {
   if (number == 0) return nullptr;
   // While an earlier job runs on, its window stays; the thread then opens one when its turn comes.
   if (AwaitTurn(number, kHostWaitMs)) {
-    if (HandoverOf(number).job == nullptr) {
+    const Handover handed = HandoverOf(number);
+    if (handed.job == nullptr) {
       GiveNumberBack(number);
       return nullptr;
     }
-    Present(*config, mode);
+    Present(*handed.job, handed.mode);
     NotePresented(number);
   }
   return StartThread(number);
+}
+
+}  // namespace upgrade
+
+extern "C" void* StartUpgradeThread(UpgradeConfig* config, std::int32_t mode) noexcept {
+  return config == nullptr ? nullptr : upgrade::StartNumber(upgrade::TakeNumber(config, mode));
 }

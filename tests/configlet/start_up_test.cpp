@@ -126,6 +126,26 @@ TEST_F(StartUpTest, TakesFieldsAndGroupsWhileTheThreadRunsAndAfterIt) {
   EXPECT_EQ(device().memory().bad_frees(), 0U);
 }
 
+TEST_F(StartUpTest, LeavesARunningJobsListsAlone) {
+  Fill();
+  Begin("Download");
+  for (int i = 0; i < 8; ++i) {
+    Begin("File");
+    Set("Source", "absent");
+    Set("MCTMask", "*");
+    Set("CRC", "1");
+    End("File");
+  }
+  const UpgradeConfig* const started = &job();
+  EndUpgrade();
+  Sleep(5000);  // the thread is within the list: nobody answers it
+
+  for (int i = 0; i < 20; ++i) EXPECT_EQ(End("File"), ICFG_OK);
+
+  EXPECT_EQ(started->DownloadFiles().size(), 8U);
+  EXPECT_TRUE(upgrade::UpgradeInProgress());
+}
+
 TEST_F(StartUpTest, DoesNothingWithoutAJob) {
   Begin("Upgrade");
   device().power().SetStatus(0, 4, 1);
