@@ -80,23 +80,22 @@ nlohmann::ordered_json ToJson(const server::Event& event, server::Time start) {
   nlohmann::ordered_json json{{"event", server::EventName(event.kind)},
                               {"seconds", SecondsSince(start, event.when)},
                               {"address", event.address}};
-  if (event.device != nullptr) json["device"] = event.device->key;
-  if (!event.path.empty()) json["path"] = event.path;
-  switch (event.kind) {
-    case server::EventKind::kRequest:
-    case server::EventKind::kNotFound:
-      json["attempt"] = event.device->attempt;
-      json["total"] = event.device->total;
-      [[fallthrough]];
-    case server::EventKind::kSent:
-    case server::EventKind::kAborted: json["bytes"] = event.bytes; break;
-    case server::EventKind::kReport:
-      json["bundle_rx"] = event.bytes;
-      json["http_fallback"] = event.device->http_fallback;
-      json["error"] = event.detail;
-      return json;
-    case server::EventKind::kBadRequest: break;
+  if (event.device == nullptr) {
+    json["detail"] = event.detail;
+    return json;
   }
+  const server::DeviceRecord& device = *event.device;
+  json["device"] = device.key;
+  if (event.kind == server::EventKind::kReport) {
+    json["bundle_rx"] = event.bytes;
+    json["http_fallback"] = device.http_fallback;
+    json["error"] = event.detail;
+    return json;
+  }
+  json["path"] = event.path;
+  json["attempt"] = device.attempt;
+  json["total"] = device.total;
+  json["bytes"] = event.bytes;
   if (!event.detail.empty()) json["detail"] = event.detail;
   return json;
 }

@@ -41,7 +41,7 @@ class JobReader {
 };
 
 std::string JobReader::NameOf(const pugi::xml_node& node) const {
-  const std::string name = node.attribute("Name").value();
+  std::string name = node.attribute("Name").value();
   if (name.empty()) {
     Fail(node.offset_debug(), std::string("<") + node.name() + "> has no Name",
          "write <" + std::string(node.name()) + " Name=\"...\">");
