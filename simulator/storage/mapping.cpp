@@ -64,7 +64,7 @@ namespace {
 DWORD PrepareFile(Mapping::Source& source, std::uint64_t size) {
   OpenFile& file = *source.file;
   if (!file.mode().mappable) return ERROR_INVALID_HANDLE;
-  if (!file.readable() || (source.writable && !file.writable())) return ERROR_ACCESS_DENIED;
+  if (!file.can_read() || (source.writable && !file.can_write())) return ERROR_ACCESS_DENIED;
   const std::uint64_t have = file.size();
   if (size == 0) size = have;
   if (size == 0) return ERROR_FILE_INVALID;
@@ -129,7 +129,7 @@ void* MapViewOfFile(HANDLE mapping, DWORD access, DWORD offset_high, DWORD offse
     return call.Fail(ERROR_INVALID_PARAMETER, none);
   }
   const bool writable = (access & FILE_MAP_WRITE) != 0;
-  if (writable && !found->writable()) return call.Fail(ERROR_ACCESS_DENIED, none);
+  if (writable && !found->can_write()) return call.Fail(ERROR_ACCESS_DENIED, none);
   const std::size_t left = offset_low < found->size() ? found->size() - offset_low : 0;
   if (offset_high != 0 || left == 0 || size > left) {
     return call.Fail(ERROR_INVALID_PARAMETER, none);

@@ -34,7 +34,7 @@ class Mapping final : public KernelObject {
   void OwnHandle(HANDLE file) { file_handle_ = file; }
   [[nodiscard]] char* content() { return content_.get(); }
   [[nodiscard]] std::size_t size() const { return source_.size; }
-  [[nodiscard]] bool writable() const { return source_.writable; }
+  [[nodiscard]] bool can_write() const { return source_.writable; }
   /// Writes the content back into the file.
   void Store();
   /// Gives up the file: the device ends.

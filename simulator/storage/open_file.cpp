@@ -46,7 +46,7 @@ OpenFile::~OpenFile() {
 
 DWORD OpenFile::Read(void* bytes, DWORD size, DWORD& read) {
   read = 0;
-  if (!readable()) return ERROR_ACCESS_DENIED;
+  if (!can_read()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   if (!node_->volume.present()) return ERROR_NOT_READY;
   while (read < size) {
@@ -63,7 +63,7 @@ DWORD OpenFile::Read(void* bytes, DWORD size, DWORD& read) {
 
 DWORD OpenFile::Write(const void* bytes, DWORD size, DWORD& written) {
   written = 0;
-  if (!writable()) return ERROR_ACCESS_DENIED;
+  if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   if (!node_->volume.present()) return ERROR_NOT_READY;
   if (size == 0) return ERROR_SUCCESS;
@@ -109,7 +109,7 @@ DWORD OpenFile::Seek(std::int64_t distance, DWORD method, std::uint64_t most,
 }
 
 DWORD OpenFile::SetEnd() {
-  if (!writable()) return ERROR_ACCESS_DENIED;
+  if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   if (!node_->volume.present()) return ERROR_NOT_READY;
   return Resize(position_);
@@ -130,13 +130,13 @@ DWORD OpenFile::Resize(std::uint64_t size) {
 }
 
 DWORD OpenFile::Lengthen(std::uint64_t size) {
-  if (!writable()) return ERROR_ACCESS_DENIED;
+  if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   return size > node_->size ? Resize(size) : ERROR_SUCCESS;
 }
 
 DWORD OpenFile::Load(char* bytes, std::size_t size) {
-  if (!readable()) return ERROR_ACCESS_DENIED;
+  if (!can_read()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   std::size_t have = 0;
   while (have < size) {
@@ -151,7 +151,7 @@ DWORD OpenFile::Load(char* bytes, std::size_t size) {
 }
 
 DWORD OpenFile::Store(const char* bytes, std::size_t size) {
-  if (!writable()) return ERROR_ACCESS_DENIED;
+  if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   const std::size_t kept = std::min<std::uint64_t>(size, node_->size);
   if (!WriteAt(fd_.get(), bytes, kept, 0)) return ErrorOfErrno(errno);
@@ -160,7 +160,7 @@ DWORD OpenFile::Store(const char* bytes, std::size_t size) {
 }
 
 DWORD OpenFile::Flush() {
-  if (!writable()) return ERROR_ACCESS_DENIED;
+  if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   storage_->Keep(*node_);
   return ERROR_SUCCESS;
@@ -178,7 +178,7 @@ FileRecord OpenFile::record() const {
 
 DWORD OpenFile::SetTimes(const FILETIME* created, const FILETIME* accessed,
                          const FILETIME* written) {
-  if (!writable()) return ERROR_ACCESS_DENIED;
+  if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   if (created != nullptr) node_->record.created = ToTicks(*created);
   if (accessed != nullptr) node_->record.accessed = ToTicks(*accessed);

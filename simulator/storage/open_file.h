@@ -78,8 +78,8 @@ class OpenFile final : public KernelObject {
   /// Null pointers leave their time as it is.
   DWORD SetTimes(const FILETIME* created, const FILETIME* accessed, const FILETIME* written);
 
-  [[nodiscard]] bool readable() const { return (mode_.access & GENERIC_READ) != 0; }
-  [[nodiscard]] bool writable() const { return (mode_.access & GENERIC_WRITE) != 0; }
+  [[nodiscard]] bool can_read() const { return (mode_.access & GENERIC_READ) != 0; }
+  [[nodiscard]] bool can_write() const { return (mode_.access & GENERIC_WRITE) != 0; }
   [[nodiscard]] const Mode& mode() const { return mode_; }
 
  private:

@@ -137,6 +137,7 @@ void Storage::Recount() {
   for (const auto& [key, weak] : nodes_) {
     if (auto node = weak.lock()) nodes.push_back(std::move(node));
   }
+  quiet.reserve(nodes.size());
   for (const auto& node : nodes) quiet.emplace_back(node->mutex);
   Count([](const std::string&) {});
 }
