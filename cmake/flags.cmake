@@ -20,6 +20,11 @@ if(ORVENIX_SANITIZE)
   add_link_options(-fsanitize=${ORVENIX_SANITIZE})
 endif()
 
+# What is fuzzed reports which of its branches an input takes.
+if(ORVENIX_FUZZ)
+  add_compile_options(-fsanitize=fuzzer-no-link)
+endif()
+
 # Sources by folder: a new file needs no line in a list.
 function(orvenix_sources result)
   set(found)

@@ -27,12 +27,7 @@ constexpr std::chrono::milliseconds kAcceptPause{100};
 class HttpServer::Listener : public std::enable_shared_from_this<Listener> {
  public:
   Listener(asio::io_context& loop, Site& site, DeviceLedger& ledger, HttpServerOptions options)
-      : loop_(loop),
-        site_(site),
-        ledger_(ledger),
-        options_(std::move(options)),
-        acceptor_(loop),
-        retry_(loop) {}
+      : site_(site), ledger_(ledger), options_(std::move(options)), acceptor_(loop), retry_(loop) {}
 
   void Open();
   void Accept();
@@ -47,7 +42,6 @@ class HttpServer::Listener : public std::enable_shared_from_this<Listener> {
   void Take(tcp::socket socket);
   void Leave(Connection* connection);
 
-  asio::io_context& loop_;
   Site& site_;
   DeviceLedger& ledger_;
   const HttpServerOptions options_;
