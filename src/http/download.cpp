@@ -163,7 +163,8 @@ CHTTPClient::Round CHTTPClient::ReceiveFile(const ResponseHead& head,
   }
   // Never more than the file's length, whatever the server sends.
   const auto begun = static_cast<std::uint32_t>(first.size() < length ? first.size() : length);
-  if (!WriteBlock(0, first.data(), begun)) {
+  // Without a byte of the body there is nothing to point at, which the platform may not take.
+  if (!WriteBlock(0, begun == 0 ? buffer_.get() : first.data(), begun)) {
     ShowStatus(texts::kShowWriteError, path);
     Log(texts::kFirstWriteError);
     return FailWithFile();

@@ -141,8 +141,9 @@ int CSocketIO::ReadData(char* buffer, std::uint32_t size) noexcept {
 
 bool CSocketIO::Close() noexcept {
   if (!is_open()) return false;
-  shutdown(socket_, SD_SEND);
-  Drain();
+  // A socket that never came to a connection has nothing to take in and never becomes readable:
+  // waiting for it would cost the whole time-out.
+  if (shutdown(socket_, SD_SEND) == 0 || GetLastError() != static_cast<DWORD>(WSAENOTCONN)) Drain();
   Log(texts::kClose);
   CloseAtOnce();
   return true;

@@ -1,6 +1,7 @@
 #include "mcftp/udp_socket/udp_socket.h"
 
 #include <cstring>
+#include <string_view>
 
 namespace mcftp {
 namespace {
@@ -31,8 +32,9 @@ bool WaitUntilReadable(SOCKET socket, std::uint32_t timeout_ms) noexcept {
 }  // namespace
 
 std::uint32_t ParseAddress(const char* text) noexcept {
-  // Some systems read an empty text as 0.0.0.0.
-  return base::View(text).empty() ? INADDR_NONE : inet_addr(text);
+  // The device reads an empty text, and one blank, as 0.0.0.0.
+  const std::string_view dots = base::View(text);
+  return dots.empty() || dots == " " ? INADDR_NONE : inet_addr(text);
 }
 
 bool SocketLibrary::Start() noexcept {

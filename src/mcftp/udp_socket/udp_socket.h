@@ -14,8 +14,8 @@ namespace mcftp {
 /// Dotted IPv4 text: "255.255.255.255" and the zero.
 using AddressText = base::FixedText<16>;
 
-/// The address in network order, or INADDR_NONE when `text` is null, empty or no IPv4 address.
-/// "255.255.255.255" is not accepted either, because its number is INADDR_NONE.
+/// The address in network order, or INADDR_NONE when `text` is null, empty, a blank or no IPv4
+/// address. "255.255.255.255" is not accepted either, because its number is INADDR_NONE.
 [[nodiscard]] std::uint32_t ParseAddress(const char* text) noexcept;
 
 /// A reference to Windows Sockets 1.1: started for as long as somebody holds one.

@@ -73,6 +73,7 @@ TEST(ParseAddressTest, TakesDottedAddressesOnly) {
 TEST_F(UdpSocketTest, ReadsAnAddressInNetworkOrder) {
   EXPECT_EQ(mcftp::ParseAddress("10.0.0.2"), 0x0200000AU);
   EXPECT_EQ(mcftp::ParseAddress("syslog"), INADDR_NONE);
+  EXPECT_EQ(mcftp::ParseAddress(" "), INADDR_NONE) << "the platform itself reads 0.0.0.0";
   EXPECT_EQ(mcftp::ParseAddress("255.255.255.255"), INADDR_NONE);
 }
 
