@@ -87,6 +87,7 @@ std::unique_ptr<HostProgram> HostProgram::Start(const HostCommand& command) {
   if (failed || !plan.Prepare(folder)) return nullptr;
   std::vector<std::string> texts = Environment(command, folder);
   std::vector<char*> environment;
+  environment.reserve(texts.size() + 1);
   for (std::string& text : texts) environment.push_back(text.data());
   environment.push_back(nullptr);
   std::string shell = "sh";

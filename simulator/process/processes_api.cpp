@@ -93,6 +93,7 @@ BOOL Process32Next(HANDLE snapshot, PROCESSENTRY32* entry) {
   return sim::NextEntry(call, snapshot, entry, false);
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's parameters
 BOOL CreateProcessW(const WCHAR* program, WCHAR* command_line, SECURITY_ATTRIBUTES* /*process*/,
                     SECURITY_ATTRIBUTES* /*thread*/, BOOL inherit, DWORD flags, void* environment,
                     const WCHAR* folder, STARTUPINFOW* /*startup*/,

@@ -58,6 +58,7 @@ LONG RegOpenKeyExW(HKEY key, const WCHAR* name, DWORD /*options*/, REGSAM /*acce
   return Finish(call, call.device().registry().Open(key, name, *opened));
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's parameters
 LONG RegCreateKeyExW(HKEY key, const WCHAR* name, DWORD /*reserved*/, WCHAR* /*class_name*/,
                      DWORD /*options*/, REGSAM /*access*/, SECURITY_ATTRIBUTES* /*security*/,
                      HKEY* opened, DWORD* disposition) {
@@ -129,6 +130,7 @@ LONG RegDeleteKeyW(HKEY key, const WCHAR* name) {
   return Finish(call, call.device().registry().DeleteKey(key, name));
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's parameters
 LONG RegEnumKeyExW(HKEY key, DWORD index, WCHAR* name, DWORD* name_size, DWORD* /*reserved*/,
                    WCHAR* class_name, DWORD* class_size, FILETIME* last_write) {
   sim::ApiCall call("RegEnumKeyExW", ERROR_NO_MORE_ITEMS);
@@ -148,6 +150,7 @@ LONG RegEnumKeyExW(HKEY key, DWORD index, WCHAR* name, DWORD* name_size, DWORD* 
   return Finish(call, ERROR_SUCCESS);
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's parameters
 LONG RegEnumValueW(HKEY key, DWORD index, WCHAR* name, DWORD* name_size, DWORD* /*reserved*/,
                    DWORD* type, BYTE* data, DWORD* size) {
   sim::ApiCall call("RegEnumValueW", ERROR_NO_MORE_ITEMS);

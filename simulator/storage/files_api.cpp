@@ -42,12 +42,14 @@ BOOL Finish(sim::ApiCall& call, DWORD error) {
 
 }  // namespace
 
+// NOLINTNEXTLINE(readability-function-size): the platform's parameters
 HANDLE CreateFileW(const WCHAR* name, DWORD access, DWORD share, SECURITY_ATTRIBUTES* /*security*/,
                    DWORD disposition, DWORD attributes, HANDLE /*template_file*/) {
   sim::ApiCall call("CreateFileW", ERROR_ACCESS_DENIED);
   return OpenByName(call, name, {name, {access, share, false, false}, disposition, attributes});
 }
 
+// NOLINTNEXTLINE(readability-function-size): the platform's parameters
 HANDLE CreateFileForMappingW(const WCHAR* name, DWORD access, DWORD share,
                              SECURITY_ATTRIBUTES* /*security*/, DWORD disposition, DWORD attributes,
                              HANDLE /*template_file*/) {
