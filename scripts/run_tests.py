@@ -71,9 +71,10 @@ def ctest(preset, *arguments):
             counts.failed += 1
             show_log(step)
             return False
-        failed = 0
+        failed = ran = 0
         for case in ElementTree.parse(report).getroot().iter("testcase"):
             status = case.get("status")
+            ran += 1
             if status == "run":
                 counts.passed += 1
             elif status in ("notrun", "disabled") or case.find("skipped") is not None:
@@ -82,6 +83,9 @@ def ctest(preset, *arguments):
             else:
                 failed += 1
                 print(f"    FAILED: {case.get('name')}")
+        if ran == 0:
+            failed = 1
+            print("    FAILED: there was no test to run")
         counts.failed += failed
         if failed:
             show_log(step, 80)
