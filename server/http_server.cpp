@@ -218,7 +218,11 @@ HttpServer::HttpServer(asio::io_context& loop, Site& site, DeviceLedger& ledger,
 }
 
 HttpServer::~HttpServer() {
-  Stop();
+  try {
+    Stop();
+  } catch (...) {
+    // Out of memory: what is left open ends with the loop.
+  }
 }
 
 std::uint16_t HttpServer::port() const {
