@@ -1,0 +1,24 @@
+// Documents as text.
+#pragma once
+
+#include <cstdint>
+
+#include "xml/document.h"
+
+namespace xml {
+
+/// Hands the document, piece by piece, to its output's sink. A parsed document is laid out in the
+/// style of its text (byte-order mark, line ends, one tab or blank per level); one made by calls is
+/// a single line. A document without a root is its declaration alone. No recursion, no memory.
+///
+/// Levels beyond kMaxOpenElements, which only calls can make, are not indented any further.
+void WriteToSink(XmlDocument& document);
+
+/// The document as text, with a zero behind it, in one block of exactly its size.
+///
+/// @param length  when given, receives the bytes without the zero, even if there is no memory
+/// @return null when there is no memory, or the text would be larger than any memory. The text
+///   belongs to the document and lives until it is serialised again or cleared.
+const char* Serialize(XmlDocument& document, std::uint32_t* length = nullptr);
+
+}  // namespace xml
