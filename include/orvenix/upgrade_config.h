@@ -3,9 +3,19 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <type_traits>
 
 #include "orvenix/export.h"
 #include "orvenix/pointer_list.h"
+
+namespace orvenix {
+
+/// The platform's 16-bit text unit: what its header calls WCHAR.
+using WideChar = std::conditional_t<sizeof(wchar_t) == 2, wchar_t, char16_t>;
+
+class ConfigurationReader;  // fills a job from a configuration file
+
+}  // namespace orvenix
 
 /// One file to fetch. Made with LocalAlloc and zeroed; all texts are zero-terminated.
 struct tagDownloadFile {  // NOLINT(readability-identifier-naming): callers know this name
@@ -134,6 +144,23 @@ class ORVENIX_EXPORT UpgradeConfig {
   void SetUpgEndMsg(const char* text) noexcept;  ///< [64]
 
   // ---- configuration file ----
+  /// Adds what an upgrade configuration file says, in the order of the file: lists grow, other
+  /// values are replaced. Only a base URL that is set already stays. docs/formats/configuration.md
+  /// describes the file; texts longer than their field are cut.
+  ///
+  /// The file is "\windows\<name>" or, when there is no such file, "\Flash File Store\<name>". The
+  /// one in "\windows" is deleted afterwards, even when it could not be opened or understood.
+  ///
+  /// @param name  converted with the device's code page; null counts as empty. A path of more than
+  ///   259 characters cannot be opened.
+  /// @return 0 when the file cannot be opened, otherwise 1: also when it is malformed, which adds
+  ///   nothing, and when there is no memory to read it, which adds nothing and deletes nothing.
+  int LoadFromFile(const orvenix::WideChar* name) noexcept;
+
+  /// Writes what the job holds, line by line and cut at 4095 characters, to the library's
+  /// diagnostic output. A release has none: nothing happens there.
+  void DumpData() const noexcept;
+
   [[nodiscard]] const char* GetVersion() const noexcept;
   [[nodiscard]] const char* GetFlashFileStore() const noexcept;
   void SetFlashFileStore(const char* folder) noexcept;  ///< [64]
@@ -173,6 +200,8 @@ class ORVENIX_EXPORT UpgradeConfig {
   [[nodiscard]] const orvenix::PointerList<tagRegistryTest>& RegistryTests() const noexcept;
 
  private:
+  friend class orvenix::ConfigurationReader;
+
   /// Everything but the lists, with the defaults of a new job.
   struct Fields {
     std::int32_t transfer_packet_size = 4096;
