@@ -4,7 +4,6 @@ import json
 import pathlib
 import random
 import resource
-import shutil
 import signal
 import socket
 import statistics
@@ -47,9 +46,13 @@ class Server:
         self.drain.wait(30)
 
 
+def fresh(work, name):
+    """A new folder each time: the host makes files more slowly where it has just deleted some."""
+    return pathlib.Path(tempfile.mkdtemp(prefix=name, dir=work))
+
+
 def product(work, port, source, count):
-    device = work / "device"
-    shutil.rmtree(device, ignore_errors=True)
+    device = fresh(work, "device")
     figures, text = measured([BIN / "bench_fetch", device, f"http://{SERVER}:{port}", source, str(count)])
     own = json.loads(text)
     figures["wall"] = own["wall_s"] - own["pauses_s"]
@@ -59,9 +62,7 @@ def product(work, port, source, count):
 
 
 def curl(work, port, source, count):
-    folder = work / "curl"
-    shutil.rmtree(folder, ignore_errors=True)
-    folder.mkdir()
+    folder = fresh(work, "curl")
     names = [source.replace("%d", str(i)) for i in range(1, count + 1)]
     # The server's paths have no leading slash.
     config = "next\n".join(f'url = "http://{SERVER}:{port}/"\nrequest-target = "{name}"\n'

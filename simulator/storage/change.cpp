@@ -65,6 +65,7 @@ DWORD Storage::Unlink(const Location& location) {
   if (::unlinkat(location.folder, location.entry->name.c_str(), 0) != 0) {
     return ErrorOfErrno(errno);
   }
+  parked_.Forget(location.entry->device, location.entry->inode);
   location.volume->space().Release(location.entry->size);
   records_->Erase(location.path());
   return ERROR_SUCCESS;

@@ -20,6 +20,7 @@ namespace {
 
 /// The file is rewritten when it has this many lines more than twice its records.
 constexpr std::size_t kSpareLines = 1024;
+constexpr std::size_t kMostGathered = 64;
 
 std::string SetLine(const std::string& path, const FileRecord& record) {
   std::array<char, 96> numbers{};
@@ -61,6 +62,10 @@ FileRecords::FileRecords(std::filesystem::path file) : file_(std::move(file)) {
   RewriteOrThrow();
 }
 
+FileRecords::~FileRecords() {
+  Flush();
+}
+
 std::optional<FileRecord> FileRecords::Find(const std::string& path) const {
   const std::lock_guard<std::mutex> hold(mutex_);
   const auto found = records_.find(path);
@@ -70,18 +75,41 @@ std::optional<FileRecord> FileRecords::Find(const std::string& path) const {
 
 void FileRecords::Set(const std::string& path, const FileRecord& record) {
   const std::lock_guard<std::mutex> hold(mutex_);
-  records_[path] = record;
-  Append(SetLine(path, record));
+  const auto [known, fresh] = records_.emplace(path, record);
+  FileRecord& kept = known->second;
+  const bool only_times =
+      !fresh && kept.attributes == record.attributes && kept.created == record.created;
+  kept = record;
+  if (!only_times) return Append(SetLine(path, record));
+  gathered_.insert(path);
+  if (gathered_.size() > kMostGathered) WriteGathered();
+}
+
+void FileRecords::Flush() {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  WriteGathered();
+}
+
+void FileRecords::WriteGathered() {
+  std::set<std::string> paths;
+  paths.swap(gathered_);
+  for (const std::string& path : paths) {
+    if (const auto record = records_.find(path); record != records_.end()) {
+      Append(SetLine(path, record->second));
+    }
+  }
 }
 
 void FileRecords::Erase(const std::string& path) {
   const std::lock_guard<std::mutex> hold(mutex_);
+  gathered_.erase(path);
   ApplyErase(path);
   Append("E " + path + '\n');
 }
 
 void FileRecords::Rename(const std::string& from, const std::string& to) {
   const std::lock_guard<std::mutex> hold(mutex_);
+  WriteGathered();  // under the names that the line before knows
   ApplyRename(from, to);
   Append("R " + from + '\t' + to + '\n');
 }
@@ -148,6 +176,7 @@ bool FileRecords::Rewrite() {
   std::string text;
   for (const auto& [path, record] : records_) text += SetLine(path, record);
   if (!ReplaceHostText(file_, text)) return false;
+  gathered_.clear();
   UniqueFd journal(::open(file_.c_str(), O_WRONLY | O_APPEND | O_CLOEXEC | O_NOFOLLOW));
   if (!journal) return false;
   journal_ = std::move(journal);

@@ -91,6 +91,8 @@ DWORD Storage::CheckOpen(const OpenRequest& request, const Location& location) c
 
 DWORD Storage::OpenHost(const OpenRequest& request, Location& location, UniqueFd& fd) {
   const bool creates = !location.entry.has_value();
+  if (!creates) fd = parked_.Take(*location.entry, request.mode.access);
+  if (fd) return ERROR_SUCCESS;  // the entry has just been looked at
   const std::string name = creates ? ToHostText(location.leaf) : location.entry->name;
   const int flags = HostFlags(request.mode.access, !creates && Truncates(request.disposition));
   fd = UniqueFd(
@@ -164,8 +166,13 @@ void Storage::Close(OpenFile& file) {
   CountSharing(*file.node_, file.mode_, -1);
   const std::lock_guard<std::mutex> quiet(file.node_->mutex);
   Keep(*file.node_);
+  const FileNode& node = *file.node_;
+  // Only those opened for writing: for them the host's way of opening is the same at every open.
+  if (file.can_write()) {
+    parked_.Park(node.device, node.inode, file.mode_.access, std::move(file.fd_));
+  }
   file.fd_.Reset();
-  if (file.node_->opens == 0) nodes_.erase({file.node_->device, file.node_->inode});
+  if (node.opens == 0) nodes_.erase({node.device, node.inode});
 }
 
 }  // namespace sim

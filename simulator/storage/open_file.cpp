@@ -162,7 +162,7 @@ DWORD OpenFile::Store(const char* bytes, std::size_t size) {
 DWORD OpenFile::Flush() {
   if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
-  storage_->Keep(*node_);
+  storage_->Flush(*node_);
   return ERROR_SUCCESS;
 }
 

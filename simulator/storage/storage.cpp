@@ -191,4 +191,9 @@ void Storage::Keep(FileNode& node) {
   node.changed = false;
 }
 
+void Storage::Flush(FileNode& node) {
+  Keep(node);
+  records_->Flush();
+}
+
 }  // namespace sim

@@ -27,6 +27,7 @@
 #include "storage/host_folder.h"
 #include "storage/mapping.h"
 #include "storage/open_file.h"
+#include "storage/parked_files.h"
 #include "storage/streams.h"
 #include "storage/unique_fd.h"
 #include "storage/volume.h"
@@ -120,6 +121,8 @@ class Storage {
 
   /// Keeps a file's record on the host when it has changed. The node's lock is held.
   void Keep(FileNode& node);
+  /// Keeps it, and all other files' records, now. The node's lock is held.
+  void Flush(FileNode& node);
   void Close(OpenFile& file);
 
  private:
@@ -146,7 +149,7 @@ class Storage {
   [[nodiscard]] std::shared_ptr<FileNode> FindNode(const HostEntry& entry) const;
   [[nodiscard]] bool OpenBelow(const std::string& path) const;
   [[nodiscard]] DWORD CheckOpen(const OpenRequest& request, const Location& location) const;
-  static DWORD OpenHost(const OpenRequest& request, Location& location, UniqueFd& fd);
+  DWORD OpenHost(const OpenRequest& request, Location& location, UniqueFd& fd);
   std::shared_ptr<FileNode> EnterNode(const Location& location);
   DWORD MakeFresh(FileNode& node, int fd, const OpenRequest& request);
   DWORD Unlink(const Location& location);
@@ -162,6 +165,7 @@ class Storage {
   std::vector<std::unique_ptr<Volume>> volumes_;  ///< the root first
   mutable std::mutex mutex_;
   FolderNames folder_names_;
+  ParkedFiles parked_;
   std::map<std::pair<std::uint64_t, std::uint64_t>, std::weak_ptr<FileNode>> nodes_;
   std::set<OpenFile*> open_files_;
   Streams streams_;

@@ -56,6 +56,55 @@ TEST_F(FileRecordsTest, KeepsEveryChangeAtOnce) {
   EXPECT_EQ(other.Find("c/b")->attributes, 2U);
 }
 
+TEST_F(FileRecordsTest, GathersNewerTimesUntilTheyAreFlushed) {
+  sim::FileRecords records(file());
+  records.Set("log", {1, 5, 5, 5});
+  records.Set("log", {1, 5, 6, 6});
+  records.Set("log", {1, 5, 7, 7});
+
+  EXPECT_EQ(records.Find("log")->written, 7U);
+  EXPECT_EQ(Text(), "S 1 5 5 5 log\n");
+  records.Flush();
+  EXPECT_EQ(Text(), "S 1 5 5 5 log\nS 1 5 7 7 log\n");
+}
+
+TEST_F(FileRecordsTest, WritesGatheredTimesAtTheEndAndWhenThereAreMany) {
+  const int many = 200;
+  {
+    sim::FileRecords records(file());
+    for (int i = 0; i < many; ++i) records.Set(std::to_string(i), {1, 5, 5, 5});
+    for (int i = 0; i < many; ++i) records.Set(std::to_string(i), {1, 5, 6, 6});
+
+    EXPECT_NE(Text().find("S 1 5 6 6 0\n"), std::string::npos);
+  }
+
+  const sim::FileRecords other(file());
+  for (int i = 0; i < many; ++i) EXPECT_EQ(other.Find(std::to_string(i))->written, 6U);
+}
+
+TEST_F(FileRecordsTest, KeepsGatheredTimesThroughARename) {
+  sim::FileRecords records(file());
+  records.Set("a/b", {1, 5, 5, 5});
+  records.Set("a/b", {1, 5, 6, 6});
+
+  records.Rename("a", "c");
+
+  const sim::FileRecords other(file());
+  EXPECT_EQ(other.Find("c/b")->written, 6U);
+  EXPECT_FALSE(other.Find("a/b"));
+}
+
+TEST_F(FileRecordsTest, DoesNotBringBackAnErasedFileByItsGatheredTimes) {
+  {
+    sim::FileRecords records(file());
+    records.Set("a/b", {1, 5, 5, 5});
+    records.Set("a/b", {1, 5, 6, 6});
+    records.Erase("a");
+  }
+
+  EXPECT_FALSE(sim::FileRecords(file()).Find("a/b"));
+}
+
 TEST_F(FileRecordsTest, ErasesAndMovesWhatLiesBelowAndNotWhatOnlyBeginsAlike) {
   sim::FileRecords records(file());
   for (const char* path : {"a", "a/b", "a/b/c", "a.b", "ab"}) records.Set(path, {1, 0, 0, 0});
