@@ -1,7 +1,8 @@
 """clang-tidy over the project's own sources, remembering which were clean.
 
 A source is checked again when it, a header of the project or the configuration has changed. The
-compile commands come from the release tree.
+compile commands come from build/tidy, a release tree that is never built and has no precompiled
+headers: clang cannot read another compiler's.
 """
 
 import concurrent.futures
@@ -13,8 +14,8 @@ import subprocess
 import sys
 
 ROOT = pathlib.Path(__file__).resolve().parent.parent
-TREE = ROOT / "build/release"
-STAMPS = ROOT / "build/tidy"
+TREE = ROOT / "build/tidy"
+STAMPS = TREE / "clean"
 FOLDERS = ("src", "simulator", "server", "tools")
 
 

@@ -5,6 +5,7 @@ one. Long output goes to build/logs/<step>.log and is shown only when the step f
 """
 
 import argparse
+import concurrent.futures
 import os
 import pathlib
 import subprocess
@@ -108,22 +109,26 @@ def fuzz(step, counts):
     if not build("fuzz", "fuzzers")(step, counts):
         return False
     counts.passed -= 1  # the build is part of the step, not a result of its own
-    good = True
-    for target in sorted((ROOT / "build/fuzz/bin").glob("fuzz_*")):
-        name = target.name[len("fuzz_"):]
-        work = ROOT / "build/fuzz/corpus" / name
-        work.mkdir(parents=True, exist_ok=True)
-        seeds = ROOT / "fuzz/corpus" / name
-        command = [str(target), f"-max_total_time={FUZZ_SECONDS}", "-timeout=10", "-rss_limit_mb=2048",
-                   f"-artifact_prefix={work}/crash-", str(work), str(seeds)]
-        if run(step, command):
-            counts.passed += 1
-        else:
-            counts.failed += 1
-            good = False
+    targets = sorted((ROOT / "build/fuzz/bin").glob("fuzz_*"))
+    with concurrent.futures.ThreadPoolExecutor(int(JOBS)) as pool:
+        results = list(pool.map(fuzz_target, targets))
+    for target, good in zip(targets, results):
+        if not good:
             print(f"    FAILED: {target.name}")
-            show_log(step)
-    return good
+            show_log(target.name)
+    counts.passed += results.count(True)
+    counts.failed += results.count(False)
+    return all(results)
+
+
+def fuzz_target(target):
+    name = target.name[len("fuzz_"):]
+    work = ROOT / "build/fuzz/corpus" / name
+    work.mkdir(parents=True, exist_ok=True)
+    (LOGS / f"{target.name}.log").unlink(missing_ok=True)
+    return run(target.name, [
+        str(target), f"-max_total_time={FUZZ_SECONDS}", "-timeout=10", "-rss_limit_mb=2048",
+        f"-artifact_prefix={work}/crash-", str(work), str(ROOT / "fuzz/corpus" / name)])
 
 
 FUZZ_SECONDS = 5
@@ -139,7 +144,7 @@ STEPS = [
     ("dev", "all tests", ctest("dev")),
     ("tsan-build", "build with the thread sanitizer", build("tsan", "threaded_tests")),
     ("tsan", "the threaded tests", ctest("tsan", "-L", "threads")),
-    ("release-build", "optimised build", build("release")),
+    ("release-build", "the optimised library", build("release", "orvenix")),
     ("exports", "what the library exports and needs",
      check([sys.executable, "scripts/check_exports.py", "build/release/lib/liborvenix.so"],
            [sys.executable, "scripts/check_surface.py", "build/release/lib/liborvenix.so"])),
@@ -147,7 +152,9 @@ STEPS = [
      check(["cmake", "--preset", "windows"], ["cmake", "--build", "--preset", "windows", "-j", JOBS],
            [sys.executable, "scripts/check_exports.py", "build/windows/bin/orvenix.dll"])),
     ("fuzz", "every fuzz target for a few seconds", fuzz),
-    ("tidy", "clang-tidy", check([sys.executable, "scripts/check_tidy.py"])),
+    ("tidy", "clang-tidy",
+     check(["cmake", "--preset", "release", "-B", "build/tidy", "-DCMAKE_DISABLE_PRECOMPILE_HEADERS=ON"],
+           [sys.executable, "scripts/check_tidy.py"])),
 ]
 
 # Not part of a plain ./test, whose first run should end within twenty minutes.
