@@ -10,6 +10,7 @@
 #include "orvenix/configlet.h"
 #include "orvenix/upgrade_config.h"
 #include "orvenix/upgrade_thread.h"
+#include "support/device_files.h"
 #include "support/device_test.h"
 
 namespace {
@@ -59,6 +60,25 @@ TEST_F(ConsumerTest, MakesCopiesAndFreesJobsOfItsOwn) {
   // The copy's elements are gone with the job: only the record and its three arrays remain.
   EXPECT_EQ(device().memory().live_blocks(), blocks + 4);
   EXPECT_EQ(device().memory().bad_frees(), 0U);
+}
+
+TEST_F(ConsumerTest, LoadsAJobFromAFile) {
+  test::PutFile("\\windows\\job.xml",
+                "<Job><BaseUrl>http://127.0.0.2</BaseUrl><OSFirmware>"
+                "<Package HardwareVersion='TQ' SourceDir='fw' Base='os.bin'/>"
+                "<Package HardwareVersion='MR' SourceDir='fw'/></OSFirmware></Job>");
+  const std::size_t blocks = device().memory().live_blocks();
+  {
+    UpgradeConfig job;
+    EXPECT_EQ(job.LoadFromFile(u"job.xml"), 1);
+    EXPECT_STREQ(job.GetBaseURL(), "http://127.0.0.2");
+    ASSERT_EQ(job.FirmwarePackages().size(), 1U);
+    EXPECT_STREQ(job.FirmwarePackages()[0]->base, "os.bin");
+    EXPECT_EQ(job.GetFirmwarePackageCount(), 2);
+    job.DumpData();  // a release shows it to nobody
+    EXPECT_EQ(job.LoadFromFile(u"job.xml"), 0) << "the first load has deleted it";
+  }
+  EXPECT_EQ(device().memory().live_blocks(), blocks);
 }
 
 TEST_F(ConsumerTest, StartsNothingWithoutAJob) {
