@@ -72,13 +72,15 @@ class XmlDocument {
   /// Frees everything. The document is as new; only the sink stays.
   void Clear() noexcept;
 
-  /// Starts a document with a single element; what was there before is cleared.
+  /// Starts a document with a single element; what was there before is cleared, and the name must
+  /// not come from there.
   /// @return the document's copy of the name; null, with the document empty, when there is no
   ///   memory or no name.
   const char* NewDocument(const char* root_name) noexcept;
 
   /// Copies `length` bytes and parses the copy in place, in time proportional to the length. What
-  /// was there before is cleared. Any bytes may come; a zero byte ends the text.
+  /// was there before is cleared, and the text must not come from there. Any bytes may come; a zero
+  /// byte ends the text.
   /// @return false, without a root and with last_error() and error_offset() set, when the text is
   ///   refused or there is no memory.
   bool LoadFromText(const char* text, std::size_t length) noexcept;
@@ -90,7 +92,9 @@ class XmlDocument {
   [[nodiscard]] XmlParseError last_error() const noexcept { return last_error_; }
 
   /// Where the parser stopped, after a failed LoadFromText(): bytes from the start of the text.
-  /// KEPT ODDITY: every entity decoded before that place counts as the one byte that it became.
+  ///
+  /// KEPT ODDITY: the place of an error is counted in the decoded text, in which every entity
+  /// before it is the one byte that it became.
   [[nodiscard]] std::uint32_t error_offset() const noexcept { return output_.length; }
 
   /// FormatFlag bits; 0 for a document made by calls.

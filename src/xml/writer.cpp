@@ -159,7 +159,7 @@ void Copy(XmlDocument& document, const char* bytes, std::uint32_t length) {
 }  // namespace
 
 void WriteToSink(XmlDocument& document) {
-  Writer(document).Run();
+  if (document.output().sink != nullptr) Writer(document).Run();
 }
 
 const char* Serialize(XmlDocument& document, std::uint32_t* length) {

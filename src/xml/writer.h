@@ -9,7 +9,8 @@ namespace xml {
 
 /// Hands the document, piece by piece, to its output's sink. A parsed document is laid out in the
 /// style of its text (byte-order mark, line ends, one tab or blank per level); one made by calls is
-/// a single line. A document without a root is its declaration alone. No recursion, no memory.
+/// a single line. A document without a root is its declaration alone; without a sink nothing
+/// happens. No recursion, no memory.
 ///
 /// Levels beyond kMaxOpenElements, which only calls can make, are not indented any further.
 void WriteToSink(XmlDocument& document);
