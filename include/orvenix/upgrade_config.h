@@ -3,6 +3,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <new>
 #include <type_traits>
 
 #include "orvenix/export.h"
@@ -44,7 +45,8 @@ struct tagRegistryTest {  // NOLINT(readability-identifier-naming): callers know
   char operation[12];       ///< how the two values are compared
 };
 
-/// One package of operating-system firmware. Made with new.
+/// One package of operating-system firmware. Made with new, which like a job's gives null when
+/// there is no memory.
 struct FirmwarePackage {
   std::int32_t count = 0;  ///< image files
   char base[256] = {};     ///< leading part of their names
@@ -54,7 +56,9 @@ struct FirmwarePackage {
   char additional_parameters[256] = {};
 
   static void* operator new(std::size_t size) noexcept;
+  static void* operator new(std::size_t size, const std::nothrow_t& tag) noexcept;
   static void operator delete(void* package) noexcept;
+  static void operator delete(void* package, const std::nothrow_t& tag) noexcept;
 };
 
 static_assert(sizeof(tagDownloadFile) == 2632 && sizeof(tagStorageReq) == 292 &&
@@ -86,9 +90,16 @@ class ORVENIX_EXPORT UpgradeConfig {
   /// added.
   ~UpgradeConfig();
 
-  /// Records live in LocalAlloc memory. @return null when there is none.
+  /// Records live in LocalAlloc memory, whichever form of `new` makes them. @return null when there
+  /// is none.
   static void* operator new(std::size_t size) noexcept;
+  static void* operator new(std::size_t size, const std::nothrow_t& /*tag*/) noexcept {
+    return operator new(size);
+  }
   static void operator delete(void* record) noexcept;
+  static void operator delete(void* record, const std::nothrow_t& /*tag*/) noexcept {
+    operator delete(record);
+  }
 
   /// Reads serial number, manufacturing string, type, model, family and unique id from the device;
   /// what it does not tell stays empty. Sets the flash size to "0".
@@ -253,6 +264,14 @@ class ORVENIX_EXPORT UpgradeConfig {
 inline void* FirmwarePackage::operator new(std::size_t size) noexcept {
   return UpgradeConfig::operator new(size);
 }
+inline void* FirmwarePackage::operator new(std::size_t size,
+                                           const std::nothrow_t& /*tag*/) noexcept {
+  return UpgradeConfig::operator new(size);
+}
 inline void FirmwarePackage::operator delete(void* package) noexcept {
+  UpgradeConfig::operator delete(package);
+}
+inline void FirmwarePackage::operator delete(void* package,
+                                             const std::nothrow_t& /*tag*/) noexcept {
   UpgradeConfig::operator delete(package);
 }

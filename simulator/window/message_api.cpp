@@ -77,6 +77,8 @@ BOOL PeekMessageW(MSG* message, HWND window, UINT first, UINT last, UINT remove)
   }
   const bool found =
       system.Take(call.thread(), {window, first, last}, (remove & PM_REMOVE) != 0, *message);
+  const bool taken = found && (remove & PM_REMOVE) != 0 && message->message != WM_PAINT;
+  if (!taken) call.world().Yield(lock);  // the next look would find the same
   return call.Return(found ? TRUE : FALSE);
 }
 

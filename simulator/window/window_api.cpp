@@ -26,6 +26,17 @@ bool IsNamed(const std::u16string& name, const WCHAR* wanted) {
                     [lower](char16_t a, char16_t b) { return lower(a) == lower(b); });
 }
 
+BOOL GiveArea(ApiCall& call, HWND window, RECT* area, RECT (*area_of)(const Window&)) {
+  call.Argument("window", window);
+  if (call.failed()) return call.Return(FALSE);
+  const auto lock = call.world().Acquire();
+  const Window* found = SystemOf(call).Find(window);
+  if (found == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
+  if (area == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
+  *area = area_of(*found);
+  return call.Return(TRUE);
+}
+
 /// A window without a place of its own covers the desktop; there is no task bar to spare.
 RECT FrameFor(const Profile& profile, int x, int y, int width, int height) {
   const int left = x == CW_USEDEFAULT ? 0 : x;
@@ -166,26 +177,12 @@ BOOL GetUpdateRect(HWND window, RECT* area, BOOL erase) {
 
 BOOL GetClientRect(HWND window, RECT* area) {
   sim::ApiCall call("GetClientRect", ERROR_INVALID_WINDOW_HANDLE);
-  call.Argument("window", window);
-  if (call.failed()) return call.Return(FALSE);
-  const auto lock = call.world().Acquire();
-  const sim::Window* found = sim::SystemOf(call).Find(window);
-  if (found == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  if (area == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
-  *area = found->client();
-  return call.Return(TRUE);
+  return sim::GiveArea(call, window, area, [](const sim::Window& of) { return of.client(); });
 }
 
 BOOL GetWindowRect(HWND window, RECT* area) {
   sim::ApiCall call("GetWindowRect", ERROR_INVALID_WINDOW_HANDLE);
-  call.Argument("window", window);
-  if (call.failed()) return call.Return(FALSE);
-  const auto lock = call.world().Acquire();
-  const sim::Window* found = sim::SystemOf(call).Find(window);
-  if (found == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  if (area == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
-  *area = found->frame;
-  return call.Return(TRUE);
+  return sim::GiveArea(call, window, area, [](const sim::Window& of) { return of.frame; });
 }
 
 HWND GetDesktopWindow() {

@@ -56,10 +56,10 @@ void SetUpSyslog(const Walk& walk) noexcept {
 }
 
 /// The job is held over the questions to the device's volumes: an upgrade thread that was started
-/// twice with it may be about to free it.
+/// twice with it may be about to free it. A job that is gone needs no space; nothing will start.
 bool HasSpace(const Walk& walk, std::uint32_t* total) noexcept {
   const WalkLock lock;
-  return walk.job != nullptr && upgrade::CheckSpace(*walk.job, total);
+  return walk.job == nullptr || upgrade::CheckSpace(*walk.job, total);
 }
 
 Preflight Check(const Walk& walk) noexcept {

@@ -386,16 +386,6 @@ TEST_F(FieldsTest, CountTheLastBegunGroupAfterItsEndToo) {
   EXPECT_THAT(Texts(job().FilesToSave()), ElementsAre("\\late"));
 }
 
-TEST_F(FieldsTest, CutACleanupNameToItsBuffer) {
-  Begin("DiskCleanup");
-  Begin("File");
-  Set("Action", "Save");
-  Set("Name", std::string(1000, 'n').c_str());
-  End("File");
-
-  EXPECT_THAT(Texts(job().FilesToSave()), ElementsAre(std::string(259, 'n')));
-}
-
 // ---- storage requirements and registry tests ----
 
 TEST_F(FieldsTest, FillAStorageRequirement) {
@@ -433,30 +423,6 @@ TEST_F(FieldsTest, FillARegistryTest) {
   EXPECT_STREQ(first.error_message, "no");
   EXPECT_STREQ(job().RegistryTests()[1]->root, "HKEY_CURRENT_USER");
   EXPECT_STREQ(job().RegistryTests()[1]->type, "REG_SZ");
-}
-
-TEST_F(FieldsTest, CutRecordTextsToTheirFields) {
-  const std::string value(3000, 'x');
-  Begin("Registry");
-  for (const char* field : {"Root", "Key", "ValueName", "Value", "Type", "ErrorMsg", "Operator"}) {
-    Set(field, value.c_str());
-  }
-  End("Registry");
-  Begin("Store");
-  Set("Name", value.c_str());
-  Set("RequiredSpace", value.c_str());
-  End("Store");
-
-  const tagRegistryTest& test = *job().RegistryTests()[0];
-  EXPECT_EQ(test.root, value.substr(0, 259));
-  EXPECT_EQ(test.key, value.substr(0, 259));
-  EXPECT_EQ(test.value_name, value.substr(0, 259));
-  EXPECT_EQ(test.value, value.substr(0, 259));
-  EXPECT_EQ(test.type, value.substr(0, 23));
-  EXPECT_EQ(test.error_message, value.substr(0, 255));
-  EXPECT_EQ(test.operation, value.substr(0, 11));
-  EXPECT_EQ(job().StorageRequirements()[0]->name, value.substr(0, 259));
-  EXPECT_EQ(job().StorageRequirements()[0]->required_space, value.substr(0, 31));
 }
 
 TEST_F(FieldsTest, AcceptRecordFieldsWithNothingCurrent) {

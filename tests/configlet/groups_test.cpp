@@ -231,6 +231,28 @@ TEST_F(GroupsTest, NeverTouchAnEarlierJobsRecords) {
   FreeJob();
 }
 
+TEST_F(GroupsTest, FillNoJobWhenThereIsNoMemoryForTheNextOne) {
+  UpgradeConfig* const first = &job();
+  Begin("Download");
+  Begin("File");
+  Set("Source", "first's");
+  End("File");
+  device().faults().Add({"LocalAlloc", 1, 1, ERROR_OUTOFMEMORY});
+
+  EXPECT_EQ(Begin("Orvenix"), ICFG_OK);
+
+  EXPECT_FALSE(HasJob()) << "the first job is not filled on under the second one's name";
+  EXPECT_EQ(Begin("Upgrade"), ICFG_OK);
+  EXPECT_EQ(Set("Source", "lost"), ICFG_OK);
+  EXPECT_EQ(End("File"), ICFG_OK);
+  EXPECT_EQ(End("Upgrade"), ICFG_OK) << "nothing to start";
+  EXPECT_FALSE(upgrade::UpgradeInProgress());
+  ASSERT_EQ(first->DownloadFiles().size(), 1U);
+  EXPECT_STREQ(first->DownloadFiles()[0]->source, "first's");
+  delete first;
+  EXPECT_EQ(device().memory().bad_frees(), 0U);
+}
+
 TEST_F(GroupsTest, SurviveEveryOrderOfCallsWithAndWithoutMemory) {
   static constexpr const char* kGroups[] = {
       "Orvenix",  "Download",    "File",         "FileList",    "Store",

@@ -7,6 +7,7 @@
 #include "ce/kernel.h"
 #include "configlet/configlet_test.h"
 #include "power/power.h"
+#include "trace/trace.h"
 #include "upgrade/run_state/run_state.h"
 
 namespace configlet {
@@ -156,6 +157,27 @@ TEST_F(StartUpTest, DoesNothingWithoutAJob) {
   EXPECT_FALSE(upgrade::UpgradeInProgress());
   EXPECT_EQ(Log(), "");
   EXPECT_EQ(took().count(), 0);
+}
+
+TEST_F(StartUpTest, FailsInNothingWhenTheJobEndsMeanwhile) {
+  // Another thread that was started with the same job frees it at one of these calls.
+  for (const char* call : {"GetSystemPowerStatusEx", "fclose"}) {
+    Fill();
+    UpgradeConfig* const ending = &job();
+    const std::string wanted = "\"call\":\"" + std::string(call) + '"';
+    device().trace().SetSink([&wanted](std::string_view line) {
+      if (line.find(wanted) != std::string_view::npos) TheWalk().job = nullptr;
+    });
+
+    EXPECT_EQ(EndUpgrade(), ICFG_OK) << call;
+
+    device().trace().SetSink({});
+    EXPECT_EQ(took().count(), 0) << call;
+    EXPECT_FALSE(HasJob()) << call;
+    EXPECT_FALSE(upgrade::UpgradeInProgress()) << call;
+    delete ending;
+  }
+  EXPECT_EQ(device().memory().bad_frees(), 0U);
 }
 
 TEST_F(StartUpTest, IsOverWhenThereIsNoThreadToBeHad) {

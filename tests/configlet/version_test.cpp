@@ -8,11 +8,13 @@
 #include "ce/errors.h"
 #include "ce/files.h"
 #include "configlet/configlet_test.h"
+#include "trace/trace.h"
 
 namespace configlet {
 namespace {
 
 using test::GetFile;
+using ::testing::HasSubstr;
 using ::testing::Optional;
 
 constexpr WCHAR kKey[] = TEXT("Software\\Corvanta\\TWClient\\Subsystems");
@@ -113,6 +115,30 @@ TEST_F(VersionFilesTest, ReadAPathOf130CharactersWithoutATerminator) {
 
   EXPECT_THAT(GetFile('\\' + std::string(129, 'g') + "\\MCFTP.ini"),
               Optional(std::string(kContent)));
+}
+
+TEST_F(VersionFilesTest, StandInAFolderThatIsNamedWithABackslashAtItsEnd) {
+  CreateDirectoryW(TEXT("\\Elsewhere"), nullptr);
+  SetPath(u"\\Elsewhere\\");
+  std::string calls;
+  device().trace().SetSink([&calls](std::string_view line) { calls.append(line); });
+
+  IcfgInitialize();
+
+  device().trace().SetSink({});
+  EXPECT_THAT(calls, HasSubstr(R"(\\Elsewhere\\\\Orvenix.ini)")) << "named as it is, not tidied";
+  EXPECT_THAT(GetFile("\\Elsewhere\\Orvenix.ini"), Optional(std::string(kContent)));
+  EXPECT_THAT(GetFile("\\Elsewhere\\MCFTP.ini"), Optional(std::string(kContent)));
+  EXPECT_EQ(Log(), kLogged);
+}
+
+TEST_F(VersionFilesTest, StandInTheRootWhenTheFolderIsABackslash) {
+  SetPath(u"\\");
+
+  IcfgInitialize();
+
+  EXPECT_THAT(GetFile("\\Orvenix.ini"), Optional(std::string(kContent)));
+  EXPECT_THAT(GetFile("\\MCFTP.ini"), Optional(std::string(kContent)));
 }
 
 TEST_F(VersionFilesTest, LogOnlyWhatCouldBeMade) {

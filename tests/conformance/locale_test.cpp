@@ -273,6 +273,18 @@ struct PictureCase {
   const char* text;
 };
 
+using Formatter = int (*)(LCID, DWORD, const SYSTEMTIME*, const WCHAR*, WCHAR*, int);
+
+template <std::size_t Count>
+void ExpectPictures(Formatter format, const PictureCase (&cases)[Count]) {
+  for (const PictureCase& c : cases) {
+    WCHAR text[64] = {};
+    const int length = format(LOCALE_USER_DEFAULT, 0, &c.time, c.picture, text, 64);
+    EXPECT_EQ(Shown(text), c.text);
+    EXPECT_EQ(length, static_cast<int>(std::strlen(c.text)) + 1);
+  }
+}
+
 TEST(GetTimeFormatWTest, WritesPictures) {
   const PictureCase cases[] = {
       {At(2006, 3, 1, 14, 5, 9), TEXT("hh:mm:ss tt"), "02:05:09 PM"},
@@ -282,12 +294,7 @@ TEST(GetTimeFormatWTest, WritesPictures) {
       {At(2006, 3, 1, 4, 5, 9), TEXT("H'h'mm"), "4h05"},
       {At(2006, 3, 1, 4, 5, 9), TEXT("'at 'HH"), "at 04"},
   };
-  for (const PictureCase& c : cases) {
-    WCHAR text[32] = {};
-    const int length = GetTimeFormatW(LOCALE_USER_DEFAULT, 0, &c.time, c.picture, text, 32);
-    EXPECT_EQ(Shown(text), c.text);
-    EXPECT_EQ(length, static_cast<int>(std::strlen(c.text)) + 1);
-  }
+  ExpectPictures(GetTimeFormatW, cases);
 }
 
 TEST(GetTimeFormatWTest, CountsTo24WhenTold) {
@@ -309,12 +316,7 @@ TEST(GetDateFormatWTest, WritesPictures) {
       {At(2006, 3, 1, 0, 0, 0), TEXT("ddd MMM dd"), "Wed Mar 01"},
       {At(2006, 3, 1, 0, 0, 0), TEXT("'day 'd"), "day 1"},
   };
-  for (const PictureCase& c : cases) {
-    WCHAR text[64] = {};
-    const int length = GetDateFormatW(LOCALE_USER_DEFAULT, 0, &c.time, c.picture, text, 64);
-    EXPECT_EQ(Shown(text), c.text);
-    EXPECT_EQ(length, static_cast<int>(std::strlen(c.text)) + 1);
-  }
+  ExpectPictures(GetDateFormatW, cases);
 }
 
 TEST(GetDateFormatWTest, CountsAndRefusesLikeItsSister) {

@@ -3,9 +3,11 @@
 #include <gtest/gtest.h>
 
 #include <cstring>
+#include <new>
 #include <string>
 
 #include "ce/system.h"
+#include "faults/faults.h"
 #include "memory/memory.h"
 #include "orvenix/configlet.h"
 #include "orvenix/upgrade_config.h"
@@ -79,6 +81,29 @@ TEST_F(ConsumerTest, LoadsAJobFromAFile) {
     EXPECT_EQ(job.LoadFromFile(u"job.xml"), 0) << "the first load has deleted it";
   }
   EXPECT_EQ(device().memory().live_blocks(), blocks);
+}
+
+TEST_F(ConsumerTest, MakesJobsAndPackagesWithTheNewThatDoesNotThrowToo) {
+  const std::size_t blocks = device().memory().live_blocks();
+  auto* const job = new (std::nothrow) UpgradeConfig;
+  auto* const package = new (std::nothrow) FirmwarePackage;
+  EXPECT_EQ(device().memory().live_blocks(), blocks + 2) << "both where the library frees them";
+  job->AddFirmwarePkg(package);
+
+  delete job;
+
+  EXPECT_EQ(device().memory().live_blocks(), blocks);
+  EXPECT_EQ(device().memory().bad_frees(), 0U);
+}
+
+TEST_F(ConsumerTest, GetsNullFromEitherNewWithoutMemory) {
+  device().faults().Add({"LocalAlloc", 1, 0, 0});
+
+  EXPECT_EQ(new UpgradeConfig, nullptr);
+  EXPECT_EQ(new (std::nothrow) UpgradeConfig, nullptr);
+  EXPECT_EQ(new FirmwarePackage, nullptr);
+  EXPECT_EQ(new (std::nothrow) FirmwarePackage, nullptr);
+  device().faults().Clear();
 }
 
 TEST_F(ConsumerTest, StartsNothingWithoutAJob) {

@@ -2,12 +2,14 @@
 
 #include <coredll.h>
 
+#include <atomic>
 #include <cstddef>
 #include <cstring>
 #include <string_view>
 
 #include "base/format.h"
 #include "base/text.h"
+#include "device/lock.h"
 
 namespace device {
 namespace {
@@ -26,22 +28,58 @@ constexpr std::size_t kAddressBytes = 6;
 constexpr base::WideView kPlatformZq = TEXT("Corvanta Zq");
 constexpr base::WideView kPlatformMr7 = TEXT("Corvanta MR7");
 
-// What the platform has answered so far; an empty text means that it is to be asked.
-base::WideFixedText<256> platform_type;
-base::FixedText<32> configuration_cache;
-base::FixedText<64> serial_cache;
-base::FixedText<64> unique_id_cache;
+/// What the platform has told once, for the life of the process. An empty text is one that is still
+/// to be asked for. Any thread; the platform is asked without the lock, so two threads may both
+/// ask, and the answer that comes first stays.
+template <std::size_t Capacity>
+class Remembered {
+ public:
+  using Text = base::FixedText<Capacity>;
 
-/// @return an empty text when the platform does not say what it is.
-base::WideView PlatformType() noexcept {
-  if (platform_type.empty()) {
-    constexpr auto kCapacity = static_cast<UINT>(decltype(platform_type)::capacity());
-    if (SystemParametersInfoW(kPlatformTypeAction, kCapacity, platform_type.data(), 0) == FALSE) {
-      platform_type.Clear();
-    }
-    platform_type.data()[kCapacity - 1] = 0;
+  [[nodiscard]] Text Get() noexcept {
+    const LockGuard hold(lock_);
+    return text_;
   }
-  return platform_type.view();
+  /// @return what is remembered from now on.
+  Text Keep(std::string_view text) noexcept {
+    const LockGuard hold(lock_);
+    if (text_.empty()) text_.Assign(text);
+    return text_;
+  }
+
+ private:
+  Lock lock_;
+  Text text_;
+};
+Remembered<32> configuration_text;
+Remembered<64> serial_number;
+Remembered<64> unique_id;
+
+enum class Platform : std::uint8_t { kUnknown, kZq, kMr7, kOther };
+
+/// Asked once; a platform that does not say what it is is asked again.
+std::atomic<Platform> known_platform{Platform::kUnknown};
+
+Platform AskPlatform() noexcept {
+  WCHAR type[256] = {};
+  constexpr auto kCapacity = static_cast<UINT>(sizeof type / sizeof type[0]);
+  if (SystemParametersInfoW(kPlatformTypeAction, kCapacity, type, 0) == FALSE) {
+    return Platform::kUnknown;
+  }
+  type[kCapacity - 1] = 0;
+  const base::WideView name(type);
+  if (name.empty()) return Platform::kUnknown;
+  if (name == kPlatformZq) return Platform::kZq;
+  return name == kPlatformMr7 ? Platform::kMr7 : Platform::kOther;
+}
+
+Platform ThePlatform() noexcept {
+  Platform platform = known_platform.load(std::memory_order_relaxed);
+  if (platform == Platform::kUnknown) {
+    platform = AskPlatform();
+    known_platform.store(platform, std::memory_order_relaxed);
+  }
+  return platform;
 }
 
 /// One answer of the platform: raw bytes, which a text answer need not terminate.
@@ -103,37 +141,41 @@ base::FixedText<64> SerialFromAddress(const PlatformAnswer& address) noexcept {
 }  // namespace
 
 IdentityResult GetConfigurationText(char* text, int* size) noexcept {
-  const base::WideView platform = PlatformType();
-  if (platform.empty()) return IdentityResult::kUnavailable;
-  if (configuration_cache.empty()) {
+  const Platform platform = ThePlatform();
+  if (platform == Platform::kUnknown) return IdentityResult::kUnavailable;
+  auto known = configuration_text.Get();
+  if (known.empty()) {
     PlatformAnswer answer;
-    const bool is_zq = platform == kPlatformZq;
-    if (!answer.Query(is_zq ? kSelectorConfigurationZq : kSelectorConfiguration)) {
+    if (!answer.Query(platform == Platform::kZq ? kSelectorConfigurationZq
+                                                : kSelectorConfiguration)) {
       return IdentityResult::kUnavailable;
     }
-    configuration_cache.Assign(answer.text());
+    known = configuration_text.Keep(answer.text());
   }
-  return CopyOut(configuration_cache.view(), text, size);
+  return CopyOut(known.view(), text, size);
 }
 
 IdentityResult GetSerialNumber(char* text, int* size) noexcept {
-  const base::WideView platform = PlatformType();
-  if (platform.empty()) return IdentityResult::kUnavailable;
-  if (serial_cache.empty()) {
-    PlatformAnswer answer;
-    if (answer.Query(kSelectorNetworkIdentity)) {
-      if (platform == kPlatformZq || platform == kPlatformMr7) {
-        serial_cache.Assign(answer.text());
-      } else if (answer.length() >= kAddressBytes) {
-        serial_cache = SerialFromAddress(answer);
-      }
+  const Platform platform = ThePlatform();
+  if (platform == Platform::kUnknown) return IdentityResult::kUnavailable;
+  auto known = serial_number.Get();
+  PlatformAnswer answer;
+  if (known.empty() && answer.Query(kSelectorNetworkIdentity)) {
+    if (platform != Platform::kOther) {
+      known = serial_number.Keep(answer.text());
+    } else if (answer.length() >= kAddressBytes) {
+      known = serial_number.Keep(SerialFromAddress(answer).view());
     }
   }
-  return CopyOut(serial_cache.view(), text, size);
+  return CopyOut(known.view(), text, size);
 }
 
+/// KEPT ODDITY: a serial number that could not be read counts as an empty one, and the unique id
+/// that it leaves, the configuration text's four characters alone, is remembered like a whole one,
+/// also when the serial number can be read later.
 IdentityResult GetUniqueId(char* text, int* size) noexcept {
-  if (unique_id_cache.empty()) {
+  auto known = unique_id.Get();
+  if (known.empty()) {
     char configuration[32];
     char serial[32];
     int capacity = sizeof configuration;
@@ -142,10 +184,11 @@ IdentityResult GetUniqueId(char* text, int* size) noexcept {
     capacity = sizeof serial;
     result = GetSerialNumber(serial, &capacity);
     if (result != IdentityResult::kOk) return result;
-    unique_id_cache.Assign(base::View(configuration).substr(0, 4));
-    unique_id_cache.Append(serial);
+    known.Assign(base::Part(base::View(configuration), 0, 4));
+    known.Append(serial);
+    known = unique_id.Keep(known.view());
   }
-  return CopyOut(unique_id_cache.view(), text, size);
+  return CopyOut(known.view(), text, size);
 }
 
 }  // namespace device

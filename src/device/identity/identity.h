@@ -14,8 +14,7 @@ enum class IdentityResult : std::int32_t {
 // The readers below ask the platform once and remember its answer for the life of the process.
 // `*size` is the capacity of `text` on the way in and the text's length on the way out; the text
 // is copied, with its terminating zero, only when the capacity exceeds that length. On
-// kUnavailable both are left alone. Not to be called by two threads at once: jobs are made by the
-// host's thread.
+// kUnavailable both are left alone. Any thread, several at once too.
 
 /// The configuration text ("TQ52-A1"): type, family, model and more, at most 31 characters.
 IdentityResult GetConfigurationText(char* text, int* size) noexcept;
@@ -24,8 +23,9 @@ IdentityResult GetConfigurationText(char* text, int* size) noexcept;
 /// kOk, when the platform is known but does not answer.
 IdentityResult GetSerialNumber(char* text, int* size) noexcept;
 
-/// The configuration text's first four characters and the serial number, at most 63 characters.
-/// Fails as those two fail when either of them is longer than 31 characters.
+/// The configuration text's first four characters and the serial number, at most 63 characters; the
+/// four characters alone, for the life of the process, when the serial number was empty at the
+/// first call. Fails as those two fail when either of them is longer than 31 characters.
 IdentityResult GetUniqueId(char* text, int* size) noexcept;
 
 }  // namespace device

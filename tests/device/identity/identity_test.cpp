@@ -1,17 +1,22 @@
 #include "device/identity/identity.h"
 
-#include <gtest/gtest.h>
+#include <gmock/gmock.h>
 
+#include <algorithm>
 #include <array>
 #include <string>
+#include <string_view>
 
 #include "ce/errors.h"
 #include "faults/faults.h"
 #include "orvenix/upgrade_config.h"
 #include "support/device_test.h"
+#include "trace/trace.h"
 
 namespace device {
 namespace {
+
+using ::testing::HasSubstr;
 
 // The readers remember the platform's answers as long as the process lives; each test runs in a
 // process of its own.
@@ -117,33 +122,79 @@ TEST_F(IdentityTest, CountsASystemWithoutAVersionAsOld) {
   EXPECT_EQ(Read(GetSerialNumber), "1A2B3C4D5E");
 }
 
-class LongSerialTest : public IdentityTest {
- protected:
-  LongSerialTest() : IdentityTest(Profile()) {}
-  static sim::Profile Profile() {
-    sim::Profile profile;
-    profile.serial = std::string(200, 'S');
-    profile.configuration = std::string(200, 'C');
-    return profile;
-  }
+// ---- how long an answer may be ----
+
+struct AnswerCase {
+  const char* name;
+  std::size_t characters;  ///< of both texts; the platform's answer has a terminating zero more
+  bool counts;
+  const char* unique_id;
 };
 
-TEST_F(LongSerialTest, CutsTextsToWhatItRemembers) {
-  EXPECT_EQ(Read(GetSerialNumber), std::string(63, 'S'));
-  EXPECT_EQ(Read(GetConfigurationText), std::string(31, 'C'));
-  EXPECT_EQ(Read(GetUniqueId), "!-8") << "the serial number exceeds 31 characters";
+sim::Profile ProfileOf(const AnswerCase& c) {
+  sim::Profile profile;
+  profile.serial = std::string(c.characters, 'S');
+  profile.configuration = std::string(c.characters, 'C');
+  return profile;
 }
+
+class AnswerLengthTest : public IdentityTest, public ::testing::WithParamInterface<AnswerCase> {
+ protected:
+  AnswerLengthTest() : IdentityTest(ProfileOf(GetParam())) {}
+};
+
+TEST_P(AnswerLengthTest, CountsUpTo255BytesAndIsCutToWhatIsRemembered) {
+  const std::size_t length = GetParam().characters;
+  const bool counts = GetParam().counts;
+
+  EXPECT_EQ(Read(GetSerialNumber),
+            counts ? std::string(std::min<std::size_t>(length, 63), 'S') : "");
+  EXPECT_EQ(Read(GetConfigurationText),
+            counts ? std::string(std::min<std::size_t>(length, 31), 'C') : "!-1");
+  EXPECT_EQ(Read(GetUniqueId), GetParam().unique_id);
+}
+
+INSTANTIATE_TEST_SUITE_P(
+    Cases, AnswerLengthTest,
+    ::testing::Values(
+        AnswerCase{"Characters23", 23, true, "CCCCSSSSSSSSSSSSSSSSSSSSSSS"},
+        AnswerCase{"Characters32", 32, true, "!-8"},  // the serial number does not fit any more
+        AnswerCase{"Characters63", 63, true, "!-8"}, AnswerCase{"Characters64", 64, true, "!-8"},
+        AnswerCase{"Bytes255", 254, true, "!-8"}, AnswerCase{"Bytes256", 255, false, "!-1"},
+        AnswerCase{"Bytes257", 256, false, "!-1"}),
+    [](const auto& each) { return each.param.name; });
 
 // ---- configuration text and unique id ----
 
-class ZqTest : public IdentityTest {
- protected:
-  ZqTest() : IdentityTest(On("Corvanta Zq")) {}
+struct SelectorCase {
+  const char* name;
+  const char* platform;
+  int selector;
 };
 
-TEST_F(ZqTest, ReadsTheConfigurationTextWithItsOwnSelector) {
+class SelectorTest : public IdentityTest, public ::testing::WithParamInterface<SelectorCase> {
+ protected:
+  SelectorTest() : IdentityTest(On(GetParam().platform)) {}
+};
+
+TEST_P(SelectorTest, AsksForTheConfigurationTextAsThePlatformWantsIt) {
+  std::string calls;
+  device().trace().SetSink([&calls](std::string_view line) { calls.append(line); });
+
   EXPECT_EQ(Read(GetConfigurationText), "TQ52-A1");
+
+  device().trace().SetSink({});
+  EXPECT_THAT(calls, HasSubstr("\"selector\":" + std::to_string(GetParam().selector) + "}"));
 }
+
+INSTANTIATE_TEST_SUITE_P(Cases, SelectorTest,
+                         ::testing::Values(SelectorCase{"Zq", "Corvanta Zq", 39},
+                                           SelectorCase{"Mr7", "Corvanta MR7", 10},
+                                           SelectorCase{"LongerName", "Corvanta Zq2", 10},
+                                           SelectorCase{"ShorterName", "Corvanta Z", 10},
+                                           SelectorCase{"OtherLetterCase", "CORVANTA ZQ", 10},
+                                           SelectorCase{"AnotherMaker", "Jupiter", 10}),
+                         [](const auto& each) { return each.param.name; });
 
 TEST_F(IdentityTest, ReadsTheConfigurationTextOnce) {
   EXPECT_EQ(Read(GetConfigurationText), "TQ52-A1");
@@ -162,6 +213,31 @@ TEST_F(IdentityTest, HasNoConfigurationTextWithoutAnAnswer) {
 
 TEST_F(IdentityTest, JoinsFourCharactersAndTheSerialNumberToTheUniqueId) {
   EXPECT_EQ(Read(GetUniqueId), "TQ52MR700123");
+}
+
+TEST_F(IdentityTest, KeepsTheUniqueIdThatASerialNumberUnreadOnceHasLeft) {
+  ASSERT_EQ(Read(GetConfigurationText), "TQ52-A1");
+  device().faults().Add({"KernelIoControl", 1, 1, 0});
+
+  EXPECT_EQ(Read(GetUniqueId), "TQ52");
+
+  EXPECT_EQ(Read(GetSerialNumber), "MR700123") << "the serial number can be read again";
+  EXPECT_EQ(Read(GetUniqueId), "TQ52") << "and the unique id stays as it is";
+  EXPECT_STREQ(UpgradeConfig().GetUniqueId(), "TQ52");
+}
+
+TEST_F(IdentityTest, RemembersNoUniqueIdWhenTheConfigurationTextIsMissing) {
+  device().faults().Add({"KernelIoControl", 1, 1, 0});
+
+  EXPECT_EQ(Read(GetUniqueId), "!-1");
+  EXPECT_EQ(Read(GetUniqueId), "TQ52MR700123");
+}
+
+TEST_F(IdentityTest, AsksAgainWhatPlatformItIsUntilItIsTold) {
+  device().faults().Add({"SystemParametersInfoW", 1, 1, 0});
+
+  EXPECT_EQ(Read(GetSerialNumber), "!-1");
+  EXPECT_EQ(Read(GetSerialNumber), "MR700123");
 }
 
 class NoPlatformTest : public IdentityTest {

@@ -10,6 +10,16 @@ using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using ::testing::SizeIs;
 
+/// A visible window of another program's kind, which takes the foreground.
+HWND MakeOtherWindow() {
+  WNDCLASSW definition = {};
+  definition.lpfnWndProc = DefWindowProcW;
+  definition.lpszClassName = TEXT("Other");
+  RegisterClassW(&definition);
+  return CreateWindowExW(0, TEXT("Other"), TEXT(""), WS_VISIBLE, 0, 0, 9, 9, nullptr, nullptr,
+                         nullptr, nullptr);
+}
+
 // ---- start, window, end ----
 
 TEST_F(ProgressWindowTest, IsATopMostBorderedWindowOverTheWholeScreen) {
@@ -55,12 +65,7 @@ TEST_F(ProgressWindowTest, DoesNotStartWithoutParameters) {
 
 TEST_F(ProgressWindowTest, ASecondStartOnlyBringsItToTheForeground) {
   Start();
-  WNDCLASSW other_class = {};
-  other_class.lpfnWndProc = DefWindowProcW;
-  other_class.lpszClassName = TEXT("Other");
-  RegisterClassW(&other_class);
-  HWND other = CreateWindowExW(0, TEXT("Other"), TEXT(""), WS_VISIBLE, 0, 0, 9, 9, nullptr, nullptr,
-                               nullptr, nullptr);
+  HWND other = MakeOtherWindow();
   ASSERT_EQ(GetForegroundWindow(), other);
 
   StartGUI(nullptr);
@@ -73,13 +78,8 @@ TEST_F(ProgressWindowTest, ASecondStartOnlyBringsItToTheForeground) {
 TEST_F(ProgressWindowTest, LooksForThePackageInstallersWindowWhenItLosesTheForeground) {
   Start();
   const auto looked = device().faults().Count("FindWindowW");
-  WNDCLASSW other_class = {};
-  other_class.lpfnWndProc = DefWindowProcW;
-  other_class.lpszClassName = TEXT("Other");
-  RegisterClassW(&other_class);
 
-  HWND other = CreateWindowExW(0, TEXT("Other"), TEXT(""), WS_VISIBLE, 0, 0, 9, 9, nullptr, nullptr,
-                               nullptr, nullptr);
+  HWND other = MakeOtherWindow();
 
   EXPECT_EQ(device().faults().Count("FindWindowW"), looked + 1);
   SetForegroundWindow(window_state.window.get());

@@ -86,10 +86,15 @@ TYPED_TEST(SocketTest, TellsWhoConnected) {
   EXPECT_EQ(size, 16);
 }
 
-TYPED_TEST(SocketTest, IsRefusedWhereNobodyListens) {
+std::uint16_t PortWithoutListener() {
   const SOCKET listener = Listener();
   const std::uint16_t port = LocalName(listener).port;
   ce_closesocket(listener);
+  return port;
+}
+
+TYPED_TEST(SocketTest, IsRefusedWhereNobodyListens) {
+  const std::uint16_t port = PortWithoutListener();
   const SOCKET client = Tcp();
 
   EXPECT_EQ(Connect(client, kDevice, port), CE_SOCKET_ERROR);
@@ -98,11 +103,8 @@ TYPED_TEST(SocketTest, IsRefusedWhereNobodyListens) {
 }
 
 TYPED_TEST(SocketTest, CanTryAgainAfterARefusal) {
-  const SOCKET listener = Listener();
-  const std::uint16_t port = LocalName(listener).port;
-  ce_closesocket(listener);
   const SOCKET client = Tcp();
-  ASSERT_EQ(Connect(client, kDevice, port), CE_SOCKET_ERROR);
+  ASSERT_EQ(Connect(client, kDevice, PortWithoutListener()), CE_SOCKET_ERROR);
   const SOCKET second = Listener();
 
   EXPECT_EQ(Connect(client, kDevice, LocalName(second).port), 0);

@@ -233,6 +233,38 @@ TEST_F(ScreenTest, AMessageBoxIsNotedAndAnsweredAtOnce) {
   EXPECT_EQ(boxes[0].caption, u"Info");
 }
 
+/// How often a program looks for messages until another of its threads is done, 20 ms later.
+int PollsUntilDone(UINT remove) {
+  static bool done;  // threads of a virtual world take turns
+  done = false;
+  const auto finish_later = [](void*) -> DWORD {
+    Sleep(20);
+    done = true;
+    return 0;
+  };
+  CloseHandle(CreateThread(nullptr, 0, finish_later, nullptr, 0, nullptr));
+  MSG message = {};
+  int polls = 0;
+  for (; !done; ++polls) PeekMessageW(&message, nullptr, 0, 0, remove);
+  return polls;
+}
+
+TEST_F(ScreenTest, LetsTimePassForAProgramThatPollsForMessages) {
+  EXPECT_LE(PollsUntilDone(PM_REMOVE), 20001) << "a microsecond passes with each look";
+  EXPECT_LE(PollsUntilDone(PM_NOREMOVE), 20001);
+}
+
+TEST_F(ScreenTest, LetsTimePassForAProgramThatPollsAndLeavesWhatItFinds) {
+  HWND window = Window({0, 0, 50, 50});
+  EXPECT_LE(PollsUntilDone(PM_REMOVE), 20001) << "to be painted, and nobody paints";
+  PostMessageW(window, WM_USER, 0, 0);
+  EXPECT_LE(PollsUntilDone(PM_NOREMOVE), 20001);
+
+  MSG message = {};
+  EXPECT_TRUE(PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE));
+  EXPECT_EQ(message.message, WM_USER) << "still there";
+}
+
 TEST_F(ScreenTest, CountsWhatProgramsHaveNotGivenBack) {
   HPEN pen = CreatePen(PS_SOLID, 2, 0);
   HDC dc = GetDC(nullptr);
