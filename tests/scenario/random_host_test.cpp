@@ -30,8 +30,8 @@ class RandomHost {
       case 0: BeginJob(); break;
       case 1: BeginFileList(); break;
       case 2: BeginFile(); break;
-      case 3: IcfgBeginGroup(InSomeLetterCase("Upgrade").c_str(), 0, 0); break;
-      case 4: IcfgEndGroup(InSomeLetterCase("Upgrade").c_str(), 0, 0); break;
+      case 3: BeginUpgrade(); break;
+      case 4: EndUpgrade(); break;
       case 5: Sleep(Below(6000)); break;
       case 6:
       case 7: IcfgBeginGroup(kToBegin[Below(std::size(kToBegin))], 0, 0); break;
@@ -40,6 +40,10 @@ class RandomHost {
       default: SetSomeField(); break;
     }
   }
+
+  /// How often an upgrade was begun while one ran, and one was ended without a failure.
+  [[nodiscard]] int refused() const { return refused_; }
+  [[nodiscard]] int started() const { return started_; }
 
   std::uint32_t Below(std::size_t limit) {
     return static_cast<std::uint32_t>(random_() % static_cast<std::uint32_t>(limit));
@@ -60,6 +64,16 @@ class RandomHost {
   std::string InSomeLetterCase(std::string name) {
     if (Below(2) == 0) name[0] = 'u';
     return name;
+  }
+
+  void BeginUpgrade() {
+    const std::uint32_t result = IcfgBeginGroup(InSomeLetterCase("Upgrade").c_str(), 0, 0);
+    refused_ += result == ICFG_UPGRADE_RUNNING ? 1 : 0;
+  }
+
+  void EndUpgrade() {
+    const std::uint32_t result = IcfgEndGroup(InSomeLetterCase("Upgrade").c_str(), 0, 0);
+    started_ += result == ICFG_OK ? 1 : 0;
   }
 
   void BeginJob() {
@@ -119,6 +133,8 @@ class RandomHost {
   std::minstd_rand random_;
   HostFile file_;
   HostFile list_;
+  int refused_ = 0;
+  int started_ = 0;
 };
 
 class RandomHostTest : public ScenarioTest, public ::testing::WithParamInterface<std::uint32_t> {
@@ -154,6 +170,10 @@ TEST_P(RandomHostTest, LosesNeitherMemoryNorHandlesWhateverItCallsAndWhen) {
   }
 
   ASSERT_TRUE(AwaitTheEnd());
+
+  EXPECT_GT(host_.refused(), 0);
+  EXPECT_GT(host_.started(), 0);
+  EXPECT_GT(server().received().size(), 0U) << "some of the jobs have fetched something";
 
   EXPECT_FALSE(upgrade::UpgradeInProgress());
   EXPECT_EQ(device().memory().bad_frees(), 0U);
