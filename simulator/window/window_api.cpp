@@ -26,15 +26,24 @@ bool IsNamed(const std::u16string& name, const WCHAR* wanted) {
                     [lower](char16_t a, char16_t b) { return lower(a) == lower(b); });
 }
 
-BOOL GiveArea(ApiCall& call, HWND window, RECT* area, RECT (*area_of)(const Window&)) {
-  call.Argument("window", window);
+/// Lets `act` do the call's work on its window; without that window the call fails.
+template <typename Act>
+BOOL With(ApiCall& call, HWND handle, Act act) {
   if (call.failed()) return call.Return(FALSE);
-  const auto lock = call.world().Acquire();
-  const Window* found = SystemOf(call).Find(window);
-  if (found == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  if (area == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
-  *area = area_of(*found);
-  return call.Return(TRUE);
+  auto lock = call.world().Acquire();
+  WindowSystem& system = SystemOf(call);
+  Window* window = system.Find(handle);
+  if (window == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
+  return act(system, lock, *window);
+}
+
+BOOL GiveArea(ApiCall& call, HWND handle, RECT* area, RECT (*area_of)(const Window&)) {
+  call.Argument("window", handle);
+  return With(call, handle, [&](WindowSystem&, World::Lock&, const Window& window) {
+    if (area == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
+    *area = area_of(window);
+    return call.Return(TRUE);
+  });
 }
 
 /// A window without a place of its own covers the desktop; there is no task bar to spare.
@@ -103,47 +112,38 @@ HWND CreateWindowExW(DWORD extended_style, const WCHAR* class_name, const WCHAR*
   return call.Return(system.Find(handle) != nullptr ? handle : none);
 }
 
-BOOL DestroyWindow(HWND window) {
+BOOL DestroyWindow(HWND handle) {
   sim::ApiCall call("DestroyWindow", ERROR_INVALID_WINDOW_HANDLE);
-  call.Argument("window", window);
-  if (call.failed()) return call.Return(FALSE);
-  auto lock = call.world().Acquire();
-  sim::WindowSystem& system = sim::SystemOf(call);
-  const sim::Window* found = system.Find(window);
-  if (found == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  if (found->owner != &call.thread()) return call.Fail(ERROR_ACCESS_DENIED, FALSE);
-  system.Destroy(lock, window);
-  return call.Return(TRUE);
+  call.Argument("window", handle);
+  return sim::With(call, handle, [&](auto& system, auto& lock, const sim::Window& window) {
+    if (window.owner != &call.thread()) return call.Fail(ERROR_ACCESS_DENIED, FALSE);
+    system.Destroy(lock, handle);
+    return call.Return(TRUE);
+  });
 }
 
-BOOL ShowWindow(HWND window, int command) {
+BOOL ShowWindow(HWND handle, int command) {
   constexpr int kShowWithoutActivation = 4;
   constexpr int kShowAsItIs = 8;
   sim::ApiCall call("ShowWindow", ERROR_INVALID_WINDOW_HANDLE);
-  call.Argument("window", window);
+  call.Argument("window", handle);
   call.Argument("command", command);
-  if (call.failed()) return call.Return(FALSE);
-  auto lock = call.world().Acquire();
-  sim::WindowSystem& system = sim::SystemOf(call);
-  if (system.Find(window) == nullptr || window == system.desktop().handle) {
-    return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  }
-  const bool activate = command != kShowWithoutActivation && command != kShowAsItIs;
-  const bool was_visible =
-      command == SW_HIDE ? system.Hide(lock, window) : system.Show(lock, window, activate);
-  return call.Return(was_visible ? TRUE : FALSE);
+  return sim::With(call, handle, [&](auto& system, auto& lock, const sim::Window& window) {
+    if (&window == &system.desktop()) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
+    const bool activate = command != kShowWithoutActivation && command != kShowAsItIs;
+    const bool was_visible =
+        command == SW_HIDE ? system.Hide(lock, handle) : system.Show(lock, handle, activate);
+    return call.Return(was_visible ? TRUE : FALSE);
+  });
 }
 
-BOOL UpdateWindow(HWND window) {
+BOOL UpdateWindow(HWND handle) {
   sim::ApiCall call("UpdateWindow", ERROR_INVALID_WINDOW_HANDLE);
-  call.Argument("window", window);
-  if (call.failed()) return call.Return(FALSE);
-  auto lock = call.world().Acquire();
-  sim::WindowSystem& system = sim::SystemOf(call);
-  const sim::Window* found = system.Find(window);
-  if (found == nullptr) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  if (found->visible && !sim::IsEmpty(found->update)) system.Send(lock, window, WM_PAINT, 0, 0);
-  return call.Return(TRUE);
+  call.Argument("window", handle);
+  return sim::With(call, handle, [&](auto& system, auto& lock, const sim::Window& window) {
+    if (window.visible && !sim::IsEmpty(window.update)) system.Send(lock, handle, WM_PAINT, 0, 0);
+    return call.Return(TRUE);
+  });
 }
 
 BOOL InvalidateRect(HWND window, const RECT* area, BOOL erase) {
@@ -206,17 +206,14 @@ BOOL IsWindowVisible(HWND window) {
   return call.Return(found != nullptr && found->visible ? TRUE : FALSE);
 }
 
-BOOL SetForegroundWindow(HWND window) {
+BOOL SetForegroundWindow(HWND handle) {
   sim::ApiCall call("SetForegroundWindow", ERROR_INVALID_WINDOW_HANDLE);
-  call.Argument("window", window);
-  if (call.failed()) return call.Return(FALSE);
-  auto lock = call.world().Acquire();
-  sim::WindowSystem& system = sim::SystemOf(call);
-  if (system.Find(window) == nullptr || window == system.desktop().handle) {
-    return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
-  }
-  system.Activate(lock, window);
-  return call.Return(TRUE);
+  call.Argument("window", handle);
+  return sim::With(call, handle, [&](auto& system, auto& lock, const sim::Window& window) {
+    if (&window == &system.desktop()) return call.Fail(ERROR_INVALID_WINDOW_HANDLE, FALSE);
+    system.Activate(lock, handle);
+    return call.Return(TRUE);
+  });
 }
 
 HWND GetForegroundWindow() {

@@ -20,8 +20,7 @@ std::uint32_t GetRamPagesInUse(std::uint32_t page_size) noexcept {
   return Pages(status.dwTotalPhys, page_size) - Pages(status.dwAvailPhys, page_size) + 1;
 }
 
-bool GetMemoryPages(MemoryPages* pages) noexcept {
-  *pages = MemoryPages{};
+bool GetMemoryDivision(MemoryDivision* division) noexcept {
   DWORD store_pages = 0;
   DWORD ram_pages = 0;
   DWORD page_size = 0;
@@ -30,10 +29,23 @@ bool GetMemoryPages(MemoryPages* pages) noexcept {
       GetStoreInformation(&store) == 0) {
     return false;
   }
-  pages->total = static_cast<std::uint32_t>(store_pages + ram_pages);
-  pages->store_in_use = Pages(store.dwStoreSize, page_size) - Pages(store.dwFreeSize, page_size);
-  pages->programs_in_use = GetRamPagesInUse(page_size);
-  pages->store = static_cast<std::uint32_t>(store_pages);
+  division->store_pages = static_cast<std::uint32_t>(store_pages);
+  division->ram_pages = static_cast<std::uint32_t>(ram_pages);
+  division->page_size = static_cast<std::uint32_t>(page_size);
+  division->store_size = static_cast<std::uint32_t>(store.dwStoreSize);
+  division->store_free = static_cast<std::uint32_t>(store.dwFreeSize);
+  return true;
+}
+
+bool GetMemoryPages(MemoryPages* pages) noexcept {
+  *pages = MemoryPages{};
+  MemoryDivision division;
+  if (!GetMemoryDivision(&division)) return false;
+  const std::uint32_t page = division.page_size;
+  pages->total = division.store_pages + division.ram_pages;
+  pages->store_in_use = division.store_size / page - division.store_free / page;
+  pages->programs_in_use = GetRamPagesInUse(page);
+  pages->store = division.store_pages;
   return true;
 }
 

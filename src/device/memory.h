@@ -6,6 +6,20 @@
 
 namespace device {
 
+/// What the platform tells of the division; bytes unless it says pages.
+struct MemoryDivision {
+  std::uint32_t store_pages = 0;
+  std::uint32_t ram_pages = 0;
+  std::uint32_t page_size = 1;
+  std::uint32_t store_size = 0;
+  std::uint32_t store_free = 0;
+};
+
+/// @return false, with `division` as it was, when the platform does not tell, or names pages
+/// without
+///   a size.
+bool GetMemoryDivision(MemoryDivision* division) noexcept;
+
 /// The pages of both halves. All arithmetic is modulo 2^32, as on the device.
 struct MemoryPages {
   std::uint32_t total = 0;            ///< store and program pages together

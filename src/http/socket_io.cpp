@@ -3,6 +3,7 @@
 #include <cstring>
 
 #include "base/format.h"
+#include "device/socket_wait.h"
 #include "device/wide_text.h"
 #include "http/texts.h"
 #include "report/log/log.h"
@@ -10,6 +11,8 @@
 namespace http {
 namespace {
 
+using device::SocketUse;
+using device::SocketWait;
 using report::Log;
 
 constexpr std::uint32_t kSegment = 1460;  // data in one TCP segment on Ethernet
@@ -17,24 +20,6 @@ constexpr DWORD kFirstDelayMs = 20;
 constexpr DWORD kDelayStepMs = 20;
 constexpr DWORD kLongDelayMs = 10000;  // not doubled any more from here on
 constexpr DWORD kDrainLimitMs = 60000;
-
-enum class Direction : std::uint8_t { kRead, kWrite };
-enum class Waited : std::uint8_t { kReady, kTimeout, kNotSet, kError };
-
-Waited WaitFor(SOCKET socket, Direction direction, std::uint32_t timeout_ms) noexcept {
-  fd_set sockets;
-  FD_ZERO(&sockets);
-  FD_SET(socket, &sockets);
-  timeval limit = {};
-  limit.tv_sec = static_cast<LONG>(timeout_ms / 1000);
-  limit.tv_usec = static_cast<LONG>(timeout_ms % 1000 * 1000);
-  const bool reading = direction == Direction::kRead;
-  const int ready = select(0, reading ? &sockets : nullptr, reading ? nullptr : &sockets, nullptr,
-                           timeout_ms == 0 ? nullptr : &limit);
-  if (ready == SOCKET_ERROR) return Waited::kError;
-  if (ready == 0) return Waited::kTimeout;
-  return FD_ISSET(socket, &sockets) ? Waited::kReady : Waited::kNotSet;
-}
 
 void ReportConnectError(std::int32_t error) noexcept {
   Log(texts::kConnectError, error);
@@ -100,11 +85,11 @@ bool CSocketIO::Connect(std::uint32_t address, std::uint16_t port,
 }
 
 bool CSocketIO::SocketWriteable(std::uint32_t timeout_ms) const noexcept {
-  switch (WaitFor(socket_, Direction::kWrite, timeout_ms)) {
-    case Waited::kReady: return true;
-    case Waited::kTimeout: Log(texts::kWriteableTimeout); break;
-    case Waited::kNotSet: Log(texts::kWriteableNotSet); break;
-    case Waited::kError:
+  switch (device::WaitForSocket(socket_, SocketUse::kWrite, timeout_ms)) {
+    case SocketWait::kReady: return true;
+    case SocketWait::kTimeout: Log(texts::kWriteableTimeout); break;
+    case SocketWait::kNotSet: Log(texts::kWriteableNotSet); break;
+    case SocketWait::kError:
       Log(texts::kWriteableError, static_cast<std::int32_t>(GetLastError()));
       break;
   }
@@ -112,7 +97,7 @@ bool CSocketIO::SocketWriteable(std::uint32_t timeout_ms) const noexcept {
 }
 
 bool CSocketIO::SocketReadable(std::uint32_t timeout_ms) const noexcept {
-  return WaitFor(socket_, Direction::kRead, timeout_ms) == Waited::kReady;
+  return device::WaitForSocket(socket_, SocketUse::kRead, timeout_ms) == SocketWait::kReady;
 }
 
 std::uint32_t CSocketIO::SendData(const char* bytes, std::uint32_t length) noexcept {

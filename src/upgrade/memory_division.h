@@ -3,15 +3,12 @@
 
 #include <cstdint>
 
+#include "device/memory.h"
+
 namespace upgrade {
 
 /// What the platform tells about its memory; bytes unless it says pages.
-struct MemoryFigures {
-  std::uint32_t store_pages = 0;
-  std::uint32_t ram_pages = 0;
-  std::uint32_t page_size = 1;
-  std::uint32_t store_size = 0;
-  std::uint32_t store_free = 0;
+struct MemoryFigures : device::MemoryDivision {
   std::uint32_t physical_total = 0;
   std::uint32_t physical_free = 0;
 };

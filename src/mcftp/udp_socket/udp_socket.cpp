@@ -3,6 +3,8 @@
 #include <cstring>
 #include <string_view>
 
+#include "device/socket_wait.h"
+
 namespace mcftp {
 namespace {
 
@@ -19,14 +21,8 @@ AddressText Dotted(std::uint32_t address) noexcept {
 }
 
 bool WaitUntilReadable(SOCKET socket, std::uint32_t timeout_ms) noexcept {
-  fd_set readable;
-  FD_ZERO(&readable);
-  FD_SET(socket, &readable);
-  timeval limit = {};
-  limit.tv_sec = static_cast<LONG>(timeout_ms / 1000);
-  limit.tv_usec = static_cast<LONG>(timeout_ms % 1000 * 1000);
-  const int ready = select(0, &readable, nullptr, nullptr, timeout_ms == 0 ? nullptr : &limit);
-  return ready > 0 && FD_ISSET(socket, &readable);
+  return device::WaitForSocket(socket, device::SocketUse::kRead, timeout_ms) ==
+         device::SocketWait::kReady;
 }
 
 }  // namespace
