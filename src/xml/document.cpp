@@ -1,6 +1,5 @@
 #include "xml/document.h"
 
-#include "base/text.h"
 #include "xml/parser.h"
 
 namespace xml {
@@ -35,14 +34,14 @@ const char* XmlDocument::NewDocument(const char* root_name) noexcept {
 
 bool XmlDocument::LoadFromText(const char* text, std::size_t length) noexcept {
   Clear();
-  char* const copy =
-      storage_.Load(text == nullptr ? std::string_view() : std::string_view(text, length));
+  if (text == nullptr) length = 0;
+  char* const copy = storage_.Load({text, length});
   if (copy == nullptr) {
     last_error_ = XmlParseError::kOutOfMemory;
     return false;
   }
   format_flags_ = SniffFormat(copy);
-  const ParseResult result = Parse(copy, storage_);
+  const ParseResult result = Parse(copy, length, storage_);
   root_ = result.root;
   last_error_ = result.error;
   output_.length = result.error_offset;

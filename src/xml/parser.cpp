@@ -20,6 +20,7 @@ enum ByteClass : Byte {
   kTextStop = 4,
   kDoubleQuotedStop = 8,
   kSingleQuotedStop = 16,
+  kSniffStop = 32,  ///< "<" and line feed
 };
 
 struct ByteClasses {
@@ -29,10 +30,11 @@ struct ByteClasses {
 constexpr ByteClasses MakeByteClasses() noexcept {
   ByteClasses classes{};
   for (unsigned byte = 1; byte <= ' '; ++byte) classes.of[byte] = kNameEnd | kBlank;
-  classes.of[0] = kNameEnd | kTextStop | kDoubleQuotedStop | kSingleQuotedStop;
+  classes.of[0] = kNameEnd | kTextStop | kDoubleQuotedStop | kSingleQuotedStop | kSniffStop;
+  classes.of[Byte{'\n'}] |= kSniffStop;
   classes.of[Byte{'&'}] = kTextStop | kDoubleQuotedStop | kSingleQuotedStop;
   classes.of[Byte{'/'}] = classes.of[Byte{'>'}] = classes.of[Byte{'='}] = kNameEnd;
-  classes.of[Byte{'<'}] = kTextStop;
+  classes.of[Byte{'<'}] = kTextStop | kSniffStop;
   classes.of[Byte{'"'}] = kDoubleQuotedStop;
   classes.of[Byte{'\''}] = kSingleQuotedStop;
   return classes;
@@ -44,8 +46,23 @@ constexpr bool Is(Byte byte, Byte classes) noexcept {
   return (kClasses.of[byte] & classes) != 0;
 }
 
+/// The first byte from `at` on that is in one of the classes. Four at a time: most of a document is
+/// passed here, and the loop's own work is as much as a byte's.
+template <Byte kStops, typename Place>
+Place* SkipUntil(Place* at) noexcept {
+  for (;; at += 4) {
+    if (Is(at[0], kStops)) return at;
+    if (Is(at[1], kStops)) return at + 1;
+    if (Is(at[2], kStops)) return at + 2;
+    if (Is(at[3], kStops)) return at + 3;
+  }
+}
+
 Byte* AsBytes(char* text) noexcept {
   return static_cast<Byte*>(static_cast<void*>(text));
+}
+const Byte* AsBytes(const char* text) noexcept {
+  return static_cast<const Byte*>(static_cast<const void*>(text));
 }
 char* AsText(Byte* bytes) noexcept {
   return static_cast<char*>(static_cast<void*>(bytes));
@@ -60,83 +77,108 @@ bool BeginsWith(const Byte* at, std::string_view start) noexcept {
   return true;
 }
 
-/// The entity at `at`, or null when the "&" there is only an ampersand.
-const Entity* FindEntity(const Byte* at) noexcept {
-  for (const Entity& entity : kEntities) {
-    if (BeginsWith(at, entity.text)) return &entity;
+/// @param kWhich  in kEntities; a constant, so that a few bytes are compared at once
+template <std::size_t kWhich>
+const Entity* IfEntity(const Byte* at, std::size_t left) noexcept {
+  constexpr const Entity& kEntity = kEntities[kWhich];
+  const bool is =
+      left >= kEntity.text.size() && std::memcmp(at, kEntity.text.data(), kEntity.text.size()) == 0;
+  return is ? &kEntity : nullptr;
+}
+
+/// The entity at `at`, with `left` bytes from there on, or null when the "&" there is only an
+/// ampersand. The letter behind it leaves one candidate, or two.
+const Entity* FindEntity(const Byte* at, std::size_t left) noexcept {
+  switch (at[1]) {
+    case 'a': return at[2] == 'm' ? IfEntity<0>(at, left) : IfEntity<4>(at, left);
+    case 'l': return IfEntity<1>(at, left);
+    case 'g': return IfEntity<2>(at, left);
+    case 'q': return IfEntity<3>(at, left);
+    default: return nullptr;
   }
-  return nullptr;
 }
 
 class Parser {
  public:
-  Parser(Byte* text, Storage& storage) noexcept : start_(text), at_(text), storage_(storage) {}
+  /// @param root  null, and where the root goes
+  Parser(Byte* text, std::size_t length, Storage& storage, XmlElement** root) noexcept
+      : start_(text), end_(text + length), at_(text), storage_(storage), root_(root), link_(root) {}
 
-  ParseResult Run() noexcept;
+  XmlParseError ParseTree() noexcept;
+
+  /// Gives back what was in hand. @return where parsing stopped, in the decoded text.
+  std::size_t Finish() noexcept;
 
  private:
-  XmlParseError ParseTree() noexcept;
   XmlParseError ParseMarkup() noexcept;
   XmlParseError SkipPast(const char* end, XmlParseError error_without) noexcept;
   XmlParseError ParseEndTag() noexcept;
+  bool SkipExpectedEnd() noexcept;
   XmlParseError ParseStartTag() noexcept;
   XmlParseError ParseAttribute(XmlAttribute*** end) noexcept;
-  XmlParseError Link(XmlElement* element, bool is_empty) noexcept;
 
-  char* ScanText(Byte delimiter, Byte stops) noexcept;
-  char* ScanName() noexcept;
+  template <char kDelimiter, Byte kStops>
+  char* ScanText() noexcept;
+  std::string_view ScanName() noexcept;
   void SkipBlanks() noexcept;
 
   Byte* const start_;
+  const Byte* const end_;
   /// Next byte to read. What it was is in `next_` after a name, whose zero may stand there now.
   Byte* at_;
   Byte next_ = 0;
   std::size_t removed_ = 0;  ///< bytes by which decoding has shortened the text so far
   Storage& storage_;
+  XmlElement** const root_;
   // One record of each kind is always in hand, so that a tag finds no lack of memory half-way.
   XmlElement* spare_element_ = nullptr;
   XmlAttribute* spare_attribute_ = nullptr;
-  XmlElement* root_ = nullptr;
-  XmlElement* open_ = nullptr;     ///< the innermost open element
-  XmlElement* started_ = nullptr;  ///< the element whose text comes next, if one does
-  std::size_t depth_ = 0;          ///< open elements
-  /// The last element of each level: below every open element, and of the root's level.
-  XmlElement* last_[kMaxOpenElements + 1] = {};
+  XmlElement* open_ = nullptr;                  ///< the innermost open element
+  XmlElement** link_;                           ///< where the next element is hung up
+  XmlElement* started_ = nullptr;               ///< the element whose text comes next, if one does
+  std::size_t depth_ = 0;                       ///< open elements
+  std::size_t name_lengths_[kMaxOpenElements];  ///< of the open elements, outermost first
 };
 
-/// Scans up to `delimiter` and behind it, decoding entities on the way; `stops` is the class of the
-/// delimiter, "&" and zero. Reading runs ahead of writing by what the entities were longer, so that
-/// each byte is moved once however many there are.
+/// Scans up to `kDelimiter` and behind it, decoding entities on the way. Reading runs ahead of
+/// writing by what the entities were longer, so that each byte is moved once however many there
+/// are.
 /// @return the text, which ends with a zero; null when the document ends before.
-char* Parser::ScanText(Byte delimiter, Byte stops) noexcept {
+template <char kDelimiter, Byte kStops>
+char* Parser::ScanText() noexcept {
   Byte* const text = at_;
-  Byte* read = text;
-  while (!Is(*read, stops)) ++read;
+  Byte* read = SkipUntil<kStops>(text);
   Byte* write = read;
-  while (*read != delimiter && *read != 0) {
-    const Entity* const entity = FindEntity(read);
+  while (*read != Byte{kDelimiter} && *read != 0) {
+    const Entity* const entity = FindEntity(read, static_cast<std::size_t>(end_ - read));
     *write++ = entity == nullptr ? Byte{'&'} : static_cast<Byte>(entity->byte);
     read += entity == nullptr ? 1 : entity->text.size();
-    while (!Is(*read, stops)) *write++ = *read++;
+    const Byte* const run = read;
+    read = SkipUntil<kStops>(read);
+    std::memmove(write, run, static_cast<std::size_t>(read - run));
+    write += read - run;
   }
   removed_ += static_cast<std::size_t>(read - write);
-  const bool found = *read == delimiter;
+  const bool found = *read == Byte{kDelimiter};
   at_ = found ? read + 1 : read;
   *write = 0;
   return found ? AsText(text) : nullptr;
 }
 
-/// Scans a name and the blanks behind it. Leaves `next_`, the byte after them, where `at_` is.
-char* Parser::ScanName() noexcept {
+/// Scans a name and the blanks behind it. Leaves `next_`, the byte after them, where `at_` is. In
+/// line, so that the compiler keeps the parser's state in registers.
+/// @return the name, with a zero behind it.
+[[gnu::always_inline]] inline std::string_view Parser::ScanName() noexcept {
   Byte* const name = at_;
-  while (!Is(*at_, kNameEnd)) ++at_;
+  at_ = SkipUntil<kNameEnd>(name);
+  const auto length = static_cast<std::size_t>(at_ - name);
   next_ = *at_;
   *at_ = 0;
   if (Is(next_, kBlank)) {
     ++at_;
     SkipBlanks();
   }
-  return AsText(name);
+  return {AsText(name), length};
 }
 
 void Parser::SkipBlanks() noexcept {
@@ -166,20 +208,34 @@ XmlParseError Parser::ParseMarkup() noexcept {
 }
 
 XmlParseError Parser::ParseEndTag() noexcept {
-  const char* const name = ScanName();
-  if (next_ != '>') return XmlParseError::kUnclosedTag;
-  ++at_;
-  if (open_ == nullptr) return XmlParseError::kNoOpenElement;
-  if (std::strcmp(open_->name, name) != 0) return XmlParseError::kWrongEndTag;
+  if (!SkipExpectedEnd()) {
+    const std::string_view name = ScanName();
+    if (next_ != '>') return XmlParseError::kUnclosedTag;
+    ++at_;
+    if (open_ == nullptr) return XmlParseError::kNoOpenElement;
+    if (name != open_->name) return XmlParseError::kWrongEndTag;
+  }
   if (open_->first_child != nullptr || *open_->text == '\0') open_->text = nullptr;
+  link_ = &open_->next_sibling;
   open_ = open_->parent;
   --depth_;
   return XmlParseError::kNone;
 }
 
+/// The end tag that is nearly always there: the open element's name and ">" directly behind it.
+bool Parser::SkipExpectedEnd() noexcept {
+  if (open_ == nullptr) return false;
+  const std::size_t length = name_lengths_[depth_ - 1];
+  if (static_cast<std::size_t>(end_ - at_) <= length || at_[length] != '>') return false;
+  if (std::memcmp(at_, open_->name, length) != 0) return false;
+  at_ += length + 1;
+  return true;
+}
+
 XmlParseError Parser::ParseStartTag() noexcept {
   XmlElement* const element = spare_element_;
-  element->name = ScanName();
+  const std::string_view name = ScanName();
+  element->name = name.data();
   XmlAttribute** end = &element->first_attribute;
   while (next_ != '>' && next_ != '/' && next_ != 0) {
     const XmlParseError error = ParseAttribute(&end);
@@ -187,9 +243,19 @@ XmlParseError Parser::ParseStartTag() noexcept {
   }
   if (next_ == 0) return XmlParseError::kUnclosedTag;
   ++at_;
-  const bool is_empty = next_ == '/';
-  if (is_empty && *at_++ != '>') return XmlParseError::kSlashNotClosed;
-  return Link(element, is_empty);
+  element->parent = open_;
+  *link_ = element;
+  link_ = &element->next_sibling;
+  if (next_ == '>') {
+    if (depth_ == kMaxOpenElements) return XmlParseError::kTooDeep;
+    open_ = started_ = element;
+    link_ = &element->first_child;
+    name_lengths_[depth_++] = name.size();
+  } else if (*at_++ != '>') {
+    return XmlParseError::kSlashNotClosed;
+  }
+  spare_element_ = storage_.TakeElement();
+  return spare_element_ == nullptr ? XmlParseError::kOutOfMemory : XmlParseError::kNone;
 }
 
 /// @param end  the link behind the element's last attribute; moved on
@@ -197,14 +263,15 @@ XmlParseError Parser::ParseAttribute(XmlAttribute*** end) noexcept {
   XmlAttribute* const attribute = spare_attribute_;
   // A "=" directly behind another name has that name's zero upon it.
   if (next_ == '=') *at_ = '=';
-  attribute->name = ScanName();
+  attribute->name = ScanName().data();
   if (next_ != '=') return XmlParseError::kAttributeWithoutValue;
   ++at_;
   SkipBlanks();
   const Byte quote = next_;
   if (quote != '"' && quote != '\'') return XmlParseError::kValueNotQuoted;
   ++at_;
-  attribute->value = ScanText(quote, quote == '"' ? kDoubleQuotedStop : kSingleQuotedStop);
+  attribute->value =
+      quote == '"' ? ScanText<'"', kDoubleQuotedStop>() : ScanText<'\'', kSingleQuotedStop>();
   if (attribute->value == nullptr) return XmlParseError::kAttributeWithoutValue;
   **end = attribute;
   *end = &attribute->next;
@@ -214,71 +281,60 @@ XmlParseError Parser::ParseAttribute(XmlAttribute*** end) noexcept {
   return XmlParseError::kNone;
 }
 
-XmlParseError Parser::Link(XmlElement* element, bool is_empty) noexcept {
-  element->parent = open_;
-  XmlElement* const last = last_[depth_];
-  XmlElement*& first = open_ == nullptr ? root_ : open_->first_child;
-  (last == nullptr ? first : last->next_sibling) = element;
-  last_[depth_] = element;
-  if (!is_empty) {
-    if (depth_ == kMaxOpenElements) return XmlParseError::kTooDeep;
-    open_ = started_ = element;
-    last_[++depth_] = nullptr;
-  }
-  spare_element_ = storage_.TakeElement();
-  return spare_element_ == nullptr ? XmlParseError::kOutOfMemory : XmlParseError::kNone;
-}
-
 XmlParseError Parser::ParseTree() noexcept {
   spare_element_ = storage_.TakeElement();
   spare_attribute_ = storage_.TakeAttribute();
   if (spare_element_ == nullptr || spare_attribute_ == nullptr) return XmlParseError::kOutOfMemory;
   do {
-    const char* const text = ScanText('<', kTextStop);
+    const char* const text = ScanText<'<', kTextStop>();
     if (text == nullptr) return XmlParseError::kNoTag;
     // Only what directly follows a start tag is a text; what follows anything else is dropped.
     if (started_ != nullptr) started_->text = text;
     started_ = nullptr;
     const XmlParseError error = ParseMarkup();
     if (error != XmlParseError::kNone) return error;
-  } while (open_ != nullptr || root_ == nullptr);
+  } while (open_ != nullptr || *root_ == nullptr);
   return XmlParseError::kNone;
 }
 
-ParseResult Parser::Run() noexcept {
-  ParseResult result;
-  result.error = ParseTree();
+std::size_t Parser::Finish() noexcept {
   storage_.GiveBack(spare_element_);
   storage_.GiveBack(spare_attribute_);
-  if (result.error == XmlParseError::kNone) {
-    result.root = root_;
-  } else {
-    const auto stopped_at = static_cast<std::size_t>(at_ - start_);
-    result.error_offset = static_cast<std::uint32_t>(stopped_at - removed_);
-  }
-  return result;
+  return static_cast<std::size_t>(at_ - start_) - removed_;
 }
 
 }  // namespace
 
 std::uint8_t SniffFormat(const char* text) noexcept {
-  unsigned flags = 0;
-  if (std::strncmp(text, "\xEF\xBB\xBF", 3) == 0) flags |= kFormatByteOrderMark;
-  int starts = 0;
-  char before = '\0';
-  for (const char* at = text; *at != '\0' && starts < 3; before = *at++) {
-    if (*at == '<' && at[1] != '?' && at[1] != '!') ++starts;
-    if (*at != '\n') continue;
+  const Byte* const start = AsBytes(text);
+  unsigned flags = BeginsWith(start, "\xEF\xBB\xBF") ? unsigned{kFormatByteOrderMark} : 0;
+  int elements = 0;
+  for (const Byte* at = SkipUntil<kSniffStop>(start); *at != 0;
+       at = SkipUntil<kSniffStop>(at + 1)) {
+    if (*at == '<') {
+      if (at[1] != '?' && at[1] != '!' && ++elements == 3) break;
+      continue;
+    }
     flags |= kFormatLineFeed;
-    if (before == '\r') flags |= kFormatCarriageReturn;
+    if (at > start && at[-1] == '\r') flags |= kFormatCarriageReturn;
     if (at[1] == '\t') flags |= kFormatTab;
     if (at[1] == ' ') flags |= kFormatBlank;
   }
   return static_cast<std::uint8_t>(flags);
 }
 
-ParseResult Parse(char* text, Storage& storage) noexcept {
-  return Parser(AsBytes(text), storage).Run();
+ParseResult Parse(char* text, std::size_t length, Storage& storage) noexcept {
+  ParseResult result;
+  XmlElement* root = nullptr;
+  Parser parser(AsBytes(text), length, storage, &root);
+  result.error = parser.ParseTree();
+  const std::size_t stopped_at = parser.Finish();
+  if (result.error == XmlParseError::kNone) {
+    result.root = root;
+  } else {
+    result.error_offset = static_cast<std::uint32_t>(stopped_at);
+  }
+  return result;
 }
 
 }  // namespace xml

@@ -1,6 +1,7 @@
 // A document's text becomes its tree.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "xml/document.h"
@@ -17,8 +18,10 @@ struct ParseResult {
 /// "<" that is followed by neither "?" nor "!".
 [[nodiscard]] std::uint8_t SniffFormat(const char* text) noexcept;
 
-/// Parses a text that ends with a zero, in place: names, values and texts of the tree point into
-/// it. Reads nothing behind the zero, and each byte a constant number of times.
-[[nodiscard]] ParseResult Parse(char* text, Storage& storage) noexcept;
+/// Parses a text in place: names, values and texts of the tree point into it. Each byte is read a
+/// constant number of times.
+///
+/// @param length  bytes of the text; a zero stands behind them, and an earlier one ends the text
+[[nodiscard]] ParseResult Parse(char* text, std::size_t length, Storage& storage) noexcept;
 
 }  // namespace xml

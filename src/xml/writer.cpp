@@ -49,133 +49,221 @@ class Layout {
   bool indents_;
 };
 
-class Writer {
- public:
-  explicit Writer(XmlDocument& document) noexcept
-      : document_(document), layout_(document.format_flags()) {}
-
-  void Run();
-
- private:
-  void Emit(std::string_view piece) {
-    if (!piece.empty()) {
-      document_.output().sink(document_, piece.data(), static_cast<std::uint32_t>(piece.size()));
-    }
-  }
-  void EmitEscaped(const char* text);
-  void WriteStart(const XmlElement& element);
-  void WriteEnd(const XmlElement& element);
-  void WriteTree(const XmlElement* element);
-
-  XmlDocument& document_;
-  const Layout layout_;
+/// What becomes of a byte of a text or value.
+struct EscapeTable {
+  unsigned char ends_run[256];  ///< 0: written as it is; else the entity's number from 1, or kEnd
+  unsigned char size[256];      ///< as written
 };
 
-const Entity* EntityFor(char byte) noexcept {
+/// Of the zero that ends a text.
+constexpr unsigned char kEnd = std::size(kEntities) + 1;
+
+constexpr EscapeTable MakeEscapeTable() noexcept {
+  EscapeTable table{};
+  for (unsigned char& size : table.size) size = 1;
+  unsigned char number = 0;
   for (const Entity& entity : kEntities) {
-    if (entity.byte == byte) return &entity;
+    const auto byte = static_cast<unsigned char>(entity.byte);
+    table.ends_run[byte] = ++number;
+    table.size[byte] = static_cast<unsigned char>(entity.text.size());
   }
-  return nullptr;
+  table.ends_run[0] = kEnd;
+  table.size[0] = 0;
+  return table;
 }
 
-void Writer::EmitEscaped(const char* text) {
-  const char* run = text;
-  for (const char* at = text;; ++at) {
-    const Entity* const entity = EntityFor(*at);
-    if (entity == nullptr && *at != '\0') continue;
-    Emit({run, static_cast<std::size_t>(at - run)});
-    if (entity == nullptr) return;
-    Emit(entity->text);
-    run = at + 1;
-  }
+constexpr EscapeTable kEscapes = MakeEscapeTable();
+
+constexpr unsigned char EndsRun(char byte) noexcept {
+  return kEscapes.ends_run[static_cast<unsigned char>(byte)];
 }
 
-void Writer::WriteStart(const XmlElement& element) {
-  Emit("<");
-  Emit(element.name);
+constexpr unsigned char SizeOf(char byte) noexcept {
+  return kEscapes.size[static_cast<unsigned char>(byte)];
+}
+
+constexpr std::string_view EntityFor(char byte) noexcept {
+  return kEntities[EndsRun(byte) - 1].text;
+}
+
+/// Hands every piece to the document's sink.
+class SinkOutput {
+ public:
+  explicit SinkOutput(XmlDocument& document) noexcept : document_(document) {}
+
+  void Put(std::string_view piece) {
+    if (piece.empty()) return;
+    document_.output().sink(document_, piece.data(), static_cast<std::uint32_t>(piece.size()));
+  }
+  void PutName(const char* name) { Put(name); }
+  void PutEscaped(const char* text) {
+    for (;;) {
+      const char* const run = text;
+      while (EndsRun(*text) == 0) ++text;
+      Put({run, static_cast<std::size_t>(text - run)});
+      if (*text == '\0') return;
+      Put(EntityFor(*text++));
+    }
+  }
+
+ private:
+  XmlDocument& document_;
+};
+
+/// Adds up what would be written; a sum that 32 bits cannot hold stays at their largest value.
+class CountingOutput {
+ public:
+  explicit CountingOutput(std::uint32_t length) noexcept : sum_(length) {}
+
+  void Put(std::string_view piece) noexcept { sum_ += piece.size(); }
+  void PutName(const char* name) noexcept { sum_ += std::strlen(name); }
+  void PutEscaped(const char* text) noexcept {
+    std::uint64_t size = 0;
+    for (; *text != '\0'; ++text) size += SizeOf(*text);
+    sum_ += size;
+  }
+  [[nodiscard]] std::uint32_t length() const noexcept {
+    return sum_ < UINT32_MAX ? static_cast<std::uint32_t>(sum_) : UINT32_MAX;
+  }
+
+ private:
+  std::uint64_t sum_;
+};
+
+/// Copies into a buffer that has the room.
+class CopyingOutput {
+ public:
+  explicit CopyingOutput(char* position) noexcept : position_(position) {}
+
+  void Put(std::string_view piece) noexcept {
+    std::memcpy(position_, piece.data(), piece.size());
+    position_ += piece.size();
+  }
+  /// Names are short: a loop is faster than measuring and copying.
+  void PutName(const char* name) noexcept {
+    char* out = position_;
+    while (*name != '\0') *out++ = *name++;
+    position_ = out;
+  }
+  void PutEscaped(const char* text) noexcept {
+    char* out = position_;
+    for (;;) {
+      while (EndsRun(*text) == 0) *out++ = *text++;
+      if (*text == '\0') break;
+      const std::string_view entity = EntityFor(*text++);
+      std::memcpy(out, entity.data(), entity.size());
+      out += entity.size();
+    }
+    position_ = out;
+  }
+  [[nodiscard]] char* position() const noexcept { return position_; }
+
+ private:
+  char* position_;
+};
+
+template <typename Output>
+[[gnu::always_inline]] inline void WriteStart(const XmlElement& element, Output& out) {
+  out.Put("<");
+  out.PutName(element.name);
   for (const XmlAttribute* at = element.first_attribute; at != nullptr; at = at->next) {
-    Emit(" ");
-    Emit(at->name);
-    Emit("=\"");
-    EmitEscaped(at->value);
-    Emit("\"");
+    out.Put(" ");
+    out.PutName(at->name);
+    out.Put("=\"");
+    out.PutEscaped(at->value);
+    out.Put("\"");
   }
 }
 
-void Writer::WriteEnd(const XmlElement& element) {
-  Emit("</");
-  Emit(element.name);
-  Emit(">");
+template <typename Output>
+[[gnu::always_inline]] inline void WriteEnd(const XmlElement& element, Output& out) {
+  out.Put("</");
+  out.PutName(element.name);
+  out.Put(">");
 }
 
 /// Depth first, back up along the links to the parents.
-void Writer::WriteTree(const XmlElement* element) {
+template <typename Output>
+[[gnu::always_inline]] inline void WriteTree(const XmlElement* element, const Layout& layout,
+                                             Output& out) {
   std::size_t level = 0;
   for (;;) {
-    WriteStart(*element);
+    WriteStart(*element, out);
     if (element->first_child != nullptr) {
-      Emit(">");
-      Emit(layout_.Line(++level));
+      out.Put(">");
+      out.Put(layout.Line(++level));
       element = element->first_child;
       continue;
     }
     if (element->text == nullptr || *element->text == '\0') {
-      Emit("/>");
+      out.Put("/>");
     } else {
-      Emit(">");
-      EmitEscaped(element->text);
-      WriteEnd(*element);
+      out.Put(">");
+      out.PutEscaped(element->text);
+      WriteEnd(*element, out);
     }
     while (level > 0 && element->next_sibling == nullptr) {
       element = element->parent;
-      Emit(layout_.Line(--level));
-      WriteEnd(*element);
+      out.Put(layout.Line(--level));
+      WriteEnd(*element, out);
     }
     if (level == 0) return;
-    Emit(layout_.Line(level));
+    out.Put(layout.Line(level));
     element = element->next_sibling;
   }
 }
 
-void Writer::Run() {
-  if ((document_.format_flags() & kFormatByteOrderMark) != 0) Emit(kByteOrderMark);
-  Emit(kDeclaration);
-  Emit(layout_.Line(0));
-  if (document_.root() != nullptr) WriteTree(document_.root());
+/// @param out  a copy, so that its state stays in registers
+/// @return the output as it is then
+template <typename Output>
+Output Write(const XmlDocument& document, Output out) {
+  const Layout layout(document.format_flags());
+  if ((document.format_flags() & kFormatByteOrderMark) != 0) out.Put(kByteOrderMark);
+  out.Put(kDeclaration);
+  out.Put(layout.Line(0));
+  if (document.root() != nullptr) WriteTree(document.root(), layout, out);
+  return out;
 }
 
-/// Adds up; a sum that 32 bits cannot hold stays at their largest value.
-void Count(XmlDocument& document, const char* /*bytes*/, std::uint32_t length) {
+}  // namespace
+
+void CountingSink(XmlDocument& document, const char* /*bytes*/, std::uint32_t length) {
   std::uint32_t& sum = document.output().length;
   sum = length < UINT32_MAX - sum ? sum + length : UINT32_MAX;
 }
 
-void Copy(XmlDocument& document, const char* bytes, std::uint32_t length) {
+void CopyingSink(XmlDocument& document, const char* bytes, std::uint32_t length) {
   char*& position = document.output().position;
   std::memcpy(position, bytes, length);
   position += length;
 }
 
-}  // namespace
-
+// The two sinks of this file are taken in line: a call for each piece would cost more than its
+// bytes.
 void WriteToSink(XmlDocument& document) {
-  if (document.output().sink != nullptr) Writer(document).Run();
+  XmlOutput& output = document.output();
+  if (output.sink == CountingSink) {
+    output.length = Write(document, CountingOutput(output.length)).length();
+  } else if (output.sink == CopyingSink) {
+    output.position = Write(document, CopyingOutput(output.position)).position();
+  } else if (output.sink != nullptr) {
+    Write(document, SinkOutput(document));
+  }
 }
 
 const char* Serialize(XmlDocument& document, std::uint32_t* length) {
   XmlOutput& output = document.output();
   output.buffer.Reset();
   output.length = 0;
-  output.sink = Count;
+  output.sink = CountingSink;
   WriteToSink(document);
   if (length != nullptr) *length = output.length;
-  if (output.length != UINT32_MAX) {
-    output.buffer = device::LocalBlock<char>(
-        static_cast<char*>(LocalAlloc(LMEM_FIXED, std::size_t{output.length} + 1)));
-  }
+  if (output.length == UINT32_MAX) return nullptr;
+  output.buffer = device::LocalBlock<char>(
+      static_cast<char*>(LocalAlloc(LMEM_FIXED, std::size_t{output.length} + 1)));
   if (!output.buffer) return nullptr;
   output.position = output.buffer.get();
-  output.sink = Copy;
+  output.sink = CopyingSink;
   WriteToSink(document);
   *output.position = '\0';
   return output.buffer.get();

@@ -15,6 +15,13 @@ namespace xml {
 /// Levels beyond kMaxOpenElements, which only calls can make, are not indented any further.
 void WriteToSink(XmlDocument& document);
 
+/// A sink that adds the length of every piece to the output's length. A sum that 32 bits cannot
+/// hold stays at their largest value.
+void CountingSink(XmlDocument& document, const char* bytes, std::uint32_t length);
+
+/// A sink that copies every piece to the output's position, which has the room, and moves it on.
+void CopyingSink(XmlDocument& document, const char* bytes, std::uint32_t length);
+
 /// The document as text, with a zero behind it, in one block of exactly its size.
 ///
 /// @param length  when given, receives the bytes without the zero, even if there is no memory

@@ -199,6 +199,44 @@ TEST_F(WriterTest, HandsTheSamePiecesToAnySink) {
   EXPECT_EQ(Written(), whole);
 }
 
+/// Another sink that hands on what it gets, so that the sinks of the library see every piece.
+XmlSink handed_on_to = nullptr;
+void HandOn(XmlDocument& document, const char* bytes, std::uint32_t length) {
+  handed_on_to(document, bytes, length);
+}
+
+TEST_F(WriterTest, CountsAndCopiesTheSameInOnePieceOrMany) {
+  ASSERT_EQ(Load("\xEF\xBB\xBF<a x='&lt;'>\r\n\t<b>it's</b></a>"), XmlParseError::kNone);
+  const std::string written = Written();
+  XmlOutput& output = document().output();
+  for (const bool one_by_one : {false, true}) {
+    handed_on_to = CountingSink;
+    output.sink = one_by_one ? HandOn : CountingSink;
+    output.length = 5;
+    WriteToSink(document());
+    EXPECT_EQ(output.length, 5 + written.size()) << "it adds to what is there";
+
+    std::string copy(written.size() + 1, '#');
+    handed_on_to = CopyingSink;
+    output.sink = one_by_one ? HandOn : CopyingSink;
+    output.position = copy.data();
+    WriteToSink(document());
+    EXPECT_EQ(copy, written + "#") << "nothing behind it";
+    EXPECT_EQ(output.position, copy.data() + written.size());
+  }
+}
+
+TEST_F(WriterTest, CountsNoFurtherThanThirtyTwoBits) {
+  ASSERT_EQ(Load("<a/>"), XmlParseError::kNone);
+  for (const XmlSink sink : {XmlSink{CountingSink}, XmlSink{HandOn}}) {
+    handed_on_to = CountingSink;
+    document().output().sink = sink;
+    document().output().length = UINT32_MAX - 10;
+    WriteToSink(document());
+    EXPECT_EQ(document().output().length, UINT32_MAX);
+  }
+}
+
 TEST_F(WriterTest, WritesNothingWithoutASink) {
   ASSERT_EQ(Load("<a/>"), XmlParseError::kNone);
   WriteToSink(document());
