@@ -74,10 +74,11 @@ BOOL GetExitCodeThread(HANDLE thread, DWORD* exit_code) {
   call.Argument("handle", thread);
   if (call.failed()) return call.Return(FALSE);
   if (exit_code == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
-  const sim::World::Lock lock = call.world().Acquire();
+  sim::World::Lock lock = call.world().Acquire();
   const auto object = FindThread(call, thread);
   if (object == nullptr) return call.Fail(ERROR_INVALID_HANDLE, FALSE);
   *exit_code = object->thread().exit_code;
+  if (*exit_code == STILL_ACTIVE) call.world().Yield(lock);
   return call.Return(TRUE);
 }
 

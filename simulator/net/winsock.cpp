@@ -204,9 +204,13 @@ int ce_ioctlsocket(SOCKET socket, std::int32_t command, std::uint32_t* argument)
   return call.Finish(call.On(socket, [&](Socket& at) -> int {
     if (command != CE_FIONBIO && command != CE_FIONREAD) return WSAEINVAL;
     if (argument == nullptr) return WSAEFAULT;
-    if (command == CE_FIONREAD) return at.Pending(*argument);
-    at.set_nonblocking(*argument != 0);
-    return 0;
+    if (command == CE_FIONBIO) {
+      at.set_nonblocking(*argument != 0);
+      return 0;
+    }
+    const int error = at.Pending(*argument);
+    if (error == 0 && *argument == 0) call.network().LetTimePass(call.lock());
+    return error;
   }));
 }
 

@@ -150,9 +150,10 @@ BOOL GetExitCodeProcess(HANDLE process, DWORD* exit_code) {
   call.Argument("process", process);
   if (call.failed()) return call.Return(FALSE);
   if (exit_code == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
-  const auto lock = call.world().Acquire();
+  auto lock = call.world().Acquire();
   const auto found = call.device().handles().FindAs<sim::Process>(process);
   if (found == nullptr) return call.Fail(ERROR_INVALID_HANDLE, FALSE);
   *exit_code = found->exit_code;
+  if (*exit_code == STILL_ACTIVE) call.world().Yield(lock);
   return call.Return(TRUE);
 }

@@ -375,6 +375,12 @@ TEST_F(VirtualStreamTest, LetsTimePassForAProgramThatAsksAgainAndAgain) {
   looks = 0;
   while (ReceiveText(second) == "error 10035") ++looks;
   EXPECT_LE(looks, 2000);
+
+  poured_ = 0;
+  const SOCKET third = ConnectedSocket();
+  looks = 0;
+  while (Pending(third) == 0) ++looks;
+  EXPECT_LE(looks, 2000);
 }
 
 }  // namespace

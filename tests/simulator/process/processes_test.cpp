@@ -33,6 +33,7 @@ sim::Profile DeviceWithPrograms() {
   profile.processes = {{"Browser.exe"}, {"Shell.exe"}, {"Browser.exe"}};
   profile.programs["wait.exe"] = {"", 7, 5000};
   profile.programs["now.exe"] = {"", 3, 0};
+  profile.programs["soon.exe"] = {"", 4, 20};
   profile.programs["write.exe"] = {
       "printf '%s' \"$ORVENIX_COMMAND_LINE\" > \"$ORVENIX_DEVICE/storage/out.txt\"; "
       "echo said; exit 9",
@@ -142,6 +143,15 @@ TEST_F(ProcessesTest, RunsABuiltInForItsTimeOnTheWorldsClock) {
   EXPECT_NE(Names().back(), "WAIT.exe");
   CloseHandle(started.hProcess);
   CloseHandle(started.hThread);
+}
+
+TEST_F(ProcessesTest, LetsTimePassForAProgramThatPollsForTheEndOfAnother) {
+  const PROCESS_INFORMATION started = Start(TEXT("soon.exe"));
+  int polls = 1;
+  while (ExitCode(started.hProcess) == STILL_ACTIVE) ++polls;
+
+  EXPECT_EQ(ExitCode(started.hProcess), 4U);
+  EXPECT_LE(polls, 20002) << "a microsecond passes with each look";
 }
 
 TEST_F(ProcessesTest, TerminatesABuiltInBeforeItsTime) {

@@ -97,6 +97,23 @@ TEST_F(VirtualWorldTest, AProgramThatPollsTheTimeWithoutPauseSeesItPass) {
   EXPECT_EQ(now(), milliseconds(50));
 }
 
+TEST_F(VirtualWorldTest, AProgramThatPollsForTheEndOfAThreadSeesIt) {
+  HANDLE thread = CreateThread(
+      nullptr, 0,
+      [](void*) -> DWORD {
+        Sleep(10);
+        return 5;
+      },
+      nullptr, 0, nullptr);
+  DWORD code = STILL_ACTIVE;
+  int polls = 0;
+  for (; code == STILL_ACTIVE; ++polls) ASSERT_TRUE(GetExitCodeThread(thread, &code));
+
+  EXPECT_EQ(code, 5U);
+  EXPECT_LE(polls, 10002) << "a microsecond passes with each look";
+  EXPECT_TRUE(CloseHandle(thread));
+}
+
 TEST_F(VirtualWorldTest, ATerminatedThreadLeavesItsWait) {
   HANDLE thread = CreateThread(
       nullptr, 0,
