@@ -73,6 +73,7 @@ int RunCommandLine(int argc, char** argv) {
   app.footer(ExitCodeHelp());
   Action action;
   AddBundleVerb(app, action);
+  AddJobVerb(app, action);
   AddServeVerb(app, action);
   AddDeviceVerb(app, action);
   AddRunVerb(app, action);

@@ -18,6 +18,7 @@
 #include "tools/file_text.h"
 #include "tools/job_file.h"
 #include "tools/job_walk.h"
+#include "tools/lint/lint.h"
 #include "tools/run_view.h"
 #include "window/screen.h"
 #include "world/world.h"
@@ -59,6 +60,7 @@ class UpgradeRun {
   }
 
   ExitCode Run() {
+    if (!options_.force) RefuseBadJob();
     const sim::AttachedThread host(*device_, "host");
     Watch();
     view_.ShowEvent({{"event", "started"},
@@ -81,6 +83,14 @@ class UpgradeRun {
   }
 
  private:
+  void RefuseBadJob() {
+    const std::string name = options_.job.string();
+    const Findings findings = LintJob(job_, name);
+    if (findings.Count(Level::kError) == 0) return;
+    view_.ShowEvent(FindingsJson(name, findings));
+    RefuseErrors(name, findings, "see 'orvenix job lint', or run it all the same with --force");
+  }
+
   std::unique_ptr<sim::Device> MakeDevice() {
     try {
       return std::make_unique<sim::Device>(*world_, profile_, options_.device);

@@ -16,6 +16,7 @@ void AddRunVerb(CLI::App& app, Action& action) {
       ->capture_default_str();
   run->add_option("--library", options->library,
                   "the configlet library (default: lib/liborvenix.so beside this program)");
+  run->add_flag("--force", options->force, "run the job although 'job lint' finds errors in it");
   AddJsonOption(*run, options->json, "print one JSON object a line for everything that happens");
   run->footer("Example:\n  orvenix run ./bundle/job.xml --device ./handheld --screens ./screens");
   run->callback([options, &action] { action = [options] { return Run(*options); }; });

@@ -14,6 +14,7 @@
 #include "tools/device_table.h"
 #include "tools/failure.h"
 #include "tools/file_text.h"
+#include "tools/lint/lint.h"
 
 namespace tools {
 namespace {
@@ -26,6 +27,7 @@ constexpr std::size_t kTableRows = 30;
 /// What is to be served, and what its bundle says about where.
 struct Source {
   fs::path root;
+  fs::path job;  ///< of a bundle that has one
   std::string address = "127.0.0.1";
   std::uint16_t port = 8080;
   std::vector<BundleFile> files;  ///< with attributes of their own
@@ -49,6 +51,7 @@ Source FindSource(const fs::path& named) {
   if (!fs::exists(folder / kBundleManifest)) return source;
   const Bundle bundle = ReadBundle(folder);
   source.root = folder / kBundleTree;
+  if (fs::exists(folder / kBundleJob)) source.job = folder / kBundleJob;
   source.address = bundle.address;
   source.port = bundle.port;
   for (const BundleFile& file : bundle.files) {
@@ -70,6 +73,7 @@ class ServeRun {
   ExitCode Run() {
     for (const BundleFile& file : source_.files) site_.SetAttributes(file.source, file.attributes);
     inventory_ = site_.Warm();
+    if (!options_.force && !source_.job.empty()) RefuseBadJob();
     server::RaiseDescriptorLimit();
     ledger_.SetListener([this](const server::Event& event) { OnEvent(event); });
     Listen();
@@ -85,6 +89,14 @@ class ServeRun {
   }
 
  private:
+  /// After Warm(), so that no file is read twice for its checksum.
+  void RefuseBadJob() {
+    const std::string name = source_.job.string();
+    const Findings findings = LintJob(ReadJob(source_.job), name, &site_);
+    if (options_.json && findings.Count(Level::kError) > 0) Print(FindingsJson(name, findings));
+    RefuseErrors(name, findings, "see 'orvenix job lint', or serve it all the same with --force");
+  }
+
   void Listen() {
     server::HttpServerOptions http;
     http.address = options_.address.value_or(source_.address);
@@ -115,7 +127,9 @@ class ServeRun {
     }
   }
 
-  static void Print(const nlohmann::ordered_json& json) { std::cout << json.dump() << std::endl; }
+  static void Print(const nlohmann::ordered_json& json) {
+    std::cout << json.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace) << std::endl;
+  }
 
   void OnEvent(const server::Event& event) {
     if (options_.json) {

@@ -19,6 +19,7 @@ struct ServeOptions {
   std::size_t max_connections = 4096;
   std::filesystem::path report;     ///< JSON of all devices at the end; empty: none
   std::uint64_t until_reports = 0;  ///< end after so many job reports; 0: serve on
+  bool force = false;               ///< also a bundle whose job has errors
   bool json = false;
 };
 

@@ -28,6 +28,8 @@ void AddServeVerb(CLI::App& app, Action& action) {
                     "write all devices' records to this file at the end");
   serve->add_option("--until-reports", options->until_reports,
                     "end after this many devices have reported the end of their job");
+  serve->add_flag("--force", options->force,
+                  "serve the bundle although 'job lint' finds errors in its job");
   AddJsonOption(*serve, options->json, "print one JSON object a line for every event");
   serve->footer(
       "Example:\n  orvenix serve ./bundle --address 127.0.0.2 --report report.json\n"

@@ -1,0 +1,395 @@
+// What `orvenix job lint` finds: for every rule a job that breaks it, and jobs that break none.
+
+#include "tools/lint/lint.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <set>
+#include <sstream>
+
+#include "server/scratch_folder.h"
+#include "server/site.h"
+#include "tools/failure.h"
+#include "tools/job_file.h"
+
+namespace tools {
+namespace {
+
+using ::testing::Contains;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+
+std::string Field(const std::string& name, const std::string& value) {
+  return "<Field Name='" + name + "'>" + value + "</Field>";
+}
+std::string Group(const std::string& name, const std::string& content) {
+  return "<Group Name='" + name + "'>" + content + "</Group>";
+}
+
+const std::string kUrl = Field("BaseURL", "http://10.0.0.2");
+const std::string kServer = Group("HTTPServer", Field("HTTPPort", "8080") + kUrl);
+const std::string kStore = Group("Store", Field("Name", "\\") + Field("RequiredSpace", "6"));
+const std::string kList =
+    Group("FileList", Field("Source", "bundle.lst") + Field("Dest", "\\bundle.lst") +
+                          Field("CRC", "12") + Field("MCTMask", "*"));
+
+std::string Test(const std::string& fields) {
+  return Group("Registry", fields);
+}
+std::string GoodTestWithout(const std::string& left_out, const std::string& instead = "") {
+  std::string fields = instead;
+  for (const auto& [name, value] :
+       std::vector<std::pair<std::string, std::string>>{{"Key", "Software"},
+                                                        {"ValueName", "V"},
+                                                        {"Type", "REG_DWORD"},
+                                                        {"Operator", "EQ"},
+                                                        {"Value", "1"},
+                                                        {"ErrorMsg", "no V"}}) {
+    if (name != left_out) fields += Field(name, value);
+  }
+  return Test(fields);
+}
+std::string Download(const std::string& source, const std::string& destination,
+                     const std::string& masks = "*", const std::string& crc = "12") {
+  return Group("Download", Group("File", Field("Source", source) + Field("Dest", destination) +
+                                             Field("CRC", crc) + Field("MCTMask", masks)));
+}
+std::string Cleanup(const std::string& action, const std::string& name) {
+  return Group("DiskCleanup", Group("File", Field("Name", name) + Field("Action", action)));
+}
+std::string Upgrade(const std::string& content) {
+  return Group("Orvenix", Group("Upgrade", content));
+}
+/// A job without a fault, and `more` in it.
+std::string With(const std::string& more) {
+  return Upgrade(kServer + kStore + kList + more);
+}
+
+Findings LintText(const std::string& groups, server::Site* site = nullptr, bool unlisted = false) {
+  return LintJob(ParseJob("<DevInfo><Subsystem Name='Orvenix'>" + groups + "</Subsystem></DevInfo>",
+                          "job.xml"),
+                 "job.xml", site, unlisted);
+}
+
+std::vector<std::string> Ids(const Findings& findings) {
+  std::vector<std::string> ids;
+  for (const Finding& finding : findings.all()) ids.emplace_back(RowOf(finding.rule).id);
+  return ids;
+}
+
+struct LintCase {
+  std::string id;
+  std::string job;
+  std::string found = "";  ///< part of what is said
+};
+
+std::vector<LintCase> CasesOfTheWalk() {
+  return {
+      {"unknown-group", With(Group("Sislog", "")), "no group \"Sislog\""},
+      {"unknown-field", With(Field("Colour", "red")), "no field \"Colour\""},
+      {"unknown-field", With(Test(Field("Val", "1")))},
+      {"no-upgrade", Group("Orvenix", kServer)},
+      {"no-upgrade", Group("Upgrade", kServer), "not stand inside"},
+      {"two-upgrades",
+       Group("Orvenix", Group("Upgrade", kServer + kStore + kList) + Group("Upgrade", ""))},
+      {"lost-setting", kServer + With(""), "before the beginning"},
+      {"lost-setting",
+       Group("Orvenix",
+             Group("Upgrade", kServer + kStore + kList) + Group("Syslog", Field("Port", "0"))),
+       "behind the end"},
+      {"stray-field", With(Field("RequiredSpace", "5")), "\"Store\""},
+      {"stray-field", With(Field("Operator", "EQ")), "\"Registry\""},
+      {"ignored-field", With(Field("Source", "a")), "Source has no meaning"},
+      {"ignored-field", With(Group("Syslog", Field("Wait", "false")))},
+      {"ignored-field", With(Group("Process", Field("Process", "a.exe")))},
+      {"group-case", With(Group("DiskCleanup", Group("FILE", Field("Action", "Save"))))},
+      {"group-case", With(Group("multicastclient", Field("Parameters", "-A=1")))},
+      {"short-name", With(Group("Syslog", Field("P", "0"))), "\"P\" sets \"Port\""},
+      {"idle-file", With(Group("File", ""))},
+      {"cut-text", With(Group("AlternateRTWReason", Field("BeginText", std::string(64, 'x')))),
+       "64 characters, the device keeps 63"},
+      {"not-ascii", With(Group("AlternateRTWReason", Field("BeginText", "gr\xC3\xBC\xC3\x9F")))},
+      {"outer-blanks", With(Group("StopProcess", Field("Process", " a.exe")))},
+      {"switch-text", With(Field("ShowGUI", "False")), "ShowGUI is \"False\""},
+      {"switch-text", With(Group("StartProcess", Field("Process", "a") + Field("Wait", "no")))},
+  };
+}
+
+std::vector<LintCase> CasesOfTheDevice() {
+  return {
+      {"no-storage", Upgrade(kServer + kList)},
+      {"storage-unnamed", With(Group("Store", Field("RequiredSpace", "1")))},
+      {"storage-number",
+       With(Group("Store", Field("Name", "\\") + Field("RequiredSpace", "2147483648")))},
+      {"storage-number", With(Group("Store", Field("Name", "\\")))},
+      {"storage-last", With(Group("Store", Field("Name", "\\Temp") + Field("RequiredSpace", "1"))),
+       "\"\\Temp\" comes last"},
+      {"storage-last-ram",
+       With(Group("Store", Field("Name", "RAM:") + Field("RequiredSpace", "1")))},
+      {"storage-second-ram",
+       With(Group("Store", Field("Name", "RAM:") + Field("RequiredSpace", "1")) +
+            Group("Store", Field("Name", "RAM:x") + Field("RequiredSpace", "1")) + kStore)},
+      {"test-no-type", With(GoodTestWithout("Type")), "the test of \"V\" has no Type"},
+      {"test-type", With(GoodTestWithout("Type", Field("Type", "String")))},
+      {"test-type", With(GoodTestWithout("Type", Field("Type", "reg_sz")))},
+      {"test-operator", With(GoodTestWithout("Operator"))},
+      {"test-operator", With(GoodTestWithout("Operator", Field("Operator", "eq")))},
+      {"test-root", With(GoodTestWithout("", Field("Root", "HKLM"))), "\"HKLM\""},
+      {"test-no-key", With(GoodTestWithout("Key"))},
+      {"test-number", With(GoodTestWithout("Value", Field("Value", "-1")))},
+      {"test-number", With(GoodTestWithout("Value", Field("Value", "0x10")))},
+      {"test-no-message", With(GoodTestWithout("ErrorMsg"))},
+      {"syslog-address",
+       With(Group("Syslog", Field("Port", "514") + Field("Address", "logs.local")))},
+      {"syslog-address", With(Group("Syslog", Field("Port", "514"))), "port 514 of \"\""},
+      {"syslog-address",
+       With(Group("Syslog", Field("Port", "514") + Field("Address", "10.0.0.256")))},
+      {"syslog-port", With(Group("Syslog", Field("Port", "65536"))), "kept as 0"},
+      {"end-without-begin", With(Field("EndText", "Done"))},
+      {"markup-in-text", With(Field("BeginText", "A &amp; B"))},
+      {"markup-in-text", With(GoodTestWithout("ErrorMsg", Field("ErrorMsg", "a &lt; b")))},
+      {"url-missing", Upgrade(kStore + kList)},
+      {"url-scheme", Upgrade(kStore + kList + Field("BaseURL", "https://10.0.0.2"))},
+      {"url-scheme", Upgrade(kStore + kList + Field("BaseURL", "10.0.0.2"))},
+      {"url-path-without-port", Upgrade(kStore + kList + Field("BaseURL", "http://10.0.0.2/"))},
+      {"url-path-without-port", Upgrade(kStore + kList + Field("BaseURL", "http://10.0.0.2/dir"))},
+      {"url-own-port-joined", Upgrade(kStore + kList + Field("BaseURL", "http://10.0.0.2:8080"))},
+      {"url-own-port", Upgrade(kStore + kList + Field("BaseURL", "http://10.0.0.2:8080/"))},
+      {"http-port", With(Field("HTTPPort", "0"))},
+      {"http-port", With(Field("HTTPPort", "70000"))},
+      {"address-differs", With(Field("IPAddress", "10.0.0.3"))},
+      {"multicast-parameters",
+       With(Group("MulticastClient", Field("Parameters", "-A=239.1.1.1 -X=1")))},
+  };
+}
+
+std::vector<LintCase> CasesOfFilesAndCleanup() {
+  return {
+      {"nothing-to-fetch", Upgrade(kServer + kStore)},
+      {"file-no-source", With(Download("", "\\a"))},
+      {"file-no-destination", With(Download("a", ""))},
+      {"file-no-mask", With(Download("a", "\\a", " ; "))},
+      {"path-no-letter", With(Download("/123", "\\a")), "\"/123\""},
+      {"path-leading", With(Download("1st", "\\a")), "\"1st\""},
+      {"destination-name", With(Download("a", "\\a?"))},
+      {"destination-folder", With(Download("a", "\\folder\\"))},
+      {"destination-relative", With(Download("a", "a"))},
+      {"duplicate-destination", With(Download("a", "\\A") + Download("b", "\\a")),
+       "comes from job.xml:1"},
+      {"duplicate-destination", With(Download("a", "\\A", "MR*") + Download("b", "\\a", "*"))},
+      {"duplicate-for-others", With(Download("a", "\\A", "MR*") + Download("b", "\\a", "TQ*"))},
+      {"rename-target", With(Download("a", "\\a.rename") + Download("b", "\\a"))},
+      {"crc-zero", With(Download("a", "\\a", "*", "0"))},
+      {"crc-number", With(Download("a", "\\a", "*", "0x12"))},
+      {"ram-without-store", With(Download("a", "RAM:a"))},
+      {"delete-root", With(Cleanup("Delete", "\\"))},
+      {"delete-root", With(Cleanup("delete", "\\\\"))},
+      {"delete-wildcard", With(Cleanup("Delete", "\\Temp\\*.*"))},
+      {"delete-dot-folder", With(Cleanup("Delete", "\\My.App\\"))},
+      {"delete-dot-folder", With(Cleanup("Delete", "\\My.App\\data"))},
+      {"delete-relative", With(Cleanup("Delete", "Temp"))},
+      {"cleanup-idle", With(Cleanup("Delete", "")), "without a Name"},
+      {"cleanup-idle", With(Cleanup("Remove", "\\Temp")), "without Delete or Save"},
+      {"save-double-backslash",
+       With(Cleanup("Delete", "\\Temp\\") + Cleanup("Save", "\\Temp\\a.txt"))},
+      {"save-direct", With(Cleanup("Delete", "\\Temp\\a.txt") + Cleanup("Save", "\\temp\\A.TXT"))},
+      {"save-nothing", With(Cleanup("Save", "\\Temp\\a.txt"))},
+      {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temper\\a.txt"))},
+      {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp\\x.y\\a.txt"))},
+      {"stop-path", With(Group("StopProcess", Field("Process", "\\Windows\\a.exe")))},
+      {"stop-name", With(Group("StopProcess", Field("Process", "scanner")))},
+      {"stop-system", With(Group("StopProcess", Field("Process", "GWES.exe")))},
+      {"start-no-program", With(Group("StartProcess", Field("Parameters", "x")))},
+      {"installer-blank", With(Group("StartProcess", Field("Process", "\\Windows\\wceload.exe") +
+                                                         Field("Parameters", "\\a.cab")))},
+      {"installer-case", With(Group("StartProcess", Field("Process", "WCELOAD.EXE")))},
+  };
+}
+
+TEST(LintTest, FindsNothingInAJobWithoutAFault) {
+  EXPECT_THAT(Ids(LintText(With(""))), IsEmpty());
+  EXPECT_THAT(
+      Ids(LintText(With(
+          GoodTestWithout("") +
+          Group("Syslog", Field("Port", "514") + Field("Address", "10.0.0.5")) +
+          Cleanup("Delete", "\\Temp") + Cleanup("SAVE", "\\temp\\sub\\Keep.txt") +
+          Cleanup("Delete", "\\old.txt") + Group("StopProcess", Field("Process", "Scanner.exe")) +
+          Group("StartProcess", Field("Process", "\\Windows\\wceload.exe") +
+                                    Field("Parameters", "/noui \\a.cab") + Field("Wait", "false")) +
+          Group("MulticastClient", Field("Parameters", "-UA=127.0.0.1 -up=5001 /HV=MR41")) +
+          Download("folder/a", "\\a.rename", "MR* TQ*")))),
+      IsEmpty());
+}
+
+TEST(LintTest, FindsWhatEachRuleIsAbout) {
+  std::set<std::string> seen;
+  for (const auto& cases : {CasesOfTheWalk(), CasesOfTheDevice(), CasesOfFilesAndCleanup()}) {
+    for (const LintCase& c : cases) {
+      const Findings findings = LintText(c.job);
+      EXPECT_THAT(Ids(findings), Contains(c.id)) << c.job;
+      seen.insert(c.id);
+      for (const Finding& finding : findings.all()) {
+        if (RowOf(finding.rule).id != c.id) continue;
+        EXPECT_THAT(finding.found, HasSubstr(c.found));
+        EXPECT_EQ(finding.where, "job.xml:1");
+      }
+    }
+  }
+  // The rules about the server's files have tests of their own, below.
+  for (const char* id : {"list-missing", "list-crc", "list-shift", "list-zero-byte",
+                         "list-field-long", "size-number", "file-missing", "file-crc", "file-size",
+                         "size-short", "size-reserve", "file-unlisted"}) {
+    seen.insert(id);
+  }
+  for (std::size_t i = 0; i < static_cast<std::size_t>(Rule::kCount); ++i) {
+    const RuleRow& rule = RowOf(static_cast<Rule>(i));
+    EXPECT_EQ(seen.count(rule.id), 1U) << rule.id << " has no case";
+    EXPECT_STRNE(rule.device, "");
+    EXPECT_STRNE(rule.fix, "");
+  }
+}
+
+TEST(LintTest, NamesTheLineAndKeepsWhatFitsAsTheDeviceDoes) {
+  const Findings findings =
+      LintText("<Group Name='Orvenix'>\n<Group Name='Upgrade'>\n" + kServer + kStore + kList +
+               "\n" + Group("StartProcess", "\n" + Field("Process", "a") + Field("Wait", "FALSE")) +
+               "</Group></Group>");
+
+  ASSERT_EQ(findings.all().size(), 1U);
+  EXPECT_EQ(findings.all()[0].where, "job.xml:5");
+}
+
+/// A served folder with a list file and what its list names.
+class LintServedTest : public ::testing::Test {
+ protected:
+  Findings LintList(const std::string& list, const std::string& crc = "", bool unlisted = false) {
+    scratch_.Write("bundle.lst", list);
+    server::Site site(scratch_.path());
+    const std::string right = std::to_string(site.Open("bundle.lst")->crc32());
+    return LintText(
+        Upgrade(kServer + kStore +
+                Group("FileList", Field("Source", "bundle.lst") + Field("Dest", "\\bundle.lst") +
+                                      Field("CRC", crc.empty() ? right : crc))),
+        &site, unlisted);
+  }
+
+  ScratchFolder scratch_;
+};
+
+constexpr const char* kHello = "a.txt,\\a.txt,*,909783072,6\r\n";  // "hello\n"
+
+TEST_F(LintServedTest, FindsNothingInAListWhoseFilesAreServed) {
+  scratch_.Write("a.txt", "hello\n");
+  scratch_.Write("sub/empty", "");
+
+  EXPECT_THAT(Ids(LintList(kHello, "", true)), ElementsAre("file-unlisted"));
+  EXPECT_THAT(Ids(LintList(std::string(kHello) + "sub\\empty,\\e,*,1,0\r\n", "", true)), IsEmpty());
+  EXPECT_THAT(Ids(LintList(kHello)), IsEmpty()) << "other files may lie in a served folder";
+}
+
+TEST_F(LintServedTest, ComparesTheListWithWhatIsServed) {
+  scratch_.Write("a.txt", "hello\n");
+  scratch_.Write("b.txt", "world\n");
+
+  EXPECT_THAT(Ids(LintList(kHello, "5")), ElementsAre("list-crc"));
+  EXPECT_THAT(Ids(LintList("c.txt,\\c,*,5,6\r\n")), ElementsAre("file-missing"));
+  EXPECT_THAT(Ids(LintList("A.txt,\\a,*,909783072,6\r\n")), ElementsAre("file-missing"))
+      << "letter case";
+  EXPECT_THAT(Ids(LintList("b.txt,\\b,*,909783072,6\r\n")), ElementsAre("file-crc"));
+  EXPECT_THAT(Ids(LintList("a.txt,\\a,*,909783072,5\r\n")),
+              ElementsAre("file-size", "size-reserve"));
+  EXPECT_THAT(Ids(LintList("a.txt,\\a,*,909783072,six\r\n")),
+              ElementsAre("size-number", "file-size"));
+  EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\b,*,909783072,6\r\n")),
+              ElementsAre("size-short"));
+  EXPECT_THAT(Ids(LintList("../a.txt,\\a,*,909783072,6\r\n")), ElementsAre("file-missing"));
+}
+
+TEST_F(LintServedTest, ReadsTheListAsTheDeviceDoes) {
+  scratch_.Write("a.txt", "hello\n");
+
+  const Findings shifted = LintList(std::string(kHello) + "a.txt,\\b,,909783072,6\r\nx\r\n");
+  EXPECT_THAT(Ids(shifted), ElementsAre("list-shift"));
+  EXPECT_EQ(shifted.all()[0].where, "bundle.lst:2");
+  EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\b,*,909783072\r\n")),
+              ElementsAre("list-shift"));
+  EXPECT_THAT(Ids(LintList(kHello + std::string("\0a.txt", 6))), ElementsAre("list-zero-byte"));
+  EXPECT_THAT(Ids(LintList(kHello + std::string(260, 'p') + ",\\b,*,5,6\r\n")),
+              ElementsAre("list-field-long"));
+  EXPECT_THAT(Ids(LintList("\r\n\n" + std::string(kHello) + "\n")), IsEmpty());
+  EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\A.TXT,*,909783072,0\r\n")),
+              ElementsAre("duplicate-destination", "file-size"));
+}
+
+TEST_F(LintServedTest, MissesTheListItself) {
+  server::Site site(scratch_.path());
+
+  EXPECT_THAT(Ids(LintText(With(""), &site)), ElementsAre("list-missing"));
+}
+
+TEST_F(LintServedTest, TakesAnyBytesAsAList) {
+  std::string bytes = kHello;
+  for (int i = 0; i < 3000; ++i) bytes += static_cast<char>(i * 37 % 256);
+
+  EXPECT_GE(LintList(bytes).all().size(), 1U);
+  EXPECT_THAT(Ids(LintList("")), ElementsAre("size-reserve"));
+}
+
+TEST(LintOutputTest, GroupsFindingsByRuleWithTheWorstFirst) {
+  std::string tests;
+  for (int i = 0; i < 7; ++i) tests += GoodTestWithout("Type");
+  const Findings findings = LintText(With(tests + Field("EndText", "Done")));
+
+  std::ostringstream out;
+  PrintFindings(out, "job.xml", findings);
+
+  EXPECT_EQ(
+      out.str(),
+      "job.xml: 7 errors, 1 warning\n"
+      "\nerror  test-no-type\n"
+      "  job.xml:1  the test of \"V\" has no Type\n"
+      "  job.xml:1  the test of \"V\" has no Type\n"
+      "  job.xml:1  the test of \"V\" has no Type\n"
+      "  job.xml:1  the test of \"V\" has no Type\n"
+      "  job.xml:1  the test of \"V\" has no Type\n"
+      "  and 2 more\n"
+      "  device: presets the type \"String\", which names no registry type: the test always "
+      "fails\n"
+      "  fix:    add Type REG_SZ or REG_DWORD\n"
+      "\nwarning  end-without-begin\n"
+      "  job.xml:1  EndText is \"Done\"\n"
+      "  device: ends with \"Upgrade Complete\": the end text is used only with a begin text\n"
+      "  fix:    add a BeginText, or leave the EndText out\n");
+}
+
+TEST(LintOutputTest, TellsTheSameInJson) {
+  const auto json = FindingsJson("job.xml", LintText(Upgrade(kServer + kList)));
+
+  EXPECT_EQ(json.at("event"), "linted");
+  EXPECT_EQ(json.at("errors"), 1);
+  EXPECT_EQ(json.at("warnings"), 0);
+  const auto& finding = json.at("findings").at(0);
+  EXPECT_EQ(finding.at("id"), "no-storage");
+  EXPECT_EQ(finding.at("level"), "error");
+  EXPECT_EQ(finding.at("where"), "job.xml:1");
+  EXPECT_THAT(finding.at("device").get<std::string>(), HasSubstr("0xC4111002"));
+}
+
+TEST(LintOutputTest, NamesTheRulesOfARefusedJob) {
+  const Findings findings = LintText(Upgrade(kList + Group("Syslog", Field("Port", "514"))));
+
+  try {
+    RefuseErrors("job.xml", findings, "mend them");
+    FAIL() << "the job has errors";
+  } catch (const Failure& failure) {
+    EXPECT_EQ(failure.code(), ExitCode::kBadInput);
+    EXPECT_STREQ(
+        failure.what(),
+        "job.xml: 3 errors in the job: no-storage, syslog-address, url-missing; mend them");
+  }
+}
+
+}  // namespace
+}  // namespace tools
