@@ -77,6 +77,7 @@ int RunCommandLine(int argc, char** argv) {
   AddServeVerb(app, action);
   AddDeviceVerb(app, action);
   AddRunVerb(app, action);
+  AddExplainVerb(app, action);
   try {
     RefuseUnknownVerb(app, argc, argv);
     app.parse(argc, argv);

@@ -23,7 +23,7 @@ TEST_F(CommandLineTest, ListsItsVerbsAndExitCodes) {
   const Ended help = Run("--help");
 
   EXPECT_EQ(help.code, 0);
-  for (const char* verb : {"bundle", "serve", "device", "run"}) {
+  for (const char* verb : {"bundle", "job", "serve", "device", "run", "explain"}) {
     EXPECT_THAT(help.output, HasSubstr(std::string("  ") + verb + " ")) << verb;
   }
   for (const ExitCodeRow& row : kExitCodes) {
@@ -43,8 +43,8 @@ TEST_F(CommandLineTest, HasTheExitCodesThatItsDocumentLists) {
 }
 
 TEST_F(CommandLineTest, ShowsAnExampleForEveryVerb) {
-  for (const char* verb :
-       {"bundle make", "serve", "device new", "device show", "device screen", "run"}) {
+  for (const char* verb : {"bundle make", "job lint", "serve", "device new", "device show",
+                           "device screen", "run", "explain"}) {
     const Ended help = Run(std::string(verb) + " --help");
     EXPECT_EQ(help.code, 0) << verb;
     EXPECT_THAT(help.output, HasSubstr("Example:\n  orvenix " + std::string(verb))) << verb;
@@ -80,6 +80,17 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
       {"run nowhere.xml --device d", ExitCode::kBadInput, "nowhere.xml: there is no such file"},
       {"run errors.txt --device d", ExitCode::kBadInput, "errors.txt:1: not well-formed XML"},
       {"run nowhere.xml", ExitCode::kUsage, "--device is required"},
+      {"job", ExitCode::kUsage, "subcommand is required"},
+      {"job lint nowhere.xml", ExitCode::kBadInput, "nowhere.xml: there is no such file"},
+      {"job lint .", ExitCode::kBadInput, ".: there is no job.xml in the folder"},
+      {"job lint errors.txt", ExitCode::kBadInput, "errors.txt:1: not well-formed XML"},
+      {"job lint errors.txt --bundle nowhere", ExitCode::kBadInput,
+       "nowhere: there is no such bundle"},
+      {"explain", ExitCode::kUsage, "WHAT is required"},
+      {"explain 4000000000", ExitCode::kBadInput, "the system has no such number"},
+      {"explain nonsense", ExitCode::kBadInput, "is no file, no number and no text of the system"},
+      {"explain ./nowhere.log", ExitCode::kBadInput, "./nowhere.log: there is no such file"},
+      {"explain errors.txt", ExitCode::kBadInput, "errors.txt: holds no line of this system"},
       {"serve . --address elsewhere", ExitCode::kCannotListen, "elsewhere:8080: "},
   };
   for (const MistakeCase& c : kCases) {
@@ -111,6 +122,54 @@ TEST_F(CommandLineTest, MakesABundle) {
   EXPECT_EQ(json.at("files"), 1);
   EXPECT_EQ(json.at("bytes"), 5);
   EXPECT_EQ(ReadWholeFile(scratch_.path() / "out/tree/bundle/with blank.txt"), "12345");
+}
+
+TEST_F(CommandLineTest, ChecksABundleBeforeItIsSent) {
+  scratch_.Write("files/a.txt", "12345");
+  ASSERT_EQ(Run("bundle make files out").code, 0);
+
+  const Ended good = Run("job lint out");
+  EXPECT_EQ(good.code, 0) << good.errors;
+  EXPECT_EQ(good.output, "out/job.xml: nothing found\n");
+
+  scratch_.Write("out/tree/bundle/a.txt", "54321");
+  const Ended bad = Run("job lint out/job.xml --json");
+  EXPECT_EQ(bad.code, 3);
+  EXPECT_THAT(bad.errors, HasSubstr("out/job.xml: 1 error in the job: file-crc; mend them"));
+  const auto json = nlohmann::json::parse(bad.output.substr(0, bad.output.find('\n')));
+  EXPECT_EQ(json.at("event"), "linted");
+  EXPECT_EQ(json.at("findings").at(0).at("where"), "bundle.lst:1");
+
+  EXPECT_EQ(Run("job lint out/job.xml --bundle out").code, 3);
+  scratch_.Write("alone.xml", ReadWholeFile(scratch_.path() / "out/job.xml"));
+  EXPECT_EQ(Run("job lint alone.xml").code, 0) << "there is no server to look at";
+  EXPECT_EQ(Run("job lint alone.xml --bundle out/tree").code, 3);
+  EXPECT_THAT(Run("serve out").errors, HasSubstr("serve it all the same with --force"));
+}
+
+TEST_F(CommandLineTest, ExplainsCodesTextsAndLogs) {
+  const Ended code = Run("explain 0xC4111002");
+  EXPECT_EQ(code.code, 0) << code.errors;
+  EXPECT_EQ(
+      code.output,
+      "3289452546 = 0xC4111002 = -1005514750\n\nresult  no-space\n"
+      "  the last storage requirement of the job is not met, or the job has none\n"
+      "  remedy: make room on the device, lower RequiredSpace, or add a storage requirement\n");
+  EXPECT_EQ(Run("explain -- -1005514750").output, code.output);
+  EXPECT_EQ(
+      nlohmann::json::parse(Run("explain 10061 --json").output).at("meanings").at(0).at("name"),
+      "WSAECONNREFUSED");
+
+  const Ended text = Run("explain 'Orvenix - CSocketIO::Connect - Error !10061%'");
+  EXPECT_THAT(text.output, HasSubstr("WSAECONNREFUSED: no server listens"));
+  EXPECT_THAT(Run("explain 'No MCT on device'").output, HasSubstr("a line of the screen"));
+  EXPECT_EQ(nlohmann::json::parse(Run("explain 'Orvenix - good CRC' --json").output).at("where"),
+            "log");
+
+  scratch_.Write("log", "Orvenix thread - Started\r\nOrvenix - UpgradeThread - Exiting\r\n");
+  EXPECT_THAT(Run("explain log").output, HasSubstr("outcome  complete"));
+  EXPECT_EQ(nlohmann::json::parse(Run("explain log --json").output).at("outcome"), "complete");
+  EXPECT_EQ(Run("explain log --job 2").code, 3);
 }
 
 using ServeTest = ServerProcessTest;

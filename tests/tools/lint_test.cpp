@@ -11,6 +11,7 @@
 #include "server/scratch_folder.h"
 #include "server/site.h"
 #include "tools/failure.h"
+#include "tools/file_text.h"
 #include "tools/job_file.h"
 
 namespace tools {
@@ -251,6 +252,18 @@ TEST(LintTest, FindsWhatEachRuleIsAbout) {
   }
 }
 
+TEST(LintTest, HasTheRulesThatItsDocumentLists) {
+  const std::string document = ReadWholeFile(ORVENIX_LINT_DOCUMENT);
+  std::string table = "|---|---|---|\n";
+  for (std::size_t i = 0; i < static_cast<std::size_t>(Rule::kCount); ++i) {
+    const RuleRow& rule = RowOf(static_cast<Rule>(i));
+    table +=
+        std::string("| ") + rule.id + " | " + NameOf(rule.level) + " | " + rule.device + " |\n";
+  }
+
+  EXPECT_THAT(document, HasSubstr(table));
+}
+
 TEST(LintTest, NamesTheLineAndKeepsWhatFitsAsTheDeviceDoes) {
   const Findings findings =
       LintText("<Group Name='Orvenix'>\n<Group Name='Upgrade'>\n" + kServer + kStore + kList +
@@ -304,7 +317,8 @@ TEST_F(LintServedTest, ComparesTheListWithWhatIsServed) {
               ElementsAre("size-number", "file-size"));
   EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\b,*,909783072,6\r\n")),
               ElementsAre("size-short"));
-  EXPECT_THAT(Ids(LintList("../a.txt,\\a,*,909783072,6\r\n")), ElementsAre("file-missing"));
+  EXPECT_THAT(Ids(LintList("../a.txt,\\a,*,909783072,6\r\n")),
+              ElementsAre("path-leading", "file-missing"));
 }
 
 TEST_F(LintServedTest, ReadsTheListAsTheDeviceDoes) {

@@ -116,7 +116,12 @@ TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
 
   job.replace(job.find("HTTPServer"), 10, "HTTPSender");
   scratch_.Write("unknown.xml", job);
-  const Ended unknown = Run("run unknown.xml --device device");
+  const Ended linted = Run("run unknown.xml --device device --json");
+  EXPECT_EQ(linted.code, static_cast<int>(ExitCode::kBadInput));
+  EXPECT_EQ(Events(linted.output).at(0).at("findings").at(0).at("id"), "unknown-group");
+  EXPECT_THAT(linted.errors,
+              HasSubstr("1 error in the job: unknown-group; see 'orvenix job lint'"));
+  const Ended unknown = Run("run unknown.xml --device device --force");
   EXPECT_EQ(unknown.code, static_cast<int>(ExitCode::kUnknownName)) << unknown.errors;
   EXPECT_THAT(unknown.errors, HasSubstr("knows no group or field \"HTTPSender\""));
 }
