@@ -1,4 +1,4 @@
-// MultiByteToWideChar and WideCharToMultiByte.
+// Code pages and letter case.
 #include <algorithm>
 #include <climits>
 #include <cstring>
@@ -9,6 +9,7 @@
 #include "ce/system.h"
 #include "faults/api_call.h"
 #include "locale/code_pages.h"
+#include "text/names.h"
 
 namespace {
 
@@ -83,4 +84,11 @@ extern "C" int WideCharToMultiByte(UINT code_page, DWORD flags, const WCHAR* wid
   if (code_page != CP_UTF8 || defaults) return call.Fail(ERROR_INVALID_PARAMETER, 0);
   if (flags != 0) return call.Fail(ERROR_INVALID_FLAGS, 0);
   return Deliver(call, sim::ToUtf8(input), text, size);
+}
+
+extern "C" DWORD CharLowerBuffW(WCHAR* text, DWORD length) {
+  sim::ApiCall call("CharLowerBuffW", sim::kCannotFail);
+  call.Argument("length", length);
+  for (DWORD i = 0; i < length; ++i) text[i] = sim::FoldCase(text[i]);
+  return call.Return(length);
 }

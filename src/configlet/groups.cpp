@@ -142,8 +142,8 @@ IcfgResult BeginRegistry(Walk& walk, std::uint32_t /*mode*/) noexcept {
   return IcfgResult::kOk;
 }
 
-/// A test that could not be made is listed all the same, as null: the tests then fail with a
-/// reason.
+/// A test that could not be made is listed all the same, as null: the log then says that it is
+/// passed over.
 IcfgResult EndRegistry(Walk& walk) noexcept {
   const WalkLock lock;
   if (walk.open_job() != nullptr) {

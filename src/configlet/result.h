@@ -13,6 +13,7 @@ enum class IcfgResult : std::uint32_t {
   kUpgradeRunning = ICFG_UPGRADE_RUNNING,
   kNoSpace = ICFG_NO_SPACE,
   kNoPower = ICFG_NO_POWER,
+  kTestFailed = ICFG_TEST_FAILED,
 };
 
 }  // namespace configlet

@@ -8,7 +8,9 @@
 #include "configlet/walk.h"
 #include "device/handle.h"
 #include "report/log/log.h"
+#include "upgrade/cleanup.h"
 #include "upgrade/progress.h"
+#include "upgrade/registry_tests.h"
 #include "upgrade/run_state/run_state.h"
 #include "upgrade/storage_check.h"
 #include "upgrade/turn.h"
@@ -20,14 +22,18 @@ namespace {
 /// Gives the client time to fetch the report of a failure.
 constexpr DWORD kFailurePauseMs = 3000;
 
+/// What a job says when one of its tests fails.
+using FailureText = base::FixedText<256>;
+
 /// Why the job does not start.
-enum class Preflight : std::uint8_t { kReady, kPowerLow, kSpaceShort };
+enum class Preflight : std::uint8_t { kReady, kPowerLow, kTestFailed, kSpaceShort };
 
 /// No `default`: a reason added later does not compile until it has a code.
 constexpr IcfgResult ToResult(Preflight outcome) noexcept {
   switch (outcome) {
     case Preflight::kReady: return IcfgResult::kOk;
     case Preflight::kPowerLow: return IcfgResult::kNoPower;
+    case Preflight::kTestFailed: return IcfgResult::kTestFailed;
     case Preflight::kSpaceShort: return IcfgResult::kNoSpace;
   }
   return IcfgResult::kOk;  // not reached
@@ -55,16 +61,39 @@ void SetUpSyslog(const Walk& walk) noexcept {
   report::SetSyslogTarget(port, address.c_str());
 }
 
+<<<<<<< HEAD
 /// The job is held over the questions to the device's volumes: an upgrade thread that was started
 /// twice with it may be about to free it. A job that is gone needs no space; nothing will start.
+=======
+// The next three hold the lock for as long as they read the job, however many files are deleted
+// meanwhile: an upgrade thread that was started with the same job may be about to free it. Only
+// that thread ever waits for this, and nothing in here waits for it or calls the host.
+
+bool TestsPass(const Walk& walk, FailureText* failure) noexcept {
+  const WalkLock lock;
+  return walk.job == nullptr ||
+         upgrade::PerformTests(*walk.job, failure->data(), failure->capacity());
+}
+
+void CleanUp(const Walk& walk) noexcept {
+  const WalkLock lock;
+  if (walk.job != nullptr) upgrade::CleanUpDevice(*walk.job);
+}
+
+>>>>>>> 9c55c5b (Test the registry and clean the device before an upgrade touches it)
 bool HasSpace(const Walk& walk, std::uint32_t* total) noexcept {
   const WalkLock lock;
   return walk.job == nullptr || upgrade::CheckSpace(*walk.job, total);
 }
 
-Preflight Check(const Walk& walk) noexcept {
+/// @param failure  receives the message of a failed test
+Preflight Check(const Walk& walk, FailureText* failure) noexcept {
   if (!HasPower()) return Preflight::kPowerLow;
   SetUpSyslog(walk);
+  report::Log("Orvenix - PerformTests\r\n");
+  if (!TestsPass(walk, failure)) return Preflight::kTestFailed;
+  report::Log("Orvenix - Cleanup\r\n");
+  CleanUp(walk);
   report::Log("Orvenix - CheckSpace\r\n");
   std::uint32_t total = 0;
   if (!HasSpace(walk, &total)) return Preflight::kSpaceShort;
@@ -110,7 +139,8 @@ IcfgResult StartJob(Walk& walk) noexcept {
     upgrade::EndUpgrade();
     return IcfgResult::kOk;
   }
-  const Preflight outcome = Check(walk);
+  FailureText failure;
+  const Preflight outcome = Check(walk, &failure);
   if (outcome == Preflight::kReady) {
     StartThread(walk);
   } else {

@@ -1,50 +1,44 @@
 // Removing a folder with all it holds.
-#include <cstring>
-
-#include "base/format.h"
 #include "device/file.h"
+#include "device/tree_walk.h"
 
 namespace device {
 namespace {
 
-/// Room for a path one longer than the longest valid one, so that a path that does not fit is seen
-/// as too long instead of being cut into another valid one.
-using PathText = base::FixedText<File::kNameSize + 1>;
+using Step = TreeWalk::Step;
 
-bool IsDotName(std::string_view name) noexcept {
-  return name == "." || name == "..";
+void RemoveFile(const WCHAR* path) noexcept {
+  SetFileAttributesW(path, FILE_ATTRIBUTE_NORMAL);
+  DeleteFileW(path);
 }
 
-/// Removes what the search of `walk` has found. A path that does not fit is left alone.
-void RemoveFound(File& walk, std::string_view prefix) noexcept {
-  PathText path;
-  if (IsDotName(walk.found_name()) || !path.Assign(prefix) || !path.Append(walk.found_name())) {
-    return;
+bool RemoveFolder(const WCHAR* path) noexcept {
+  SetFileAttributesW(path, FILE_ATTRIBUTE_NORMAL);
+  return RemoveDirectoryW(path) != 0;
+}
+
+/// @return whether the first folder is gone, which is what the walk comes to last.
+bool RemoveAll(TreeWalk& walk) noexcept {
+  bool removed = false;
+  for (Step step = walk.Next(); step != Step::kEnd; step = walk.Next()) {
+    if (step == Step::kFile) RemoveFile(walk.path());
+    if (step == Step::kFolder) walk.Enter();
+    if (step == Step::kEndOfFolder) removed = RemoveFolder(walk.path());
   }
-  if (!walk.IsDirectory(walk.found())) {
-    walk.DeleteFile(path.c_str(), nullptr);
-    return;
-  }
-  if (!path.Append("\\*.*")) return;
-  // The folder below needs a search of its own, and deep trees must not fill the stack.
-  const LocalObject<File> below(new File);
-  if (below) below->RemoveDirectoryTree(path.c_str());
+  return removed;
 }
 
 }  // namespace
 
 bool File::RemoveDirectoryTree(const char* pattern) noexcept {
-  const std::string_view text = base::View(pattern);
-  const std::size_t star = text.find('*');
-  if (star == std::string_view::npos || star == 0) return false;
-  const std::string_view prefix = text.substr(0, star);
-  for (bool more = FindFirst(pattern); more; more = FindNext()) RemoveFound(*this, prefix);
-  FindClose();  // before the removal: a folder that is being searched stays
-
-  PathText folder;
-  if (!folder.Assign(prefix.substr(0, prefix.size() - 1))) return false;
-  SetAttributes(folder.c_str(), FILE_ATTRIBUTE_NORMAL);
-  return Note(RemoveDirectoryW(WideText<kNameSize>(folder.c_str()).c_str()) != 0);
+  WideText<kNameSize> wide;
+  if (!wide.Assign(pattern)) return false;
+  const std::size_t star = wide.view().find(TEXT('*'));
+  if (star == base::WideView::npos || star == 0) return false;
+  const LocalObject<TreeWalk> walk(new TreeWalk);
+  if (!walk) return Note(false);
+  const base::WideView prefix(wide.c_str(), star);
+  return Note(walk->Begin(wide.c_str(), prefix) && RemoveAll(*walk));
 }
 
 }  // namespace device

@@ -194,6 +194,13 @@ bool File::SetAttributes(const char* name, std::uint32_t mask) noexcept {
   return Note(wide && SetFileAttributesW(wide.c_str(), mask) != 0);
 }
 
+bool File::Exists(const char* name) noexcept {
+  const WideName wide(name);
+  WIN32_FIND_DATAW found;
+  const SearchHandle search(wide ? FindFirstFileW(wide.c_str(), &found) : INVALID_HANDLE_VALUE);
+  return Note(static_cast<bool>(search));
+}
+
 bool File::IsDirectory(const WIN32_FIND_DATAW& found) const noexcept {
   return (found.dwFileAttributes & FILE_ATTRIBUTE_DIRECTORY) != 0;
 }

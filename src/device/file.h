@@ -85,6 +85,8 @@ class File : public OnLocalHeap {
   /// @return the attribute mask, INVALID_FILE_ATTRIBUTES when there is no such file.
   virtual std::uint32_t GetAttributes(const char* name) noexcept;
   virtual bool SetAttributes(const char* name, std::uint32_t mask) noexcept;
+  /// Whether there is a file or folder of that name. Leaves an open search alone.
+  virtual bool Exists(const char* name) noexcept;
   [[nodiscard]] virtual bool IsDirectory(const WIN32_FIND_DATAW& found) const noexcept;
   /// Begins a search, ending an earlier one; the entry is found() and found_name().
   virtual bool FindFirst(const char* pattern) noexcept;
@@ -92,7 +94,7 @@ class File : public OnLocalHeap {
   /// @return false when no search is open.
   virtual bool FindClose() noexcept;
   virtual bool CreateDirectory(const char* name) noexcept;
-  /// Deletes a folder and all it holds, as far as that is possible.
+  /// Deletes a folder and all it holds, as far as that is possible, whatever the names in it are.
   /// @param pattern  the folder, a backslash and "*.*"; without a '*' nothing is done
   /// @return whether the folder itself is gone.
   virtual bool RemoveDirectoryTree(const char* pattern) noexcept;
@@ -107,6 +109,8 @@ class File : public OnLocalHeap {
   [[nodiscard]] const char* found_name() const noexcept { return found_name_.c_str(); }
 
   // ---- processes ----
+
+  // Names and parameters that are too long are refused.
 
   /// @param program  executable name; letter case counts
   /// @return the id of the first process of that name, 0 when there is none.

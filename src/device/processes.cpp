@@ -8,13 +8,13 @@ namespace {
 
 constexpr std::uint32_t kNotRun = 0xFFFFFFFFU;
 
+/// A program's name as the platform lists it.
+using ProgramName = WideText<File::kNameSize>;
 /// Room for the longest process parameters of a job.
 using CommandLine = WideText<300>;
 
-}  // namespace
-
-std::uint32_t File::FindProcess(const char* program) noexcept {
-  const WideText<kNameSize> name(program);
+/// @return the id of the first process of exactly this name, 0 when there is none.
+std::uint32_t FindByName(base::WideView name) noexcept {
   const SnapshotHandle snapshot(CreateToolhelp32Snapshot(TH32CS_SNAPPROCESS, 0));
   if (!snapshot) return 0;
   PROCESSENTRY32 entry = {};
@@ -22,19 +22,30 @@ std::uint32_t File::FindProcess(const char* program) noexcept {
   for (BOOL more = Process32First(snapshot.get(), &entry); more != 0;
        more = Process32Next(snapshot.get(), &entry)) {
     entry.szExeFile[MAX_PATH - 1] = 0;
-    if (name.view() == entry.szExeFile) return entry.th32ProcessID;
+    if (name == entry.szExeFile) return entry.th32ProcessID;
   }
   return 0;
 }
 
+}  // namespace
+
+std::uint32_t File::FindProcess(const char* program) noexcept {
+  // What does not fit is refused: cut, it could be the name of another program.
+  ProgramName name;
+  return name.Assign(program) && !name.empty() ? FindByName(name.view()) : 0;
+}
+
 std::uint32_t File::RunProcess(const char* program, const char* parameters,
                                std::uint32_t wait_ms) noexcept {
-  const WideText<kNameSize> name(program);
-  if (name.empty()) return kNotRun;
-  CommandLine command_line(parameters);
+  ProgramName name;
+  CommandLine command_line;
+  if (!name.Assign(program) || name.empty() || !command_line.Assign(parameters)) return kNotRun;
+  // The device ignores the record; other platforms insist on one.
+  STARTUPINFOW startup = {};
+  startup.cb = sizeof startup;
   PROCESS_INFORMATION started = {};
   if (!Note(CreateProcessW(name.c_str(), command_line.data(), nullptr, nullptr, FALSE, 0, nullptr,
-                           nullptr, nullptr, &started) != 0)) {
+                           nullptr, &startup, &started) != 0)) {
     return kNotRun;
   }
   const ProcessHandle process(started.hProcess);

@@ -67,7 +67,6 @@ bool FetchFile(Run& run, const char* source, const char* destination,
                OnFailedGet failed_get) noexcept {
   http::CHTTPClient* const client = http::CreateJobClient(run.job);
   if (client == nullptr) return false;
-  if (!IsRamName(destination)) CreateFolderOf(destination);
   const device::LocalBlock<std::uint8_t> buffer =
       device::LocalBlock<std::uint8_t>::Allocate(kTransferBuffer);
   if (!buffer) return false;
@@ -78,6 +77,8 @@ bool FetchFile(Run& run, const char* source, const char* destination,
   transfer.destination = destination;
   bool done = false;
   while (!done) {
+    // Before each attempt: a folder that could not be made once must not spoil all that follow.
+    if (!IsRamName(destination)) CreateFolderOf(destination);
     done = Attempt(*http::CreateJobClient(run.job), transfer, failed_get);
     ++run.fetch_attempt;
     client->Close();

@@ -26,6 +26,7 @@ void CountFiles(Run& run) noexcept {
   run.files_to_fetch = 0;
   for (const FirmwarePackage* package : run.job.FirmwarePackages()) {
     if (package == nullptr || !IsInPass(run.job, *package, run.pass)) continue;
+    // A negative count brings no part. The sum of huge ones wraps: it is for display only.
     if (package->count < 0) continue;
     run.files_to_fetch += package->count == 0 ? 1U : static_cast<std::uint32_t>(package->count);
   }

@@ -46,6 +46,7 @@ void AppendCommandLine(UpgradeConfig& job, const FirmwarePackage& package) noexc
 /// A package in numbered parts.
 bool FetchParts(Run& run, const FirmwarePackage& package, bool result) noexcept {
   const PackageTexts texts(package);
+  // A negative count, which only a damaged or hostile file holds, brings no part.
   const std::uint32_t parts = package.count < 0 ? 0 : static_cast<std::uint32_t>(package.count);
   if (parts > 0) AppendCommandLine(run.job, package);
   for (std::uint32_t part = 1; part <= parts; ++part) {

@@ -7,16 +7,22 @@
 namespace upgrade {
 namespace {
 
+std::atomic<std::uint32_t> announced_bytes{0};
 std::atomic<std::uint32_t> expected_bytes{0};
 std::atomic<std::uint32_t> received_bytes{0};
 
 }  // namespace
 
 void SetExpectedBytes(std::uint32_t bytes) noexcept {
-  expected_bytes.store(bytes, std::memory_order_relaxed);
+  announced_bytes.store(bytes, std::memory_order_relaxed);
 }
 
-void ResetReceivedBytes() noexcept {
+std::uint32_t AnnouncedBytes() noexcept {
+  return announced_bytes.load(std::memory_order_relaxed);
+}
+
+void BeginReceiving(std::uint32_t expected) noexcept {
+  expected_bytes.store(expected, std::memory_order_relaxed);
   received_bytes.store(0, std::memory_order_relaxed);
 }
 

@@ -5,12 +5,14 @@
 
 namespace upgrade {
 
-/// Sets the bytes that the job will bring, 0 when unknown. Called before the upgrade thread starts
-/// and outlives the job, because an outside caller of the thread never sets it.
+/// Announces the bytes that the job handed over next will bring, 0 when unknown. Stays until the
+/// next call: an outside caller of the upgrade thread never makes one. Host's thread.
 void SetExpectedBytes(std::uint32_t bytes) noexcept;
+[[nodiscard]] std::uint32_t AnnouncedBytes() noexcept;
 
-/// Forgets what an earlier job received.
-void ResetReceivedBytes() noexcept;
+/// Begins a job's way: nothing has come yet of `expected` bytes. A number of its own, because the
+/// host may announce the next job while this one runs. Upgrade thread.
+void BeginReceiving(std::uint32_t expected) noexcept;
 
 /// Counts a file that arrived and moves the overall bar. Upgrade thread.
 void AddReceivedBytes(std::uint32_t bytes) noexcept;

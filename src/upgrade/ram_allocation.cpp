@@ -37,6 +37,8 @@ void ReadRamAllocation(Run& run) noexcept {
   for (const FirmwarePackage* package : run.job.FirmwarePackages()) {
     if (package == nullptr || !IsInPass(run.job, *package, run.pass)) continue;
     const std::int32_t size = PackageRamSize(base::FieldView(package->additional_parameters));
+    // Any number but 0 says that there is an image; a negative or huge one, which only a damaged or
+    // hostile file holds, is the driver's to refuse.
     if (size == 0) continue;
     report::ShowStatus("RAMSIZE From parms = %d", size);
     run.os_image = true;

@@ -3,6 +3,7 @@
 #include <coredll.h>
 
 #include "device/lock.h"
+#include "upgrade/progress.h"
 
 namespace upgrade {
 namespace {
@@ -11,10 +12,8 @@ constexpr std::uint32_t kPlaces = 8;
 constexpr DWORD kLookEveryMs = 50;
 
 struct Place {
-  UpgradeConfig* job;
-  std::int32_t mode;
-  bool presented;
-  bool given_back;  ///< no thread will come for this number
+  Handover handed;
+  bool given_back = false;  ///< no thread will come for this number
 };
 
 // Numbers go up by one; 0 is none. The lock also orders what one job's thread did before what the
@@ -44,14 +43,14 @@ std::uint32_t TakeNumber(UpgradeConfig* job, std::int32_t mode) noexcept {
   const device::LockGuard guard(lock);
   const std::uint32_t number = last_taken + 1;
   if (number - serving >= kPlaces) return 0;
-  PlaceOf(number) = {job, mode, false, false};
+  PlaceOf(number) = {{job, mode, false, AnnouncedBytes()}, false};
   last_taken = number;
   return number;
 }
 
 void GiveNumberBack(std::uint32_t number) noexcept {
   const device::LockGuard guard(lock);
-  PlaceOf(number) = {nullptr, 0, false, true};
+  PlaceOf(number) = {Handover(), true};
   SkipNumbersGivenBack();
 }
 
@@ -67,19 +66,18 @@ bool AwaitTurn(std::uint32_t number, std::uint32_t timeout_ms) noexcept {
 
 Handover HandoverOf(std::uint32_t number) noexcept {
   const device::LockGuard guard(lock);
-  const Place& place = PlaceOf(number);
-  return {place.job, place.mode, place.presented};
+  return PlaceOf(number).handed;
 }
 
 void NotePresented(std::uint32_t number) noexcept {
   const device::LockGuard guard(lock);
-  PlaceOf(number).presented = true;
+  PlaceOf(number).handed.presented = true;
 }
 
 void ForgetJob(const UpgradeConfig* job) noexcept {
   const device::LockGuard guard(lock);
   for (Place& place : places) {
-    if (place.job == job) place.job = nullptr;
+    if (place.handed.job == job) place.handed.job = nullptr;
   }
 }
 

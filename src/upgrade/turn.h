@@ -13,9 +13,10 @@ namespace upgrade {
 
 /// What is kept about a job that was handed over.
 struct Handover {
-  UpgradeConfig* job = nullptr;  ///< null when a run before it has freed the job
-  std::int32_t mode = 0;         ///< 0: what multicast did not bring; else everything by HTTP
-  bool presented = false;        ///< the progress window has been opened for it
+  UpgradeConfig* job = nullptr;      ///< null when a run before it has freed the job
+  std::int32_t mode = 0;             ///< 0: what multicast did not bring; else everything by HTTP
+  bool presented = false;            ///< the progress window has been opened for it
+  std::uint32_t expected_bytes = 0;  ///< as announced when it was handed over
 };
 
 /// Takes a place behind the jobs that were handed over before. Any thread, as all of these.

@@ -10,6 +10,7 @@
 #include "orvenix/upgrade_thread.h"
 #include "report/log/log.h"
 #include "report/window/progress_window.h"
+#include "upgrade/cleanup.h"
 #include "upgrade/file_lists.h"
 #include "upgrade/keep_awake.h"
 #include "upgrade/memory_division.h"
@@ -17,6 +18,7 @@
 #include "upgrade/phases.h"
 #include "upgrade/progress.h"
 #include "upgrade/ram_allocation.h"
+#include "upgrade/registry_tests.h"
 #include "upgrade/run.h"
 #include "upgrade/run_state/run_state.h"
 #include "upgrade/storage_card.h"
@@ -57,21 +59,26 @@ class InProgressEvent {
   device::EventHandle event_;
 };
 
-/// Forgets what an earlier job counted. What this job is expected to bring was set before.
-void ResetCounters(std::int32_t mode) noexcept {
+/// Forgets what an earlier job counted.
+void ResetCounters(const Handover& handed) noexcept {
   http::BundleRx.store(0, std::memory_order_relaxed);
-  http::HttpFallback.store(mode == 0 ? 1 : 0, std::memory_order_relaxed);
-  ResetReceivedBytes();
+  http::HttpFallback.store(handed.mode == 0 ? 1 : 0, std::memory_order_relaxed);
+  BeginReceiving(handed.expected_bytes);
 }
 
 void PauseForTheEye(const UpgradeConfig& job) noexcept {
   if (job.GetShowGUI() == 1) Sleep(kPauseMs);
 }
 
-/// Everything by HTTP, for a caller from outside the configlet.
+/// Everything by HTTP, for a caller from outside the configlet: nobody has looked at the device
+/// before. Files are counted before it is cleaned, for which the INF file is fetched once more.
 void RunAsUpgradeClient(Run& run) noexcept {
   Log("UpgradeClient Mode...");
+  run.succeeded = PerformTests(run.job, run.error_text.data(), run.error_text.capacity());
+  if (!run.succeeded) return;
   CountFiles(run);
+  ShowStatus("Cleaning device...");
+  CleanUpDevice(run.job);
   SetMemoryDivision(0.9);
   ReadRamAllocation(run);
   Log("Processing OS files...");
@@ -154,9 +161,10 @@ void FreeJob(UpgradeConfig* job) noexcept {
 }
 
 /// One job, from beginning to end.
-void RunJob(UpgradeConfig* job, std::int32_t mode) noexcept {
+void RunJob(const Handover& handed) noexcept {
+  UpgradeConfig* const job = handed.job;
   Run run(*job);
-  ResetCounters(mode);
+  ResetCounters(handed);
   configlet::WriteVersionFiles();
   report::SetSyslogTarget(job->GetSysLogPort(), job->GetSysLogIP());
   Log("Orvenix thread - Started\r\n");
@@ -164,7 +172,7 @@ void RunJob(UpgradeConfig* job, std::int32_t mode) noexcept {
   InProgressEvent in_progress;
   LightRequirement light;
   KeepAwake keep_awake;
-  CarryOut(run, mode);
+  CarryOut(run, handed.mode);
   ShowEnd();
   EndUpgrade();  // from here on the host may hand over the next job; it begins when this thread
                  // ends
@@ -195,7 +203,7 @@ DWORD WINAPI UpgradeThread(void* argument) {
   const Handover handed = HandoverOf(number);
   if (handed.job != nullptr) {
     if (!handed.presented) Present(*handed.job, handed.mode);
-    RunJob(handed.job, handed.mode);
+    RunJob(handed);
   } else {
     EndUpgrade();
   }

@@ -4,6 +4,7 @@
 #include <string>
 
 #include "ce/errors.h"
+#include "ce/files.h"
 #include "ce/kernel.h"
 #include "configlet/configlet_test.h"
 #include "power/power.h"
@@ -15,6 +16,7 @@ namespace {
 
 using ::testing::HasSubstr;
 using ::testing::Not;
+using ::testing::StartsWith;
 
 constexpr sim::Micros kPause = std::chrono::milliseconds(3000);
 
@@ -29,6 +31,34 @@ class StartUpTest : public ConfigletTest {
     Set("RequiredSpace", required_space);
     End("Store");
     Set("ShowGUI", "false");
+  }
+
+  /// Adds a test of the value that StoreSystem stores.
+  static void FillTest(const char* value, const char* message) {
+    Begin("Registry");
+    Set("Key", "Software\\Orvenix");
+    Set("ValueName", "System");
+    Set("Type", "REG_DWORD");
+    Set("Operator", "EQ");
+    Set("Value", value);
+    Set("ErrorMsg", message);
+    End("Registry");
+  }
+  static void StoreSystem(DWORD number) {
+    HKEY key = nullptr;
+    RegCreateKeyExW(HKEY_LOCAL_MACHINE, TEXT("Software\\Orvenix"), 0, nullptr, 0, KEY_ALL_ACCESS,
+                    nullptr, &key, nullptr);
+    RegSetValueExW(key, TEXT("System"), 0, REG_DWORD, reinterpret_cast<const BYTE*>(&number),
+                   sizeof number);
+    RegCloseKey(key);
+  }
+  static void FillCleanup(const char* path, const char* action) {
+    Begin("DiskCleanup");
+    Begin("File");
+    Set("Name", path);
+    Set("Action", action);
+    End("File");
+    End("DiskCleanup");
   }
 
   /// Ends "Upgrade". @return its result; `took` is the time that it took.
@@ -64,6 +94,90 @@ TEST_F(StartUpTest, StartsTheJobOnAThreadOfItsOwn) {
                                "Orvenix - StartUpgradeThread\r\n"));
   EXPECT_TRUE(AwaitTheEnd());
   EXPECT_THAT(Log(), HasSubstr("Orvenix - UpgradeThread - Exiting\r\n"));
+}
+
+// ---- the order of the checks ----
+
+TEST_F(StartUpTest, TestsCleansAndMeasuresInThisOrder) {
+  Fill();
+  ForgetLog();
+
+  EXPECT_EQ(EndUpgrade(), ICFG_OK);
+
+  EXPECT_THAT(Log(), StartsWith("Orvenix - PerformTests\r\nPerformTests - 0\r\n"
+                                "Orvenix - Cleanup\r\nOrvenix - CheckSpace\r\n"));
+  EXPECT_TRUE(AwaitTheEnd());
+}
+
+TEST_F(StartUpTest, TouchesNothingWhenATestFails) {
+  test::PutFile("\\Temp\\a.txt", "a");
+  Fill();
+  FillTest("7", "needs system 7");
+  FillCleanup("\\Temp", "Delete");
+  ForgetLog();
+
+  EXPECT_EQ(EndUpgrade(), ICFG_TEST_FAILED);
+
+  EXPECT_EQ(took(), kPause);
+  EXPECT_FALSE(upgrade::UpgradeInProgress());
+  EXPECT_TRUE(HasJob());
+  EXPECT_TRUE(test::Exists("\\Temp\\a.txt"));
+  EXPECT_THAT(Log(), StartsWith("Orvenix - PerformTests\r\nPerformTests - 1\r\n"
+                                "Orvenix - PerformTests - No such key\r\n"
+                                "Orvenix - PerformTests - failed test\r\nneeds system 7\r\n"));
+  EXPECT_THAT(Log(), Not(HasSubstr("Cleanup")));
+  EXPECT_EQ(Begin("Upgrade"), ICFG_OK) << "and a new attempt is accepted";
+}
+
+TEST_F(StartUpTest, FailsForATestWhoseTypeTheHostHasLeftOut) {
+  StoreSystem(7);
+  Fill();
+  Begin("Registry");
+  Set("Key", "Software\\Orvenix");
+  Set("ValueName", "System");
+  Set("Operator", "EQ");
+  Set("Value", "7");
+  End("Registry");
+  EXPECT_EQ(EndUpgrade(), ICFG_TEST_FAILED);
+}
+
+TEST_F(StartUpTest, CleansTheDeviceBeforeItMeasuresTheRoom) {
+  StoreSystem(7);
+  test::PutFile("\\Temp\\a.bin", std::string(1000000, 'a'));
+  ULARGE_INTEGER free_bytes = {};
+  ASSERT_TRUE(GetDiskFreeSpaceExW(TEXT("\\"), nullptr, nullptr, &free_bytes));
+  MEMORYSTATUS memory = {};
+  memory.dwLength = sizeof memory;
+  GlobalMemoryStatus(&memory);
+  Fill(std::to_string(free_bytes.QuadPart + memory.dwAvailPhys + 500000).c_str());
+  EXPECT_EQ(EndUpgrade(), ICFG_NO_SPACE);
+
+  FillTest("7", "");
+  FillCleanup("\\Temp", "Delete");
+  EXPECT_EQ(EndUpgrade(), ICFG_OK);
+
+  EXPECT_FALSE(test::Exists("\\Temp\\a.bin"));
+  EXPECT_TRUE(AwaitTheEnd());
+}
+
+TEST_F(StartUpTest, CleansTheDeviceAlsoWhenThereIsNoRoomThen) {
+  test::PutFile("\\Temp\\a.bin", "a");
+  Fill("2000000000");
+  FillCleanup("\\Temp\\a.bin", "Delete");
+  EXPECT_EQ(EndUpgrade(), ICFG_NO_SPACE);
+  EXPECT_FALSE(test::Exists("\\Temp\\a.bin"));
+}
+
+TEST_F(StartUpTest, NeitherTestsNorCleansWithoutPower) {
+  test::PutFile("\\Temp\\a.bin", "a");
+  Fill();
+  FillTest("7", "");
+  FillCleanup("\\Temp\\a.bin", "Delete");
+  device().power().SetStatus(0, 4, 1);
+  ForgetLog();
+  EXPECT_EQ(EndUpgrade(), ICFG_NO_POWER);
+  EXPECT_TRUE(test::Exists("\\Temp\\a.bin"));
+  EXPECT_THAT(Log(), Not(HasSubstr("PerformTests")));
 }
 
 TEST_F(StartUpTest, LeavesNothingBehind) {

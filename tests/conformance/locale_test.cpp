@@ -106,6 +106,23 @@ TEST(MultiByteToWideCharTest, TellsMalformedUtf8OnlyWhenAsked) {
   EXPECT_EQ(GetLastError(), DWORD{ERROR_NO_UNICODE_TRANSLATION});
 }
 
+// ---- CharLowerBuffW ----
+
+TEST(CharLowerBuffWTest, LowersLettersOfAllAlphabetsAndNothingBehindThem) {
+  WCHAR text[] = {'A', 'z', '1', '\\', 0xC4, 0xD7, 0x0416, 0, 'B', 'C'};
+
+  EXPECT_EQ(CharLowerBuffW(text, 9), 9U);
+
+  const WCHAR expected[] = {'a', 'z', '1', '\\', 0xE4, 0xD7, 0x0436, 0, 'b', 'C'};
+  for (std::size_t i = 0; i < 10; ++i) EXPECT_EQ(text[i], expected[i]) << i;
+}
+
+TEST(CharLowerBuffWTest, DoesNothingToNoCharacters) {
+  WCHAR text[] = {'A', 0};
+  EXPECT_EQ(CharLowerBuffW(text, 0), 0U);
+  EXPECT_EQ(text[0], WCHAR{'A'});
+}
+
 // ---- WideCharToMultiByte ----
 
 TEST(WideCharToMultiByteTest, PutsAQuestionMarkForWhatTheCodePageLacks) {

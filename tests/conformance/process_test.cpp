@@ -77,26 +77,35 @@ TEST(Process32FirstTest, FillsTheRecordAndNothingBehindIt) {
   CloseToolhelp32Snapshot(snapshot);
 }
 
+/// The record that some platforms insist on.
+STARTUPINFOW Startup() {
+  STARTUPINFOW startup = {};
+  startup.cb = sizeof startup;
+  return startup;
+}
+
 TEST(CreateProcessWTest, FailsForAProgramThatDoesNotExist) {
+  STARTUPINFOW startup = Startup();
   PROCESS_INFORMATION information;
   std::memset(&information, kPoisonByte, sizeof information);
   SetLastError(kPoison);
 
   EXPECT_FALSE(CreateProcessW(TEXT("\\none.exe"), nullptr, nullptr, nullptr, FALSE, 0, nullptr,
-                              nullptr, nullptr, &information));
+                              nullptr, &startup, &information));
 
   EXPECT_EQ(GetLastError(), DWORD{ERROR_FILE_NOT_FOUND});
   EXPECT_FALSE(CreateProcessW(nullptr, nullptr, nullptr, nullptr, FALSE, 0, nullptr, nullptr,
-                              nullptr, &information));
+                              &startup, &information));
 }
 
 TEST(CreateProcessWTest, GivesHandlesThatCanBeWaitedFor) {
   MakeProgram(TEXT("\\done.exe"));
   WCHAR command_line[] = TEXT("-x");
+  STARTUPINFOW startup = Startup();
   PROCESS_INFORMATION information = {};
 
   ASSERT_TRUE(CreateProcessW(TEXT("\\done.exe"), command_line, nullptr, nullptr, FALSE, 0, nullptr,
-                             nullptr, nullptr, &information));
+                             nullptr, &startup, &information));
 
   EXPECT_NE(information.dwProcessId, GetCurrentProcessId());
   EXPECT_EQ(WaitForSingleObject(information.hProcess, INFINITE), WAIT_OBJECT_0);

@@ -41,6 +41,43 @@ void WalkFiles(const HostJob& job) {
   IcfgEndGroup("Download", 0, 0);
 }
 
+void WalkTests(const HostJob& job) {
+  IcfgBeginGroup("Tests", 0, 0);
+  for (const HostTest& test : job.tests) {
+    IcfgBeginGroup("Registry", 0, 0);
+    Set("Key", test.key);
+    Set("ValueName", test.value_name);
+    Set("Type", test.type);
+    Set("Operator", test.operation);
+    Set("Value", test.value);
+    Set("ErrorMsg", test.message);
+    IcfgEndGroup("Registry", 0, 0);
+  }
+  IcfgEndGroup("Tests", 0, 0);
+}
+
+void WalkCleanup(const std::vector<std::string>& files, const char* action) {
+  IcfgBeginGroup("DiskCleanup", 0, 0);
+  for (const std::string& file : files) {
+    IcfgBeginGroup("File", 0, 0);
+    Set("Name", file);
+    Set("Action", action);
+    IcfgEndGroup("File", 0, 0);
+  }
+  IcfgEndGroup("DiskCleanup", 0, 0);
+}
+
+void WalkPreparation(const HostJob& job) {
+  if (!job.tests.empty()) WalkTests(job);
+  for (const std::string& program : job.stop) {
+    IcfgBeginGroup("StopProcess", 0, 0);
+    Set("Process", program);
+    IcfgEndGroup("StopProcess", 0, 0);
+  }
+  if (!job.cleared.empty()) WalkCleanup(job.cleared, "Delete");
+  if (!job.saved.empty()) WalkCleanup(job.saved, "Save");
+}
+
 }  // namespace
 
 std::uint32_t WalkJob(const HostJob& job) {
@@ -54,6 +91,7 @@ std::uint32_t WalkJob(const HostJob& job) {
   IcfgBeginGroup("HTTPServer", 0, 0);
   Set("BaseURL", job.base_url);
   IcfgEndGroup("HTTPServer", 0, 0);
+  WalkPreparation(job);
   WalkFiles(job);
   IcfgBeginGroup("StorageRequirements", 0, 0);
   IcfgBeginGroup("Store", 0, 0);

@@ -18,6 +18,15 @@ struct HostFile {
   std::string crc = "0";
 };
 
+struct HostTest {
+  std::string key;
+  std::string value_name;
+  std::string type;
+  std::string operation;
+  std::string value;
+  std::string message;
+};
+
 /// One job as a host sends it. Empty texts are not sent.
 struct HostJob {
   std::string base_url = "http://127.0.0.2";
@@ -28,6 +37,10 @@ struct HostJob {
   std::string syslog_port;
   std::string syslog_address;
   bool show_gui = true;
+  std::vector<HostTest> tests;
+  std::vector<std::string> stop;     ///< programs
+  std::vector<std::string> cleared;  ///< files and folders
+  std::vector<std::string> saved;
 };
 
 /// Walks all groups but "Upgrade"'s end. @return the result of beginning "Upgrade".

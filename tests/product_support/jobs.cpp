@@ -36,6 +36,11 @@ void SetFamily(UpgradeConfig& job, std::string_view family) {
   Put(FieldsOf(job).family, family);
 }
 
+void SetTypeAndFamily(UpgradeConfig& job, std::string_view type, std::string_view family) {
+  Put(FieldsOf(job).type, type);
+  Put(FieldsOf(job).family, family);
+}
+
 void SetMfgString(UpgradeConfig& job, std::string_view text) {
   Put(FieldsOf(job).manufacturing_string, text);
 }
@@ -66,6 +71,18 @@ void AddPackage(UpgradeConfig& job, const PackageOfJob& package) {
   Put(record->command_line, package.command_line);
   Put(record->additional_parameters, package.options);
   job.AddFirmwarePkg(record);
+}
+
+void AddTest(UpgradeConfig& job, const TestOfJob& test) {
+  auto* const record = NewRecord<tagRegistryTest>();
+  Put(record->root, test.root);
+  Put(record->key, test.key);
+  Put(record->value_name, test.value_name);
+  Put(record->type, test.type);
+  Put(record->operation, test.operation);
+  Put(record->value, test.value);
+  Put(record->error_message, test.message);
+  job.AddRegistryTest(record);
 }
 
 }  // namespace test

@@ -22,6 +22,7 @@ template struct ExposeFields<&UpgradeConfig::fields_>;
 void SetMultiPass(UpgradeConfig& job);
 void SetInf(UpgradeConfig& job, std::string_view source, std::string_view destination);
 void SetFamily(UpgradeConfig& job, std::string_view family);
+void SetTypeAndFamily(UpgradeConfig& job, std::string_view type, std::string_view family);
 void SetMfgString(UpgradeConfig& job, std::string_view text);
 
 struct FileOfJob {
@@ -45,5 +46,16 @@ struct PackageOfJob {
   std::string_view options;
 };
 void AddPackage(UpgradeConfig& job, const PackageOfJob& package);
+
+struct TestOfJob {
+  std::string_view root = "HKEY_LOCAL_MACHINE";
+  std::string_view key;
+  std::string_view value_name;
+  std::string_view type;
+  std::string_view operation;
+  std::string_view value;
+  std::string_view message;
+};
+void AddTest(UpgradeConfig& job, const TestOfJob& test);
 
 }  // namespace test

@@ -1,8 +1,10 @@
 // Upgrades that an outside program starts: everything by HTTP, in one or several passes.
 #include <gmock/gmock.h>
 
+#include "ce/errors.h"
 #include "ce/kernel.h"
 #include "faults/faults.h"
+#include "memory/memory.h"
 #include "orvenix/upgrade_thread.h"
 #include "product_support/jobs.h"
 #include "scenario/scenario_test.h"
@@ -142,6 +144,72 @@ TEST_F(UpgradeClientTest, LeavesTheJobWithTheCallerWhenThereIsNoThread) {
   ASSERT_TRUE(test::AwaitEndOfJobs(device()));
   EXPECT_EQ(test::HoldingsOf(device()), before);
   Run(NewJob());
+}
+
+/// Jobs that wait for one which asks for a file that the server does not have yet.
+class WaitingJobsTest : public UpgradeClientTest {
+ protected:
+  WaitingJobsTest() : first_(NewJob()) {
+    first_->AddDownloadFile(test::MakeFile({"late.bin", "\\late.bin"}));
+  }
+
+  static HANDLE Start(UpgradeConfig* job) { return StartUpgradeThread(job, 1); }
+  static void Hand(UpgradeConfig* job) {
+    HANDLE const thread = Start(job);
+    ASSERT_NE(thread, nullptr);
+    CloseHandle(thread);
+  }
+  void HandFirst() {
+    Hand(first_);
+    Sleep(5000);  // its thread is at its first file now and makes no threads any more
+  }
+  void LetTheFirstEnd() { server().Put("late.bin", "late"); }
+
+  /// A job that leaves a trace.
+  static UpgradeConfig* NewDeletingJob(const std::string& path) {
+    PutFile(path, "x");
+    UpgradeConfig* const job = NewJob();
+    job->AddFileDelete(path.c_str());
+    return job;
+  }
+
+ private:
+  UpgradeConfig* const first_;
+};
+
+TEST_F(WaitingJobsTest, RunOneAfterTheOtherAndTheNinthIsRefused) {
+  const test::Holdings before = test::HoldingsOf(device());
+  HandFirst();
+  for (int i = 2; i <= 8; ++i) Hand(NewDeletingJob("\\" + std::to_string(i) + ".txt"));
+  UpgradeConfig* const ninth = NewDeletingJob("\\9.txt");
+  EXPECT_EQ(Start(ninth), nullptr);
+  EXPECT_TRUE(test::Exists("\\2.txt")) << "the first still runs";
+
+  LetTheFirstEnd();
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+
+  for (int i = 2; i <= 8; ++i) EXPECT_FALSE(test::Exists("\\" + std::to_string(i) + ".txt")) << i;
+  EXPECT_TRUE(test::Exists("\\9.txt"));
+  Run(ninth);  // it stayed with the caller, who may try again
+  EXPECT_FALSE(test::Exists("\\9.txt"));
+  EXPECT_EQ(device().memory().bad_frees(), 0U);
+  EXPECT_LE(test::HoldingsOf(device()).handles, before.handles);
+}
+
+TEST_F(WaitingJobsTest, AreNotHeldUpByOneThatGotNoThread) {
+  HandFirst();
+  UpgradeConfig* const second = NewDeletingJob("\\2.txt");
+  device().faults().Add({"CreateThread", 1, 1, ERROR_NOT_ENOUGH_MEMORY});
+  EXPECT_EQ(Start(second), nullptr);
+  Hand(NewDeletingJob("\\3.txt"));
+
+  LetTheFirstEnd();
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+
+  EXPECT_TRUE(test::Exists("\\2.txt"));
+  EXPECT_FALSE(test::Exists("\\3.txt"));
+  Run(second);
+  EXPECT_FALSE(test::Exists("\\2.txt"));
 }
 
 }  // namespace

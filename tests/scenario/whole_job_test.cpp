@@ -9,6 +9,7 @@
 #include "memory/memory.h"
 #include "orvenix/configlet.h"
 #include "power/power.h"
+#include "report/window/window_state.h"
 #include "scenario/scenario_test.h"
 #include "window/screen.h"
 
@@ -73,6 +74,23 @@ TEST_F(WholeJobTest, RepairsTheDeviceAndReports) {
   EXPECT_TRUE(record.report->http_fallback);
   EXPECT_EQ(record.report->error, "");
   EXPECT_EQ(record.reports, 1U);
+}
+
+TEST_F(WholeJobTest, KeepsItsOwnBarWhenTheNextJobIsAnnounced) {
+  job_.files = {{"late.bin", "\\late.bin", "*", test::CrcText("late")}};
+  job_.required_space = "8";
+  Start(job_);
+  Sleep(20000);
+  HostJob next;
+  next.required_space = "1000000";
+  EXPECT_EQ(Start(next), ICFG_OK) << "it waits for its turn";
+
+  server().Put("late.bin", "late");
+  while (GetFile("\\late.bin") != "late") Sleep(100);
+  Sleep(1000);
+
+  EXPECT_EQ(report::window_state.overall_value.get(), report::kBarUnits / 2) << "4 of 8 bytes";
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
 }
 
 TEST_F(WholeJobTest, ShowsItsStepsOnTheScreen) {

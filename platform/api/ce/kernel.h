@@ -50,7 +50,28 @@ struct PROCESS_INFORMATION {
   DWORD dwProcessId;
   DWORD dwThreadId;
 };
-struct STARTUPINFOW;
+
+/// How a program's first window should appear. The device takes the record and looks at none of it.
+struct STARTUPINFOW {
+  DWORD cb;
+  WCHAR* lpReserved;
+  WCHAR* lpDesktop;
+  WCHAR* lpTitle;
+  DWORD dwX;
+  DWORD dwY;
+  DWORD dwXSize;
+  DWORD dwYSize;
+  DWORD dwXCountChars;
+  DWORD dwYCountChars;
+  DWORD dwFillAttribute;
+  DWORD dwFlags;
+  WORD wShowWindow;
+  WORD cbReserved2;
+  BYTE* lpReserved2;
+  HANDLE hStdInput;
+  HANDLE hStdOutput;
+  HANDLE hStdError;
+};
 
 inline constexpr DWORD PROCESS_TERMINATE = 1;
 inline constexpr DWORD PROCESS_ALL_ACCESS = 0x1F0FFF;

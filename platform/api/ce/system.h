@@ -161,4 +161,6 @@ int MultiByteToWideChar(UINT code_page, DWORD flags, const char* text, int lengt
                         int size);
 int WideCharToMultiByte(UINT code_page, DWORD flags, const WCHAR* wide, int length, char* text,
                         int size, const char* default_char, BOOL* used_default);
+/// Puts `length` characters into lower case where they stand. @return `length`.
+DWORD CharLowerBuffW(WCHAR* text, DWORD length);
 }

@@ -1,10 +1,13 @@
 #include <gmock/gmock.h>
 
+#include <filesystem>
 #include <optional>
 #include <string>
 
 #include "device/file.h"
 #include "faults/faults.h"
+#include "kernel/kernel.h"
+#include "storage/storage.h"
 #include "support/device_files.h"
 #include "support/device_test.h"
 
@@ -288,71 +291,41 @@ TEST_F(FileTest, ClosesWhatItHoldsWhenItEnds) {
   EXPECT_TRUE(file_.OpenFile("\\a.txt", true));
 }
 
-TEST_F(FileTest, RemovesATreeWithItsReadOnlyFilesAndTheFolderItself) {
-  PutFile("\\Temp\\one.txt", "1");
-  PutFile("\\Temp\\Sub\\Deeper\\two.txt", "2");
-  PutFile("\\Temp\\Sub\\three.txt", "3");
-  SetAttributesOf("\\Temp\\Sub\\three.txt", FILE_ATTRIBUTE_READONLY);
-  ASSERT_TRUE(file_.CreateDirectory("\\Temp\\Empty"));
-  PutFile("\\Temporary.txt", "stays");
-
-  EXPECT_TRUE(file_.RemoveDirectoryTree("\\Temp\\*.*"));
-
-  EXPECT_FALSE(Exists("\\Temp"));
-  EXPECT_TRUE(Exists("\\Temporary.txt"));
+TEST_F(FileTest, ExistsWhenThereIsAFileOrFolderOfThatName) {
+  PutFile("\\Temp\\a.txt", "a");
+  for (const char* path : {"\\Temp\\a.txt", "\\TEMP", "\\Temp\\*.txt"}) {
+    EXPECT_TRUE(file_.Exists(path)) << path;
+  }
+  const std::string longest = "\\" + std::string(260, 'x');
+  for (const char* path : {"\\Temp\\b.txt", "\\None\\a.txt", "", "\\", "\\Temp\\*.bin",
+                           static_cast<const char*>(nullptr), longest.c_str()}) {
+    EXPECT_FALSE(file_.Exists(path)) << base::View(path);
+  }
 }
 
-TEST_F(FileTest, RemovesAnEmptyFolder) {
-  ASSERT_TRUE(file_.CreateDirectory("\\Empty"));
-  EXPECT_TRUE(file_.RemoveDirectoryTree("\\Empty\\*.*"));
-  EXPECT_FALSE(Exists("\\Empty"));
+TEST_F(FileTest, LeavesItsSearchOpenWhenItLooksForAName) {
+  PutFile("\\Temp\\a.txt", "a");
+  PutFile("\\Temp\\b.txt", "b");
+  ASSERT_TRUE(file_.FindFirst("\\Temp\\*.*"));
+  const std::size_t before = device().kernel().OpenHandles();
+  EXPECT_TRUE(file_.Exists("\\Temp\\b.txt"));
+  EXPECT_STREQ(file_.found_name(), "a.txt");
+  EXPECT_TRUE(file_.FindNext());
+  EXPECT_EQ(device().kernel().OpenHandles(), before);
 }
 
-TEST_F(FileTest, GoesOnAfterAFileThatCannotBeDeleted) {
-  PutFile("\\Temp\\a.txt", "1");
-  PutFile("\\Temp\\b.txt", "2");
-  PutFile("\\Temp\\c.txt", "3");
-  File holder;
-  ASSERT_TRUE(holder.OpenForWriting("\\Temp\\b.txt", true, 0));
-
-  EXPECT_FALSE(file_.RemoveDirectoryTree("\\Temp\\*.*"));
-
-  EXPECT_FALSE(Exists("\\Temp\\a.txt"));
-  EXPECT_TRUE(Exists("\\Temp\\b.txt"));
-  EXPECT_FALSE(Exists("\\Temp\\c.txt"));
-}
-
-TEST_F(FileTest, EmptiesTheRootAndFailsToRemoveIt) {
-  PutFile("\\a.txt", "1");
-  PutFile("\\Temp\\b.txt", "2");
-  EXPECT_FALSE(file_.RemoveDirectoryTree("\\*.*"));
-  EXPECT_FALSE(Exists("\\a.txt"));
-  EXPECT_FALSE(Exists("\\Temp"));
-}
-
-TEST_F(FileTest, RemovesNothingWithoutAPattern) {
-  PutFile("\\Temp\\a.txt", "1");
-  EXPECT_FALSE(file_.RemoveDirectoryTree("\\Temp"));
-  EXPECT_FALSE(file_.RemoveDirectoryTree("*.*"));
-  EXPECT_FALSE(file_.RemoveDirectoryTree(nullptr));
-  EXPECT_TRUE(Exists("\\Temp\\a.txt"));
-}
-
-TEST_F(FileTest, RemovesDeepTreesWithoutNeedingStack) {
-  std::string path;
-  for (int depth = 0; depth < 100; ++depth) path += "\\d";
-  PutFile(path + "\\file.txt", "x");
-  EXPECT_TRUE(file_.RemoveDirectoryTree("\\d\\*.*"));
-  EXPECT_FALSE(Exists("\\d"));
-}
-
-TEST_F(FileTest, SkipsAFolderItHasNoMemoryToSearch) {
-  PutFile("\\Temp\\Sub\\a.txt", "1");
-  PutFile("\\Temp\\b.txt", "2");
-  device().faults().Add({"LocalAlloc", 1, 0, ERROR_OUTOFMEMORY});
-  EXPECT_FALSE(file_.RemoveDirectoryTree("\\Temp\\*.*"));
-  EXPECT_FALSE(Exists("\\Temp\\b.txt"));
-  EXPECT_TRUE(Exists("\\Temp\\Sub\\a.txt"));
+TEST_F(FileTest, KnowsTheOneSizeThatLooksLikeAFailure) {
+  PutFile("\\a.bin", "");
+  std::filesystem::resize_file(device().storage().HostPath(TEXT("\\a.bin")).value(), 0xFFFFFFFFU);
+  ASSERT_TRUE(file_.OpenForReading("\\a.bin", true));
+  std::uint32_t size = 0;
+  SetLastError(ERROR_GEN_FAILURE);
+  EXPECT_TRUE(file_.GetSize(&size));
+  EXPECT_EQ(size, 0xFFFFFFFFU);
+  EXPECT_EQ(file_.last_error(), 0U);
+  file_.Close();
+  EXPECT_FALSE(file_.GetSize(&size));
+  EXPECT_EQ(size, 0U);
 }
 
 }  // namespace

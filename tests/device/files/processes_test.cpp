@@ -1,7 +1,12 @@
+#include "process/processes.h"
+
 #include <gtest/gtest.h>
+
+#include <string>
 
 #include "device/file.h"
 #include "faults/faults.h"
+#include "kernel/kernel.h"
 #include "support/device_test.h"
 
 namespace device {
@@ -60,6 +65,33 @@ TEST_F(ProcessesTest, GiveAllBitsSetWhenNothingWasRun) {
   EXPECT_EQ(file_.RunProcess("", "-a", INFINITE), 0xFFFFFFFFU);
   EXPECT_EQ(file_.RunProcess(nullptr, nullptr, INFINITE), 0xFFFFFFFFU);
   EXPECT_EQ(file_.RunProcess("unknown.exe", "", INFINITE), 0xFFFFFFFFU);
+}
+
+TEST_F(ProcessesTest, AreNotTakenForThoseWhoseNamesBeginAlike) {
+  const std::string longest(259, 'p');
+  device().processes().Add(std::u16string(longest.begin(), longest.end()));
+  EXPECT_NE(file_.FindProcess(longest.c_str()), 0U);
+  const std::string longer = longest + "q";
+  EXPECT_EQ(file_.FindProcess(longer.c_str()), 0U);
+  EXPECT_FALSE(file_.StopProcess(longer.c_str()));
+  EXPECT_EQ(file_.RunProcess(longer.c_str(), "", INFINITE), 0xFFFFFFFFU);
+  EXPECT_TRUE(file_.StopProcess(longest.c_str()));
+}
+
+TEST_F(ProcessesTest, AreNotRunWithParametersThatDoNotFit) {
+  EXPECT_EQ(file_.RunProcess("quick.exe", std::string(300, 'x').c_str(), INFINITE), 0xFFFFFFFFU);
+  EXPECT_TRUE(device().processes().Launches().empty());
+  EXPECT_EQ(file_.RunProcess("quick.exe", std::string(299, 'x').c_str(), INFINITE), WAIT_OBJECT_0);
+  EXPECT_EQ(device().processes().Launches().front().command_line, std::string(299, 'x'));
+}
+
+TEST_F(ProcessesTest, LeaveNoHandlesOpen) {
+  const std::size_t before = device().kernel().OpenHandles();
+  file_.RunProcess("quick.exe", "", 100);
+  file_.StopProcess("Scanner.exe");
+  device().faults().Add({"TerminateProcess", 1, 1, 0});
+  file_.StopProcess("Scanner.exe");
+  EXPECT_EQ(device().kernel().OpenHandles(), before);
 }
 
 }  // namespace

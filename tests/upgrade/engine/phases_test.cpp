@@ -92,6 +92,13 @@ class PhasesTest : public DeviceTest {
 
 using FetchTest = PhasesTest;
 
+TEST_F(FetchTest, MakesTheFolderAtALaterAttemptWhenThatHasFailed) {
+  server().Put("a.bin", "new");
+  device().faults().Add({"CreateDirectoryW", 2, 1, ERROR_DISK_FULL});
+  EXPECT_TRUE(FetchFile(run(), "a.bin", "\\One\\Two\\Three\\a.bin", OnFailedGet::kTryAgain));
+  EXPECT_THAT(GetFile("\\One\\Two\\Three\\a.bin"), Optional(std::string("new")));
+}
+
 TEST_F(FetchTest, BringsAFileIntoAFolderThatItMakes) {
   const std::string content(50000, 'x');
   server().Put("apps/a.bin", content);
@@ -571,6 +578,18 @@ TEST_F(InfTest, FetchesItsEntriesFromItsOwnFolder) {
   EXPECT_THAT(StatusLines(), ElementsAre("\\job.inf", "\\Temp\\x.cab"));
 }
 
+TEST_F(InfTest, GoesOnAfterAnEntryThatWouldReplaceTheFileItself) {
+  const std::string text =
+      "\"TQ52-A1\" \"y.cab\" \"\\job.inf\"\n\"TQ52-A1\" \"y.cab\" \"\\\\JOB.INF\"\n"
+      "\"TQ52-A1\" \"x.cab\" \"\\x.cab\"\n";
+  PutInf(text);
+  server().Put("apps/inf/x.cab", "cabinet");
+  server().Put("apps/inf/y.cab", "not the list any more");
+  EXPECT_EQ(FetchInfFiles(run(), InfMode::kFetch), 4U);
+  EXPECT_THAT(GetFile("\\job.inf"), Optional(text)) << "it is being read";
+  EXPECT_THAT(GetFile("\\x.cab"), Optional(std::string("cabinet")));
+}
+
 TEST_F(InfTest, GoesOnWhenAnEntryIsNotOnTheServer) {
   PutInf("\"TQ52-A1\" \"none.cab\" \"\\none.cab\"\n\"TQ52-A1\" \"x.cab\" \"\\x.cab\"\n");
   server().Put("apps/inf/x.cab", "cabinet");
@@ -632,6 +651,16 @@ TEST_F(MiscTest, NothingToFetchIsASuccess) {
 // ---- counting ----
 
 using CountTest = PhasesTest;
+
+TEST_F(CountTest, TakesPackagesOfNegativeCountForNothingAndWrapsBehindHugeOnes) {
+  test::AddPackage(job(), {-1, "a", "\\", "fw/", "", ""});
+  test::AddPackage(job(), {-2147483647 - 1, "b", "\\", "fw/", "", ""});
+  test::AddPackage(job(), {2147483647, "c", "\\", "fw/", "", ""});
+  test::AddPackage(job(), {2147483647, "d", "\\", "fw/", "", ""});
+  test::AddPackage(job(), {3, "e", "\\", "fw/", "", ""});
+  CountFiles(run());
+  EXPECT_EQ(run().files_to_fetch, 1U);
+}
 
 TEST_F(CountTest, AddsPartsInfEntriesAndFilesOfThisPass) {
   test::SetMultiPass(job());

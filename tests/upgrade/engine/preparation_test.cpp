@@ -333,6 +333,17 @@ TEST_F(MemoryTest, ForAnImageIsThatOfTheFirstPackageThatNamesIt) {
   EXPECT_TRUE(run.os_image);
 }
 
+TEST_F(MemoryTest, ForAnImageMayBeAnyNumberButZero) {
+  for (const char* size : {"-5", "2147483647", "4294967295", "-2147483648"}) {
+    auto one = std::make_unique<UpgradeConfig>();
+    const std::string options = std::string("RAMAllocSize=") + size;
+    test::AddPackage(*one, {0, "a", "", "", "", options});
+    upgrade::Run run(*one);
+    ReadRamAllocation(run);
+    EXPECT_TRUE(run.os_image) << size;
+  }
+}
+
 // ---- folders and names ----
 
 using FolderTest = PreparationTest;
@@ -359,6 +370,17 @@ TEST_F(FolderTest, StopsAtAFileInItsWay) {
   CreateFolderOf("\\One\\Two\\file.bin");
   EXPECT_FALSE(Exists("\\One\\Two"));
   EXPECT_THAT(GetFile("\\One"), Optional(std::string("a file")));
+}
+
+TEST_F(FolderTest, IsMadeNextTimeWhenOneInTheMiddleCouldNotBe) {
+  for (std::uint64_t nth = 1; nth <= 5; ++nth) {
+    device().faults().Add({"CreateDirectoryW", nth, 1, ERROR_DISK_FULL});
+    const std::string top = "\\t" + std::to_string(nth);
+    CreateFolderOf(top + "\\Two\\Three\\file.bin");
+    device().faults().Clear();
+    CreateFolderOf(top + "\\Two\\Three\\file.bin");
+    EXPECT_TRUE(Exists(top + "\\Two\\Three")) << nth;
+  }
 }
 
 TEST_F(FolderTest, OfAnyDepthIsMade) {
