@@ -19,8 +19,10 @@ class PointerArray {
   PointerArray& operator=(const PointerArray& other) noexcept;
   ~PointerArray();
 
-  /// @return false, with the array as it was, when there is no memory.
+  /// @return false, with the array as it was but for being incomplete, when there is no memory.
   bool Append(void* pointer) noexcept;
+  /// Notes that a pointer which belongs here could not be made.
+  void NoteMissing() noexcept { incomplete_ = true; }
   /// Puts the pointers in the order of their addresses, each once and without nulls.
   void SortAndDropDuplicates() noexcept;
   void Release() noexcept;
@@ -28,6 +30,7 @@ class PointerArray {
   void** items_ = nullptr;
   std::uint32_t size_ = 0;
   std::uint32_t capacity_ = 0;
+  bool incomplete_ = false;
 };
 
 /// A list of pointers to T in the order in which they were added. What it points to belongs to the
@@ -51,6 +54,9 @@ class PointerList : private PointerArray {
 
   [[nodiscard]] std::size_t size() const noexcept { return size_; }
   [[nodiscard]] bool empty() const noexcept { return size_ == 0; }
+  /// Whether something that was added, or was in the list that this one is a copy of, is not here
+  /// for want of memory.
+  [[nodiscard]] bool incomplete() const noexcept { return incomplete_; }
   /// @param index  below size()
   [[nodiscard]] T* operator[](std::size_t index) const noexcept {
     return static_cast<T*>(items_[index]);

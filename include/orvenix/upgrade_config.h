@@ -69,7 +69,8 @@ static_assert(sizeof(tagDownloadFile) == 2632 && sizeof(tagStorageReq) == 292 &&
 ///
 /// Getters of texts point into the record. Setters cut a text that is longer than its field (the
 /// field's size less one for the terminating zero, given as [n] below); a null text counts as
-/// empty. No operation reports a failure: what cannot be listed for want of memory is freed.
+/// empty. No operation reports a failure: what cannot be listed for want of memory is freed, and
+/// the list says that it is incomplete().
 ///
 /// Nothing here locks. One thread fills a job and hands it to StartUpgradeThread, which then owns
 /// it; until then it belongs to whoever made it.

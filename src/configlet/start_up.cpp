@@ -61,13 +61,10 @@ void SetUpSyslog(const Walk& walk) noexcept {
   report::SetSyslogTarget(port, address.c_str());
 }
 
-<<<<<<< HEAD
-/// The job is held over the questions to the device's volumes: an upgrade thread that was started
-/// twice with it may be about to free it. A job that is gone needs no space; nothing will start.
-=======
 // The next three hold the lock for as long as they read the job, however many files are deleted
 // meanwhile: an upgrade thread that was started with the same job may be about to free it. Only
-// that thread ever waits for this, and nothing in here waits for it or calls the host.
+// that thread ever waits for this, and nothing in here waits for it or calls the host. A job that
+// is gone meanwhile needs nothing; nothing will start.
 
 bool TestsPass(const Walk& walk, FailureText* failure) noexcept {
   const WalkLock lock;
@@ -80,7 +77,6 @@ void CleanUp(const Walk& walk) noexcept {
   if (walk.job != nullptr) upgrade::CleanUpDevice(*walk.job);
 }
 
->>>>>>> 9c55c5b (Test the registry and clean the device before an upgrade touches it)
 bool HasSpace(const Walk& walk, std::uint32_t* total) noexcept {
   const WalkLock lock;
   return walk.job == nullptr || upgrade::CheckSpace(*walk.job, total);

@@ -80,6 +80,7 @@ class FolderCleaner : public device::OnLocalHeap {
 
   /// Whether the file that was found is on the save list.
   bool IsSaved() noexcept {
+    if (job_.FilesToSave().incomplete()) return true;
     path_.Assign(base::WideView(walk_.path()));
     ToLowerCase(path_);
     const std::size_t length = path_.size();

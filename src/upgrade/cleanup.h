@@ -16,7 +16,8 @@ void CleanUpDevice(const UpgradeConfig& job) noexcept;
 ///
 /// In a folder the files in ROM stay, those of the job's save list (in whatever letter case), and
 /// the volumes mounted there, except the flash file store; of the folder itself nothing of that is
-/// asked. When the list of files to save cannot be read for want of memory, all of them stay.
+/// asked. When an entry of the save list has been lost for want of memory, all files of
+/// folders stay.
 /// @param path  on the device; null, empty or longer than 259 characters: nothing is done
 ///
 // KEPT ODDITY: a path with a dot anywhere is a file's. A folder "\My.App" is never emptied, whether

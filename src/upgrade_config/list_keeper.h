@@ -13,6 +13,12 @@ struct ListKeeper {
     if (!list.Append(element) && element != nullptr && !Holds(list, element)) release(element);
   }
 
+  /// Notes that an element could not even be made.
+  template <typename T>
+  static void NoteMissing(PointerList<T>& list) noexcept {
+    list.NoteMissing();
+  }
+
   /// Frees every distinct element. A host that ends a group twice has handed the same record over
   /// twice.
   template <typename T, typename Release>

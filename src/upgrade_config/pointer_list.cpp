@@ -39,10 +39,13 @@ void Sort(void** items, std::size_t size) noexcept {
 
 }  // namespace
 
-PointerArray::PointerArray(const PointerArray& other) noexcept {
+PointerArray::PointerArray(const PointerArray& other) noexcept : incomplete_(other.incomplete_) {
   if (other.size_ == 0) return;
   items_ = AllocateItems(other.size_);
-  if (items_ == nullptr) return;
+  if (items_ == nullptr) {
+    NoteMissing();
+    return;
+  }
   std::memcpy(items_, other.items_, other.size_ * sizeof(void*));
   size_ = other.size_;
   capacity_ = other.size_;
@@ -53,6 +56,7 @@ PointerArray& PointerArray::operator=(const PointerArray& other) noexcept {
   std::swap(items_, copy.items_);
   std::swap(size_, copy.size_);
   std::swap(capacity_, copy.capacity_);
+  std::swap(incomplete_, copy.incomplete_);
   return *this;
 }
 
@@ -64,7 +68,10 @@ bool PointerArray::Append(void* pointer) noexcept {
   if (size_ == capacity_) {
     const std::uint32_t capacity = capacity_ == 0 ? kFirstCapacity : capacity_ * 2;
     void** const larger = AllocateItems(capacity);
-    if (larger == nullptr) return false;
+    if (larger == nullptr) {
+      NoteMissing();
+      return false;
+    }
     if (size_ > 0) std::memcpy(larger, items_, size_ * sizeof(void*));
     LocalFree(items_);
     items_ = larger;
@@ -91,6 +98,7 @@ void PointerArray::Release() noexcept {
   items_ = nullptr;
   size_ = 0;
   capacity_ = 0;
+  incomplete_ = false;
 }
 
 }  // namespace orvenix

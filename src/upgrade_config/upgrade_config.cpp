@@ -35,7 +35,7 @@ void FreeRecord(void* record) noexcept {
 void AddCopy(PointerList<char>& list, const char* text) noexcept {
   const std::string_view view = base::View(text);
   auto* const copy = static_cast<char*>(LocalAlloc(LMEM_FIXED, view.size() + 1));
-  if (copy == nullptr) return;
+  if (copy == nullptr) return ListKeeper::NoteMissing(list);
   base::CopyText<char>(copy, view.size() + 1, view);
   ListKeeper::Take(list, copy, FreeRecord);
 }

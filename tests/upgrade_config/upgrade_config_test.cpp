@@ -67,6 +67,35 @@ TEST_F(UpgradeConfigTest, IsNullWhenThereIsNoMemoryForIt) {
   device().faults().Clear();
 }
 
+TEST_F(UpgradeConfigTest, SaysWhichListHasLostSomethingForWantOfMemory) {
+  for (std::uint64_t nth = 1; nth <= 2; ++nth) {  // the copy of the text, the list's room
+    UpgradeConfig job;
+    device().faults().Add({"LocalAlloc", nth, 1, ERROR_OUTOFMEMORY});
+    job.AddFileSave("\\a.txt");
+    device().faults().Clear();
+    EXPECT_TRUE(job.FilesToSave().incomplete()) << nth;
+    EXPECT_TRUE(job.FilesToSave().empty()) << nth;
+    EXPECT_FALSE(job.FilesToDelete().incomplete()) << nth;
+    job.AddFileSave("\\b.txt");
+    EXPECT_TRUE(job.FilesToSave().incomplete()) << "what is lost stays lost";
+    UpgradeConfig other;
+    other = job;
+    EXPECT_TRUE(other.FilesToSave().incomplete()) << "in a copy too";
+    job = UpgradeConfig();  // one of the two frees the text
+    EXPECT_FALSE(job.FilesToSave().incomplete());
+  }
+}
+
+TEST_F(UpgradeConfigTest, SaysSoWhenACopyHasLostItsList) {
+  UpgradeConfig job;
+  job.AddFileSave("\\a.txt");
+  device().faults().Add({"LocalAlloc", 1, 1, ERROR_OUTOFMEMORY});
+  const UpgradeConfig copy(job);
+  device().faults().Clear();
+  EXPECT_TRUE(copy.FilesToSave().incomplete());
+  EXPECT_FALSE(job.FilesToSave().incomplete());
+}
+
 TEST_F(UpgradeConfigTest, LivesInLocalMemoryWhicheverNewMadeIt) {
   const std::size_t before = Blocks();
 

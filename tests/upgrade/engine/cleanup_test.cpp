@@ -549,6 +549,24 @@ TEST_F(CleanupTest, DeletesNothingOfAFolderWithoutMemory) {
   EXPECT_FALSE(Exists("\\b.txt"));
 }
 
+TEST_F(CleanupTest, DeletesNoFileOfAFolderWhenThereWasNoMemoryForTheSaveList) {
+  PutFile("\\Temp\\keep.txt", "a");
+  PutFile("\\Temp\\a.txt", "a");
+  PutFile("\\b.txt", "a");
+  for (std::uint64_t nth = 1; nth <= 2; ++nth) {  // the entry's text, the list's room
+    UpgradeConfig lost;
+    device().faults().Add({"LocalAlloc", nth, 1, ERROR_OUTOFMEMORY});
+    lost.AddFileSave("\\Temp\\keep.txt");
+    device().faults().Clear();
+    lost.AddFileDelete("\\Temp");
+    lost.AddFileDelete("\\b.txt");
+    CleanUpDevice(lost);
+    EXPECT_TRUE(Exists("\\Temp\\keep.txt")) << nth;
+    EXPECT_TRUE(Exists("\\Temp\\a.txt")) << nth;
+    EXPECT_FALSE(Exists("\\b.txt")) << "a file that is named was never to be saved";
+  }
+}
+
 TEST_F(CleanupTest, NeitherLosesASavedFileNorLeaksWhicheverCallFails) {
   job().AddStopProcess("none.exe");
   job().AddFileDelete("\\Temp");
