@@ -251,8 +251,9 @@ XmlParseError Parser::ParseStartTag() noexcept {
     open_ = started_ = element;
     link_ = &element->first_child;
     name_lengths_[depth_++] = name.size();
-  } else if (*at_++ != '>') {
-    return XmlParseError::kSlashNotClosed;
+  } else {
+    if (*at_ != '>') return XmlParseError::kSlashNotClosed;
+    ++at_;
   }
   spare_element_ = storage_.TakeElement();
   return spare_element_ == nullptr ? XmlParseError::kOutOfMemory : XmlParseError::kNone;

@@ -258,6 +258,8 @@ TEST_F(ParserTest, SaysWhereItStopped) {
       {"<a x=1>", 5, "at what stands instead of the quote"},
       {"<a x='1", 7, "the end of the text"},
       {"<a><!-- ", 8, "the end of the text"},
+      {"<a/ >", 3, "at what stands instead of the \">\""},
+      {"<a/", 3, "the end of the text, and no further"},
       {"<a>&lt;&amp;</b>", 9, "decoded entities count as one byte each"},
       {"<a x='&apos;'>&amp;", 10, "in values too, and in a text without end"},
   };
