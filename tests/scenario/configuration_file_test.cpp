@@ -6,9 +6,11 @@
 #include <vector>
 
 #include "ce/kernel.h"
+#include "ce/system.h"
 #include "memory/memory.h"
 #include "net/virtual/virtual_server.h"
 #include "orvenix/upgrade_thread.h"
+#include "process/processes.h"
 #include "scenario/scenario_test.h"
 
 namespace {
@@ -41,6 +43,27 @@ constexpr char kJob[] = R"(<?xml version="1.0"?>
 </Job>
 )";
 
+/// A job that wants the radio to have firmware 7 and room for new data.
+constexpr char kPreparedJob[] = R"(<Job>
+  <BaseUrl>http://127.0.0.2</BaseUrl>
+  <Registry>
+    <Root>HKEY_LOCAL_MACHINE</Root>
+    <Key>Software\Radio</Key>
+    <ValueName>Firmware</ValueName>
+    <Type>REG_DWORD</Type>
+    <Operator>GTE</Operator>
+    <Value>7</Value>
+    <ErrorMsg>Radio is too old</ErrorMsg>
+  </Registry>
+  <StopProcesses><Process>scanner.exe</Process></StopProcesses>
+  <DiskCleanup>
+    <File Action="delete">\Data</File>
+    <File Action="save">\Data\stock.db</File>
+  </DiskCleanup>
+  <Downloads><File SourceDir="misc/a.txt" DestDir="\Data\a.txt"/></Downloads>
+</Job>
+)";
+
 class ConfigurationFileTest : public test::ScenarioTest {
  protected:
   ConfigurationFileTest() {
@@ -51,6 +74,15 @@ class ConfigurationFileTest : public test::ScenarioTest {
     server().Put("apps/x.cab", "cabinet");
     server().Put("misc/a.txt", "text");
     PutFile("\\Data\\a.txt", "old text");
+  }
+
+  static void StoreRadio(DWORD firmware) {
+    HKEY key = nullptr;
+    RegCreateKeyExW(HKEY_LOCAL_MACHINE, u"Software\\Radio", 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
+                    &key, nullptr);
+    RegSetValueExW(key, u"Firmware", 0, REG_DWORD, reinterpret_cast<const BYTE*>(&firmware),
+                   sizeof firmware);
+    RegCloseKey(key);
   }
 
   /// What a program does that is given a configuration file. @return whether an upgrade was
@@ -111,6 +143,35 @@ TEST_F(ConfigurationFileTest, CountsThePassesThatASelectedPackageNames) {
     EXPECT_EQ(test::Exists("\\os002.zip"), pass == 2);
     Restart();
   }
+}
+
+TEST_F(ConfigurationFileTest, TestsAndCleansTheDeviceBeforeItFetches) {
+  StoreRadio(7);
+  device().processes().Add(u"scanner.exe");
+  PutFile("\\Data\\old.db", "old");
+  PutFile("\\Data\\stock.db", "stock");
+  PutFile(kFile, kPreparedJob);
+  ASSERT_TRUE(LoadAndStart());
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_EQ(device().processes().List().size(), 1U) << "the test's own program";
+  EXPECT_FALSE(test::Exists("\\Data\\old.db"));
+  EXPECT_THAT(GetFile("\\Data\\stock.db"), Optional(std::string("stock")));
+  EXPECT_THAT(GetFile("\\Data\\a.txt"), Optional(std::string("text")));
+  EXPECT_EQ(server().Device().report->error, "");
+}
+
+TEST_F(ConfigurationFileTest, FetchesNothingWhenATestFails) {
+  StoreRadio(6);
+  device().processes().Add(u"scanner.exe");
+  PutFile("\\Data\\old.db", "old");
+  PutFile(kFile, kPreparedJob);
+  ASSERT_TRUE(LoadAndStart());
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_EQ(device().processes().List().size(), 2U);
+  EXPECT_TRUE(test::Exists("\\Data\\old.db"));
+  EXPECT_THAT(GetFile("\\Data\\a.txt"), Optional(std::string("old text")));
+  EXPECT_THAT(server().RequestedPaths(), IsEmpty());
+  EXPECT_THAT(ShownLines(), Contains(HasSubstr("Radio is too old")));
 }
 
 TEST_F(ConfigurationFileTest, SendsItsLogWhereTheFileSays) {
