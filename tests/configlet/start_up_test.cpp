@@ -204,6 +204,18 @@ TEST_F(StartUpTest, RefusesANewUpgradeUntilTheOldOneIsThrough) {
   EXPECT_EQ(&job(), second) << "the end of the first job takes only its own pointers away";
 }
 
+TEST_F(StartUpTest, DoesNotAskOtherProgramsWhetherTheyUpgrade) {
+  HANDLE event = CreateEventW(nullptr, FALSE, FALSE, TEXT("TW_UPGRADE_IN_PROGRESS"));
+  ASSERT_NE(event, nullptr);
+
+  Fill();
+  EXPECT_TRUE(upgrade::UpgradeInProgress()) << "begun, although another program has the event";
+  EXPECT_EQ(EndUpgrade(), ICFG_OK);
+
+  EXPECT_TRUE(AwaitTheEnd());
+  CloseHandle(event);
+}
+
 TEST_F(StartUpTest, RunsAlsoWhenUpgradeWasNeverBegun) {
   Fill();
   upgrade::EndUpgrade();  // as if "Upgrade" had not been begun

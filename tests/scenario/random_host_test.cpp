@@ -2,6 +2,7 @@
 #include <gmock/gmock.h>
 
 #include <iterator>
+#include <new>
 #include <random>
 #include <string>
 
@@ -9,6 +10,7 @@
 #include "faults/faults.h"
 #include "memory/memory.h"
 #include "orvenix/configlet.h"
+#include "orvenix/upgrade_thread.h"
 #include "report/log/log.h"
 #include "scenario/scenario_test.h"
 #include "upgrade/run_state/run_state.h"
@@ -26,13 +28,14 @@ class RandomHost {
       : random_(seed), file_(std::move(file)), list_(std::move(list)) {}
 
   void Step() {
-    switch (Below(12)) {
+    switch (Below(13)) {
       case 0: BeginJob(); break;
       case 1: BeginFileList(); break;
       case 2: BeginFile(); break;
       case 3: BeginUpgrade(); break;
       case 4: EndUpgrade(); break;
       case 5: Sleep(Below(6000)); break;
+      case 10: StartFromOutside(); break;
       case 6:
       case 7: IcfgBeginGroup(kToBegin[Below(std::size(kToBegin))], 0, 0); break;
       case 8:
@@ -74,6 +77,21 @@ class RandomHost {
   void EndUpgrade() {
     const std::uint32_t result = IcfgEndGroup(InSomeLetterCase("Upgrade").c_str(), 0, 0);
     started_ += result == ICFG_OK ? 1 : 0;
+  }
+
+  /// Another part of the host hands over a job of its own making.
+  void StartFromOutside() {
+    if (Below(3) != 0) return;
+    auto* const job = new (std::nothrow) UpgradeConfig;
+    if (job == nullptr) return;
+    job->SetBaseURL(kServerUrl);
+    job->SetShowGUI(static_cast<int>(Below(2)));
+    job->AddFileSave("\\old");
+    if (HANDLE thread = StartUpgradeThread(job, static_cast<std::int32_t>(Below(2)))) {
+      CloseHandle(thread);
+    } else {
+      delete job;
+    }
   }
 
   void BeginJob() {
