@@ -23,7 +23,7 @@ struct Value {
   DWORD type = 0;
   DWORD size = 0;  ///< bytes
   DWORD number = 0;
-  WCHAR text[kTextBytes / sizeof(WCHAR) + 1] = {};  ///< room for a terminator that may be missing
+  WCHAR text[kTextBytes / sizeof(WCHAR)] = {};  ///< need not be terminated
 };
 
 /// Leaves `root` as it is for a name that is none.

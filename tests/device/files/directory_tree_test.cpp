@@ -266,6 +266,21 @@ TEST_F(TreeWalkTest, EndsAtOnceInAFolderThatIsNotThere) {
   EXPECT_THAT(Steps(walk), ElementsAre("\\T<"));
 }
 
+TEST_F(TreeWalkTest, HoldsNoFolderOpenThatItHasLeft) {
+  PutFile("\\T\\m\\x", "");
+  const std::size_t handles = device().kernel().OpenHandles();
+  TreeWalk walk;
+  ASSERT_TRUE(walk.Begin(TEXT("\\T\\*.*"), TEXT("\\T\\")));
+  EXPECT_EQ(walk.Next(), TreeWalk::Step::kFolder);
+  walk.Enter();
+  EXPECT_EQ(walk.Next(), TreeWalk::Step::kFile);
+  EXPECT_EQ(device().kernel().OpenHandles(), handles + 2);
+  EXPECT_EQ(walk.Next(), TreeWalk::Step::kEndOfFolder);
+  EXPECT_EQ(device().kernel().OpenHandles(), handles + 1);
+  EXPECT_EQ(walk.Next(), TreeWalk::Step::kEndOfFolder);
+  EXPECT_EQ(device().kernel().OpenHandles(), handles);
+}
+
 TEST_F(TreeWalkTest, BeginsAnewAndClosesWhatWasOpen) {
   PutFile("\\T\\m\\n\\x", "");
   const std::size_t handles = device().kernel().OpenHandles();

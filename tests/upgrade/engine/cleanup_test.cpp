@@ -145,6 +145,11 @@ TEST_F(CleanupTest, PassesOverWhatIsNotThereOrCannotBeDeleted) {
   EXPECT_TRUE(Exists("\\rom.txt"));
 }
 
+TEST_F(CleanupTest, LooksForAFileBeforeItDeletesIt) {
+  Delete("\\none.txt");
+  EXPECT_EQ(device().faults().Count("DeleteFileW"), 0U);
+}
+
 TEST_F(CleanupTest, AsksForNothingWhenNothingIsNamed) {
   PutFile("\\a.txt", "a");
   const std::uint64_t before = device().faults().Count("*");
@@ -223,6 +228,7 @@ TEST_F(CleanupTest, LeavesFilesInRom) {
   Delete("\\Windows");
   EXPECT_TRUE(Exists("\\Windows\\core.dll"));
   EXPECT_FALSE(Exists("\\Windows\\own.dll"));
+  EXPECT_EQ(device().faults().Count("DeleteFileW"), 1U) << "and does not even ask for them";
 }
 
 TEST_F(CleanupTest, ManagesThousandsOfFiles) {
