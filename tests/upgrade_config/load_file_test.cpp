@@ -660,7 +660,7 @@ TEST_F(LoadFileTest, ReadsTheExampleOfTheDocumentation) {
   EXPECT_EQ(job.GetProcessWait(), 0);
   EXPECT_THAT(Texts(job.ProcessesToStop()), ElementsAre("scanner.exe"));
   EXPECT_THAT(Downloads(job), ElementsAre("misc/readme.txt -> \\Application\\readme.txt"));
-  EXPECT_THAT(Texts(job.FilesToDelete()), ElementsAre("\\Temp\\"));
+  EXPECT_THAT(Texts(job.FilesToDelete()), ElementsAre("\\Temp"));
   EXPECT_THAT(Texts(job.FilesToSave()), ElementsAre("\\Temp\\stock.db"));
   ASSERT_THAT(job.RegistryTests(), SizeIs(1));
   EXPECT_STREQ(job.RegistryTests()[0]->operation, "GTE");
