@@ -74,6 +74,7 @@ DWORD ReleasePowerRequirement(HANDLE requirement);
 void SystemIdleTimerReset();
 BOOL KernelIoControl(DWORD code, void* input, DWORD input_size, void* output, DWORD output_size,
                      DWORD* returned);
+FARPROC GetProcAddressW(HMODULE module, const WCHAR* name);
 void NKDbgPrintfW(const WCHAR* format, ...);
 BOOL CloseToolhelp32Snapshot(HANDLE snapshot);
 }

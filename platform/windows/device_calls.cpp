@@ -94,6 +94,15 @@ BOOL KernelIoControl(DWORD /*code*/, void* /*input*/, DWORD /*input_size*/, void
   return FALSE;
 }
 
+/// Desktop Windows knows 8-bit names only.
+FARPROC GetProcAddressW(HMODULE module, const WCHAR* name) {
+  char narrow[256];
+  if (WideCharToMultiByte(CP_ACP, 0, name, -1, narrow, sizeof narrow, nullptr, nullptr) == 0) {
+    return nullptr;
+  }
+  return GetProcAddress(module, narrow);
+}
+
 void NKDbgPrintfW(const WCHAR* format, ...) {
   WCHAR text[512];
   va_list arguments;

@@ -8,6 +8,8 @@
 #include "kernel/debug.h"
 #include "kernel/handle_table.h"
 #include "kernel/kernel.h"
+#include "library/libraries.h"
+#include "library/management_queue.h"
 #include "memory/memory.h"
 #include "net/network.h"
 #include "power/power.h"
@@ -36,7 +38,9 @@ Device::Device(World& world, Profile profile, std::filesystem::path folder)
       power_(std::make_unique<Power>(*this)),
       processes_(std::make_unique<Processes>(*this)),
       network_(std::make_unique<Network>(*this)),
-      screen_(std::make_unique<Screen>(*this)) {}
+      screen_(std::make_unique<Screen>(*this)),
+      libraries_(std::make_unique<Libraries>()),
+      messages_(std::make_unique<ManagementQueue>(*this)) {}
 
 // No thread may still use a part when it goes, and what handles stand for goes before the parts.
 Device::~Device() {

@@ -23,12 +23,15 @@ class Registry;
 class Memory;  // LocalAlloc, and the division between store and program memory
 class Power;
 class Processes;
-class Screen;   // windows and what they show
-class Network;  // the device's sockets
-class Debug;    // OutputDebugStringW, NKDbgPrintfW
+class Screen;           // windows and what they show
+class Network;          // the device's sockets
+class Debug;            // OutputDebugStringW, NKDbgPrintfW
+class Libraries;        // what programs load at run time
+class ManagementQueue;  // where they leave messages for the management system
 
 /// Every part is made with the device and lives as long. `folder` is the device on disk:
-/// `storage/` is its file system, `registry.reg` its registry, `device.profile` its profile.
+/// `storage/` is its file system, `registry.reg` its registry, `device.profile` its profile,
+/// `messages/` what it has sent to its message queue.
 class Device {
  public:
   Device(World& world, Profile profile, std::filesystem::path folder);
@@ -52,6 +55,8 @@ class Device {
   [[nodiscard]] Screen& screen() const { return *screen_; }
   [[nodiscard]] Network& network() const { return *network_; }
   [[nodiscard]] Debug& debug() const { return *debug_; }
+  [[nodiscard]] Libraries& libraries() const { return *libraries_; }
+  [[nodiscard]] ManagementQueue& messages() const { return *messages_; }
 
   /// The device of the calling thread; ends the program with `what` when there is none.
   static Device& Current(const char* what);
@@ -72,6 +77,8 @@ class Device {
   std::unique_ptr<Processes> processes_;
   std::unique_ptr<Network> network_;
   std::unique_ptr<Screen> screen_;
+  std::unique_ptr<Libraries> libraries_;
+  std::unique_ptr<ManagementQueue> messages_;
 };
 
 }  // namespace sim

@@ -62,6 +62,11 @@ struct Profile {
   std::vector<ProcessProfile> processes;
   std::map<std::string, ProgramProfile> programs;  ///< by lower-case executable name
 
+  // Message queue.
+  std::string message_library = "kx_clapi_dll";  ///< of its library; empty: the device has none
+  std::string message_library_lacks;             ///< an entry point that is not there; empty: none
+  bool message_queue_opens = true;               ///< false: no connection comes about
+
   // Time.
   std::string start_time = "2006-03-01 14:05:09";  ///< local time at which a virtual world begins
   std::int32_t utc_offset_minutes = 0;

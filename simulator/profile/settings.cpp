@@ -95,6 +95,18 @@ Complaint CheckTime(std::string_view text) {
   return R"(is no time; write it like "2006-03-01 14:05:09")";
 }
 
+Complaint CheckQueueLibrary(std::string_view text) {
+  if (text.empty() || text == "kx_clapi_dll" || text == "kx_lapi_c_wrapper") return {};
+  return "is no library of the message queue; write kx_clapi_dll or kx_lapi_c_wrapper";
+}
+
+Complaint CheckQueueEntry(std::string_view text) {
+  if (text.empty() || text == "lapi_open" || text == "lapi_close" || text == "lapi_write") {
+    return {};
+  }
+  return "is no entry point of the message queue; write lapi_open, lapi_close or lapi_write";
+}
+
 template <typename T>
 constexpr std::uint64_t kMost = static_cast<std::uint64_t>(std::numeric_limits<T>::max());
 constexpr std::uint64_t kMostPages = 1U << 19;  // 2 GiB of 4,096-byte pages
@@ -133,6 +145,14 @@ std::vector<Setting<Profile>> MakeProfileSettings() {
       Number("power", "battery_flag", &P::battery_flag, 0, 255,
              "1: high, 2: low, 4: critical, 8: charging, 128: none, 255: unknown; or sums."),
       Number("power", "battery_percent", &P::battery_percent, 0, 255, "0 to 100; 255: unknown."),
+
+      Text("messages", "library", &P::message_library,
+           "Library of the message queue: kx_clapi_dll, kx_lapi_c_wrapper or empty for none.",
+           CheckQueueLibrary),
+      Text("messages", "lacks", &P::message_library_lacks,
+           "Entry point that it lacks: lapi_open, lapi_close, lapi_write or empty for none.",
+           CheckQueueEntry),
+      Switch("messages", "opens", &P::message_queue_opens, "no: the queue refuses connections."),
 
       Text("time", "start", &P::start_time, "Local time at which a virtual world begins.",
            CheckTime),

@@ -44,6 +44,9 @@ struct PROCESSENTRY32 {
 using LPPROCESSENTRY32 = PROCESSENTRY32*;
 static_assert(sizeof(PROCESSENTRY32) == 564, "the device's layout");
 
+/// A function of a loaded library, to be cast to what it is.
+using FARPROC = std::intptr_t(WINAPI*)();
+
 struct PROCESS_INFORMATION {
   HANDLE hProcess;
   HANDLE hThread;
@@ -123,6 +126,9 @@ BOOL CreateProcessW(const WCHAR* program, WCHAR* command_line, SECURITY_ATTRIBUT
 HANDLE OpenProcess(DWORD access, BOOL inherit, DWORD process_id);
 BOOL TerminateProcess(HANDLE process, DWORD exit_code);
 BOOL GetExitCodeProcess(HANDLE process, DWORD* exit_code);
+
+HMODULE LoadLibraryW(const WCHAR* name);
+FARPROC GetProcAddressW(HMODULE module, const WCHAR* name);
 
 void OutputDebugStringW(const WCHAR* text);
 void NKDbgPrintfW(const WCHAR* format, ...);

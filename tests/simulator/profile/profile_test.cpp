@@ -66,6 +66,9 @@ sim::Profile Unusual() {
   profile.processes = {{"explorer.exe"}, {"Explorer.exe"}, {" [odd] "}};
   profile.programs = {{"wceload.exe", {"./install --in=\"$ORVENIX_DEVICE\" [x] # y", 0, 0}},
                       {"flash writer.exe", {"", 7, 90000}}};
+  profile.message_library = "";
+  profile.message_library_lacks = "lapi_close";
+  profile.message_queue_opens = false;
   profile.start_time = "1999-12-31 23:59:59";
   profile.utc_offset_minutes = -570;
   return profile;
@@ -85,6 +88,7 @@ TEST_F(ProfileTest, ComesBackFromItsFile) {
     EXPECT_EQ(loaded.host_name, saved.host_name);
     EXPECT_EQ(loaded.volumes.size(), saved.volumes.size());
     EXPECT_EQ(loaded.programs.size(), saved.programs.size());
+    EXPECT_EQ(loaded.message_library, saved.message_library);
     EXPECT_EQ(loaded.utc_offset_minutes, saved.utc_offset_minutes);
     // The text holds every setting, so the same text again means that nothing was lost.
     ASSERT_TRUE(sim::SaveProfile(file_, loaded, error_)) << error_;
@@ -169,6 +173,9 @@ TEST_F(ProfileTest, RefusesEverythingElseInOneLine) {
       {"[time]\nstart = 2006-02-30 00:00:00\n", "is no time"},
       {"[identity]\nnetwork_id = 5E4D3C2B1A\n", "is no network address"},
       {"[identity]\nnetwork_id = 5E4D3C2B1A0G\n", "is no network address"},
+      {"[messages]\nlibrary = kx\n", "is no library of the message queue"},
+      {"[messages]\nlacks = lapi_read\n", "is no entry point of the message queue"},
+      {"[messages]\nopens = never\n", "neither \"yes\" nor \"no\""},
       {"[network]\naddress = 127.0.0\n", "is no IPv4 address"},
       {"[network]\naddress = 127.0.0.256\n", "is no IPv4 address"},
       {"[network]\naddress = 127.0.0.1.1\n", "is no IPv4 address"},
