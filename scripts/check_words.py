@@ -12,7 +12,7 @@ RULES = [
     (re.compile(r"\b(TODO|FIXME|XXX)\b"), "a leftover mark", re.compile(r"^(src|simulator|server|tools)/")),
     (re.compile(r"\b(strcpy|strcat|sprintf|atoi|atol|strtol)\s*\("), "an unbounded or clamping call",
      re.compile(r"^src/")),
-    (re.compile(r"\b[uL]\"|\bstd::(string|vector|thread|mutex|function)\b"),
+    (re.compile(r"(?<![%\w])[uL]\"|\bstd::(string|vector|thread|mutex|function)\b"),
      "what the device's library does not have", re.compile(r"^src/")),
 ]
 

@@ -4,10 +4,12 @@
 
 #include <cstdint>
 
+#include "base/format.h"
 #include "base/text.h"
 #include "configlet/walk.h"
 #include "device/handle.h"
 #include "report/log/log.h"
+#include "report/messages/message_link.h"
 #include "upgrade/cleanup.h"
 #include "upgrade/progress.h"
 #include "upgrade/registry_tests.h"
@@ -19,10 +21,10 @@
 namespace configlet {
 namespace {
 
-/// Gives the client time to fetch the report of a failure.
+/// Gives the management system time to fetch the report of a failure.
 constexpr DWORD kFailurePauseMs = 3000;
 
-/// What a job says when one of its tests fails.
+/// Why the job does not start, in words for the management system.
 using FailureText = base::FixedText<256>;
 
 /// Why the job does not start.
@@ -82,17 +84,33 @@ bool HasSpace(const Walk& walk, std::uint32_t* total) noexcept {
   return walk.job == nullptr || upgrade::CheckSpace(*walk.job, total);
 }
 
-/// @param failure  receives the message of a failed test
+/// Only a failed test is told by a status, too, before the event.
+void ReportFailedTest(const FailureText& failure) noexcept {
+  base::FixedText<256> reason;
+  base::Format(reason.data(), reason.capacity(), "Upgrade Failed: %s", failure.c_str());
+  report::SetRWIStatus(report::kStateIdle, reason.c_str());
+}
+
+/// @param failure  receives the words for what is not met
 Preflight Check(const Walk& walk, FailureText* failure) noexcept {
-  if (!HasPower()) return Preflight::kPowerLow;
+  if (!HasPower()) {
+    failure->Assign("Power requirement not met");
+    return Preflight::kPowerLow;
+  }
   SetUpSyslog(walk);
   report::Log("Orvenix - PerformTests\r\n");
-  if (!TestsPass(walk, failure)) return Preflight::kTestFailed;
+  if (!TestsPass(walk, failure)) {
+    ReportFailedTest(*failure);
+    return Preflight::kTestFailed;
+  }
   report::Log("Orvenix - Cleanup\r\n");
   CleanUp(walk);
   report::Log("Orvenix - CheckSpace\r\n");
   std::uint32_t total = 0;
-  if (!HasSpace(walk, &total)) return Preflight::kSpaceShort;
+  if (!HasSpace(walk, &total)) {
+    failure->Assign("No space available");
+    return Preflight::kSpaceShort;
+  }
   report::Log("Orvenix - SetTransferBytes\r\n");
   upgrade::SetExpectedBytes(total);
   return Preflight::kReady;
@@ -123,6 +141,22 @@ void StartThread(Walk& walk) noexcept {
   upgrade::EndUpgrade();
 }
 
+base::FixedText<64> UniqueId(const Walk& walk) noexcept {
+  base::FixedText<64> id;
+  const WalkLock lock;
+  if (walk.job != nullptr) id.Assign(walk.job->GetUniqueId());
+  return id;
+}
+
+/// Tells the management system and gives it time to look, before the connection ends. An upgrade
+/// that runs beside this opens another for its next message.
+void ReportFailure(const Walk& walk, const FailureText& failure) noexcept {
+  const base::FixedText<64> id = UniqueId(walk);
+  report::SendDeviceEvent(id.c_str(), report::kEventUpgradeFailed, failure.c_str());
+  Sleep(kFailurePauseMs);
+  report::CloseTransferHandle();
+}
+
 bool HasJob(const Walk& walk) noexcept {
   const WalkLock lock;
   return walk.job != nullptr;
@@ -140,7 +174,7 @@ IcfgResult StartJob(Walk& walk) noexcept {
   if (outcome == Preflight::kReady) {
     StartThread(walk);
   } else {
-    Sleep(kFailurePauseMs);
+    ReportFailure(walk, failure);
     upgrade::EndUpgrade();
   }
   return ToResult(outcome);

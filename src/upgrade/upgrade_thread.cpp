@@ -4,11 +4,13 @@
 
 #include <atomic>
 
+#include "base/format.h"
 #include "configlet/version/version.h"
 #include "device/handle.h"
 #include "http/job_client.h"
 #include "orvenix/upgrade_thread.h"
 #include "report/log/log.h"
+#include "report/messages/message_link.h"
 #include "report/window/progress_window.h"
 #include "upgrade/cleanup.h"
 #include "upgrade/file_lists.h"
@@ -124,9 +126,39 @@ void ShowOutcome(const Run& run) noexcept {
   Log("%s\r\n", run.error_text.c_str());
 }
 
+/// Tells the management system: first the status, then the event.
+void ReportBegin(const UpgradeConfig& job) noexcept {
+  const char* const own = job.GetUpgBeginMsg();
+  report::SetRWIStatus(report::kStateUpgrading, own[0] != '\0' ? own : "Device Upgrading");
+  report::SendDeviceEvent(job.GetUniqueId(), report::kEventUpgradeStarted, nullptr);
+}
+
+/// KEPT ODDITY: the begin message decides whether the end message counts. A job that has only an
+/// end message ends with "Upgrade Complete", and one that has only a begin message with nothing.
+const char* EndMessage(const UpgradeConfig& job) noexcept {
+  return job.GetUpgBeginMsg()[0] != '\0' ? job.GetUpgEndMsg() : "Upgrade Complete";
+}
+
+/// Tells the management system: first the event, then, after a pause, the status.
+void ReportEnd(const Run& run) noexcept {
+  base::FixedText<256> reason;
+  const char* const id = run.job.GetUniqueId();
+  if (run.succeeded) {
+    reason.Assign(EndMessage(run.job));
+    report::SendDeviceEvent(id, report::kEventUpgradeComplete, nullptr);
+  } else {
+    base::Format(reason.data(), reason.capacity(), "Upgrade Failed: %s", run.error_text.c_str());
+    report::SendDeviceEvent(id, report::kEventUpgradeFailed, run.error_text.c_str());
+  }
+  Sleep(kPauseMs);
+  report::SetRWIStatus(report::kStateIdle, reason.c_str());
+  Sleep(2 * kPauseMs);
+}
+
 /// From the job's first step to its report.
 void CarryOut(Run& run, std::int32_t mode) noexcept {
   SetOverallProgress(2);
+  ReportBegin(run.job);
   run.pass = BeginPass(run.job);
   Log("Orvenix - UpgradeThread - InitRAM\r\n");
   InitRam(run.job);
@@ -148,8 +180,6 @@ void ShowEnd() noexcept {
   SetOverallProgress(100);
   report::RepaintWindow();
   report::CloseLogFile();
-  Sleep(kPauseMs);
-  Sleep(2 * kPauseMs);
 }
 
 void FreeJob(UpgradeConfig* job) noexcept {
@@ -174,12 +204,14 @@ void RunJob(const Handover& handed) noexcept {
   KeepAwake keep_awake;
   CarryOut(run, handed.mode);
   ShowEnd();
+  ReportEnd(run);
   EndUpgrade();  // from here on the host may hand over the next job; it begins when this thread
                  // ends
   light.Release();
   keep_awake.Stop();
   in_progress.Delete();
   http::ReleaseJobClient();
+  report::CloseTransferHandle();
   Sleep(kPauseMs);
   FreeJob(job);
   report::CloseProgressWindow();

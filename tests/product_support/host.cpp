@@ -1,11 +1,13 @@
 #include "product_support/host.h"
 
+#include <algorithm>
 #include <ostream>
 
 #include "ce/kernel.h"
 #include "configlet/walk.h"
 #include "kernel/handle_table.h"
 #include "kernel/kernel.h"
+#include "library/management_queue.h"
 #include "memory/memory.h"
 #include "net/network.h"
 #include "orvenix/configlet.h"
@@ -88,6 +90,8 @@ std::uint32_t WalkJob(const HostJob& job) {
   Set("Port", job.syslog_port);
   Set("Address", job.syslog_address);
   IcfgEndGroup("Syslog", 0, 0);
+  Set("BeginText", job.begin_text);
+  Set("EndText", job.end_text);
   IcfgBeginGroup("HTTPServer", 0, 0);
   Set("BaseURL", job.base_url);
   IcfgEndGroup("HTTPServer", 0, 0);
@@ -119,12 +123,16 @@ bool AwaitEndOfJobs(sim::Device& device, std::uint32_t limit_s) {
 Holdings HoldingsOf(sim::Device& device) {
   Holdings holdings;
   holdings.handles = device.kernel().OpenHandles();
+  const std::vector<std::string> names = device.kernel().NamedObjects();
+  const bool marked = std::find(names.begin(), names.end(), "UPGRADE_CLIENT") != names.end();
+  if (marked) --holdings.handles;
   holdings.sockets = device.network().open_sockets();
   holdings.blocks = device.memory().live_blocks();
   holdings.gdi_objects = device.screen().gdi_objects();
   holdings.device_contexts = device.screen().device_contexts();
   holdings.power_requirements = device.power().Held().size();
   holdings.windows = device.screen().Windows().size();
+  holdings.queue_connections = device.messages().open_connections();
   const auto lock = device.world().Acquire();
   holdings.sockets_started = device.network().started();
   return holdings;
@@ -134,7 +142,8 @@ void PrintTo(const Holdings& holdings, std::ostream* out) {
   *out << holdings.handles << " handles, " << holdings.sockets << " sockets, " << holdings.blocks
        << " blocks, " << holdings.gdi_objects << " pens, " << holdings.device_contexts
        << " device contexts, " << holdings.power_requirements << " power requirements, "
-       << holdings.windows << " windows, sockets started " << holdings.sockets_started << " times";
+       << holdings.windows << " windows, " << holdings.queue_connections
+       << " connections to the queue, sockets started " << holdings.sockets_started << " times";
 }
 
 void DropKeptJob() {

@@ -36,6 +36,8 @@ struct HostJob {
   std::string required_space = "1000";
   std::string syslog_port;
   std::string syslog_address;
+  std::string begin_text;
+  std::string end_text;
   bool show_gui = true;
   std::vector<HostTest> tests;
   std::vector<std::string> stop;     ///< programs
@@ -52,7 +54,8 @@ std::uint32_t EndJob();
 /// @return false when that has not come about after `limit_s` seconds
 bool AwaitEndOfJobs(sim::Device& device, std::uint32_t limit_s = 3600);
 
-/// What a program of the device may hold too much of.
+/// What a program of the device may hold too much of. The handle of the mutex that marks the
+/// upgrade client, which is kept from the first message on, does not count.
 struct Holdings {
   std::size_t handles = 0;
   std::size_t sockets = 0;
@@ -61,13 +64,14 @@ struct Holdings {
   std::size_t device_contexts = 0;
   std::size_t power_requirements = 0;
   std::size_t windows = 0;
+  std::size_t queue_connections = 0;
   unsigned sockets_started = 0;
 
   friend bool operator==(const Holdings& a, const Holdings& b) {
     return a.handles == b.handles && a.sockets == b.sockets && a.blocks == b.blocks &&
            a.gdi_objects == b.gdi_objects && a.device_contexts == b.device_contexts &&
            a.power_requirements == b.power_requirements && a.windows == b.windows &&
-           a.sockets_started == b.sockets_started;
+           a.queue_connections == b.queue_connections && a.sockets_started == b.sockets_started;
   }
 };
 Holdings HoldingsOf(sim::Device& device);

@@ -1,22 +1,27 @@
 #include "report/messages/host_callbacks.h"
 
-#include <atomic>
+#include "device/lock.h"
 
 namespace report {
 namespace {
 
-std::atomic<std::uintptr_t> host_context{0};
-std::atomic<const IcfgCallbacks*> host_table{nullptr};
+/// As old as the process, and without a destructor.
+struct State {
+  device::Lock lock;  ///< around what follows, never around a call of the host
+  HostCallbacks callbacks;
+};
+State state;
 
 }  // namespace
 
 void SetHostCallbacks(HostCallbacks callbacks) noexcept {
-  host_context.store(callbacks.context, std::memory_order_relaxed);
-  host_table.store(callbacks.table, std::memory_order_relaxed);
+  const device::LockGuard lock(state.lock);
+  state.callbacks = callbacks;
 }
 
 HostCallbacks GetHostCallbacks() noexcept {
-  return {host_context.load(std::memory_order_relaxed), host_table.load(std::memory_order_relaxed)};
+  const device::LockGuard lock(state.lock);
+  return state.callbacks;
 }
 
 }  // namespace report

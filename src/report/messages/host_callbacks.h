@@ -12,11 +12,10 @@ struct HostCallbacks {
   const IcfgCallbacks* table = nullptr;  ///< the host's, null until it has set one
 };
 
-/// Remembers both for the life of the process. The host's thread.
+/// Remembers both for the life of the process. Any thread.
 void SetHostCallbacks(HostCallbacks callbacks) noexcept;
 
-/// Any thread. A host that changes its table while an upgrade runs may see its new context with
-/// its old table once.
+/// Both as they were set together. Any thread.
 [[nodiscard]] HostCallbacks GetHostCallbacks() noexcept;
 
 }  // namespace report

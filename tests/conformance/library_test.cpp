@@ -1,0 +1,57 @@
+// What the platform's calls for libraries and mutexes do, seen through the platform alone.
+#include <gtest/gtest.h>
+
+#include "coredll.h"
+
+namespace {
+
+constexpr DWORD kPoison = 0xBDBDBDBD;
+
+TEST(LoadLibraryWTest, GivesTheSameModuleForTheSameLibrary) {
+  const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
+  ASSERT_NE(module, nullptr);
+  EXPECT_EQ(LoadLibraryW(TEXT("KX_CLAPI_DLL.dll")), module);
+}
+
+TEST(LoadLibraryWTest, SaysThatALibraryIsMissing) {
+  SetLastError(kPoison);
+  EXPECT_EQ(LoadLibraryW(TEXT("no_such_library")), nullptr);
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_MOD_NOT_FOUND});
+}
+
+TEST(GetProcAddressWTest, FindsFunctionsByTheirExactName) {
+  const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
+  const FARPROC open = GetProcAddressW(module, TEXT("lapi_open"));
+  EXPECT_NE(open, nullptr);
+  EXPECT_EQ(GetProcAddressW(module, TEXT("lapi_open")), open);
+  EXPECT_NE(GetProcAddressW(module, TEXT("lapi_close")), open);
+  SetLastError(kPoison);
+  EXPECT_EQ(GetProcAddressW(module, TEXT("LAPI_OPEN")), nullptr);
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_PROC_NOT_FOUND});
+}
+
+TEST(GetProcAddressWTest, RefusesWhatIsNoModule) {
+  SetLastError(kPoison);
+  EXPECT_EQ(GetProcAddressW(nullptr, TEXT("lapi_open")), nullptr);
+  EXPECT_NE(GetLastError(), kPoison);
+}
+
+TEST(CreateMutexWTest, GivesEveryCallerAHandleOfItsOwnToTheNamedMutex) {
+  SetLastError(kPoison);
+  const HANDLE first = CreateMutexW(nullptr, FALSE, TEXT("CONFORMANCE"));
+  ASSERT_NE(first, nullptr);
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_SUCCESS});
+  const HANDLE second = CreateMutexW(nullptr, FALSE, TEXT("CONFORMANCE"));
+  EXPECT_NE(second, first);
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_ALREADY_EXISTS});
+  EXPECT_TRUE(CloseHandle(first));
+  const HANDLE third = CreateMutexW(nullptr, FALSE, TEXT("CONFORMANCE"));
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_ALREADY_EXISTS}) << "the second handle keeps it";
+  CloseHandle(second);
+  CloseHandle(third);
+  const HANDLE fresh = CreateMutexW(nullptr, FALSE, TEXT("CONFORMANCE"));
+  EXPECT_EQ(GetLastError(), DWORD{ERROR_SUCCESS}) << "without handles it is gone";
+  CloseHandle(fresh);
+}
+
+}  // namespace
