@@ -8,6 +8,7 @@
 
 #include "device/device.h"
 #include "kernel/kernel.h"
+#include "library/management_queue.h"
 #include "storage/storage.h"
 #include "text/names.h"
 #include "tools/configlet_library.h"
@@ -53,9 +54,9 @@ class UpgradeRun {
         job_(ReadJob(options.job)),
         profile_(ReadDeviceFolder(options.device)),
         configlet_(LoadConfiglet(options.library)),
+        view_(StyleOf(options)),
         world_(sim::World::MakeReal()),
-        device_(MakeDevice()),
-        view_(StyleOf(options)) {
+        device_(MakeDevice()) {
     callbacks_.set_data = &TakeDocument;
   }
 
@@ -67,7 +68,9 @@ class UpgradeRun {
                      {"job", options_.job.string()},
                      {"device", options_.device.string()}});
     configlet_.initialize();
-    configlet_.set_callbacks(reinterpret_cast<std::uintptr_t>(&view_), &callbacks_);
+    if (options_.callbacks) {
+      configlet_.set_callbacks(reinterpret_cast<std::uintptr_t>(&view_), &callbacks_);
+    }
     WalkJob(configlet_, job_, options_.job.string(),
             [this](const WalkedCall& call) { ShowCall(call); });
     Outcome outcome;
@@ -102,12 +105,16 @@ class UpgradeRun {
   static int TakeDocument(std::uintptr_t context, const char* text, std::int32_t length,
                           const IcfgCallbacks*) {
     if (text == nullptr || length <= 0) return 0;
-    reinterpret_cast<RunView*>(context)->ShowDocument(
-        std::string(text, static_cast<std::size_t>(length - 1)));
+    reinterpret_cast<RunView*>(context)->ShowMessage(
+        {"host", std::string(text, static_cast<std::size_t>(length - 1))});
     return 0;
   }
 
   void Watch() {
+    device_->messages().Listen([this](const sim::QueuedMessage& message) {
+      const std::string at = message.master.empty() ? "" : "@" + message.master;
+      view_.ShowMessage({message.destination + at, message.text});
+    });
     sim::Screen& screen = device_->screen();
     if (!options_.screens.empty()) screen.SavePaints(options_.screens);
     screen.OnPaint([this, &screen](const sim::FinishedPaint&) {
@@ -216,9 +223,9 @@ class UpgradeRun {
   const sim::Profile profile_;
   const ConfigletLibrary configlet_;
   IcfgCallbacks callbacks_{};
+  RunView view_;  // the device's threads use it to their end
   std::unique_ptr<sim::World> world_;
   std::unique_ptr<sim::Device> device_;
-  RunView view_;
   const Clock::time_point start_ = Clock::now();
 };
 

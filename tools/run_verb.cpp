@@ -14,6 +14,8 @@ void AddRunVerb(CLI::App& app, Action& action) {
   run->add_option("--screens", options->screens, "save a picture of every paint in this folder");
   run->add_option("--timeout", options->timeout_s, "seconds to wait for the end of the upgrade")
       ->capture_default_str();
+  run->add_flag("--callbacks,!--no-callbacks", options->callbacks,
+                "take statuses as the host (default), or leave them to the message queue");
   run->add_option("--library", options->library,
                   "the configlet library (default: lib/liborvenix.so beside this program)");
   run->add_flag("--force", options->force, "run the job although 'job lint' finds errors in it");

@@ -98,13 +98,16 @@ void RunView::ShowProgress(const sim::ProgressView& view) {
   last_ = view;
 }
 
-void RunView::ShowDocument(const std::string& text) {
+void RunView::ShowMessage(const Message& message) {
   const std::lock_guard<std::mutex> hold(mutex_);
-  if (style_ == Style::kJson) {
-    Print({{"event", "document"}, {"text", text}});
-  } else {
-    Line("document: " + text);
+  if (style_ != Style::kJson) {
+    Line(DescribeMessage(message));
+    return;
   }
+  nlohmann::ordered_json event{{"event", "document"}};
+  event.update(MessageMembers(message));
+  event["text"] = message.document;
+  Print(event);
 }
 
 void RunView::ShowRemark(const std::string& text) {

@@ -8,6 +8,7 @@
 #include <string>
 #include <vector>
 
+#include "tools/message_view.h"
 #include "window/progress_view.h"
 
 namespace tools {
@@ -22,7 +23,7 @@ namespace tools {
 [[nodiscard]] int Percent(const sim::BarView& bar);
 
 /// Shows an upgrade while it runs: status lines as they come, both bars in the last line of a
-/// terminal (elsewhere a line whenever the upper bar has moved), documents and remarks; with JSON
+/// terminal (elsewhere a line whenever the upper bar has moved), messages and remarks; with JSON
 /// one object a line. Any thread may call any of it.
 class RunView {
  public:
@@ -35,7 +36,7 @@ class RunView {
   RunView& operator=(const RunView&) = delete;
 
   void ShowProgress(const sim::ProgressView& view);
-  void ShowDocument(const std::string& text);
+  void ShowMessage(const Message& message);
   /// A line of the program's own. With JSON it is left out; the events say the same.
   void ShowRemark(const std::string& text);
   /// An object of its own; shown with JSON only.

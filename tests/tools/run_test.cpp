@@ -15,6 +15,7 @@ namespace {
 
 namespace fs = std::filesystem;
 using ::testing::Contains;
+using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 
 std::vector<nlohmann::json> Events(const std::string& output) {
@@ -22,6 +23,19 @@ std::vector<nlohmann::json> Events(const std::string& output) {
   std::istringstream in(output);
   for (std::string line; std::getline(in, line);) events.push_back(nlohmann::json::parse(line));
   return events;
+}
+
+/// "KIND to RECEIVER: STATE or CODE" of each message, in order.
+std::vector<std::string> Messages(const std::vector<nlohmann::json>& events) {
+  std::vector<std::string> messages;
+  for (const nlohmann::json& event : events) {
+    if (event.at("event") != "document") continue;
+    const char* const number = event.at("kind") == "status" ? "state" : "code";
+    messages.push_back(event.at("kind").get<std::string>() + " to " +
+                       event.at("to").get<std::string>() + ": " +
+                       std::to_string(event.at(number).get<int>()));
+  }
+  return messages;
 }
 
 class RunTest : public ServerProcessTest {
@@ -64,6 +78,9 @@ TEST_F(RunTest, BringsEveryFileToTheDeviceAndTellsWhatHappens) {
   };
   EXPECT_TRUE(shown("Upgrade Initialization..."));
   EXPECT_TRUE(shown("Upgrade Complete"));
+  EXPECT_THAT(Messages(events),
+              ElementsAre("status to host: 4", "device-event to TW_Event_DB@~MASTERKX: 205181",
+                          "device-event to TW_Event_DB@~MASTERKX: 205182", "status to host: 1"));
   EXPECT_EQ(ReadWholeFile(scratch_.path() / "device/storage/Application/sub/data.bin"),
             std::string(200'000, 'd'));
   EXPECT_TRUE(fs::exists(scratch_.path() / "screens/paint-000001.png"));
@@ -97,6 +114,19 @@ TEST_F(RunTest, TellsThatTheServerCouldNotBeReached) {
   EXPECT_THAT(run.errors, HasSubstr("is the server running at http://127.0.0.2:9?"));
 }
 
+TEST_F(RunTest, LeavesStatusesToTheMessageQueueWhenAsked) {
+  MakeFiles();
+  MakeBundleFor(9);
+  MakeDevice();
+
+  const Ended run = Run("run out/job.xml --device device --timeout 1 --no-callbacks --json");
+
+  EXPECT_THAT(
+      Messages(Events(run.output)),
+      ElementsAre("status to TW_CLIENT: 4", "device-event to TW_Event_DB@~MASTERKX: 205181"));
+  EXPECT_TRUE(fs::exists(scratch_.path() / "device/messages/000001-TW_CLIENT.xml"));
+}
+
 TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
   MakeFiles();
   MakeBundleFor(8080);
@@ -104,6 +134,8 @@ TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
 
   const Ended power = Run("run out/job.xml --device device");
   EXPECT_EQ(power.code, static_cast<int>(ExitCode::kNoPower)) << power.errors;
+  EXPECT_THAT(power.output,
+              HasSubstr("event 205180 to TW_Event_DB@~MASTERKX: Power requirement not met\n"));
   EXPECT_THAT(power.errors, HasSubstr("out/job.xml:"));
 
   std::string job = ReadWholeFile(scratch_.path() / "out/job.xml");
