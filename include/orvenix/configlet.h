@@ -50,7 +50,8 @@ struct IcfgCallbacks {
 
   /*
    * Receives one status document. Called by the host's own thread inside an Icfg function and by
-   * the upgrade's threads. May be null.
+   * the upgrade's threads. Inside it the host may call the functions below, one call at a time as
+   * ever. May be null.
    *
    * context  what IcfgSetCallbacks was given
    * text     the document; valid during the call

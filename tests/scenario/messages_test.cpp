@@ -15,6 +15,7 @@
 #include "orvenix/upgrade_config.h"
 #include "orvenix/upgrade_thread.h"
 #include "power/power.h"
+#include "product_support/jobs.h"
 #include "scenario/scenario_test.h"
 
 namespace {
@@ -56,6 +57,10 @@ class MessagesTest : public test::ScenarioTest {
   /// With the unique id that the device's own configuration gives its jobs.
   [[nodiscard]] static std::string Event(std::uint32_t code, const std::string& text = "") {
     return kToEvents + EventText(kNow, UpgradeConfig().GetUniqueId(), code, text);
+  }
+
+  [[nodiscard]] static test::HostTest FailingTest(const std::string& message) {
+    return {"No\\Such\\Key", "Name", "REG_SZ", "EQ", "value", message};
   }
 
  private:
@@ -167,6 +172,21 @@ TEST_F(MessagesTest, TellOfAnUpgradeThatAnOutsideProgramStarts) {
                                   Event(205182), Status(kToClient, 1, "Upgrade Complete")));
 }
 
+TEST_F(MessagesTest, TellWhyAnOutsideProgramsUpgradeFailed) {
+  auto* const job = new UpgradeConfig;
+  job->SetBaseURL(test::kServerUrl);
+  const test::HostTest test = FailingTest("Wrong model");
+  test::AddTest(*job, {"HKEY_LOCAL_MACHINE", test.key, test.value_name, test.type, test.operation,
+                       test.value, test.message});
+  HANDLE const thread = StartUpgradeThread(job, 1);
+  ASSERT_NE(thread, nullptr);
+  CloseHandle(thread);
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_THAT(Sent(), ElementsAre(Status(kToClient, 4, "Device Upgrading"), Event(205181),
+                                  Event(205180, "Wrong model"),
+                                  Status(kToClient, 1, "Upgrade Failed: Wrong model")));
+}
+
 // ---- refusals ----
 
 TEST_F(MessagesTest, TellWhyAnUpgradeDoesNotStart) {
@@ -180,6 +200,27 @@ TEST_F(MessagesTest, TellWhyAnUpgradeDoesNotStart) {
                                   Event(205180, "No space available")))
       << "an event each, and no status";
   EXPECT_EQ(device().messages().open_connections(), 0U);
+}
+
+TEST_F(MessagesTest, TellOfAFailedTestByAStatusAndAnEvent) {
+  job().tests = {FailingTest("Wrong model <&>")};
+  EXPECT_EQ(Start(job()), ICFG_TEST_FAILED);
+  test::DropKeptJob();
+  record().TakeStatuses();
+  EXPECT_EQ(Start(job()), ICFG_TEST_FAILED);
+  const std::string event = Event(205180, "Wrong model &lt;&amp;&gt;");
+  const std::string words = "Upgrade Failed: Wrong model <&>";
+  EXPECT_THAT(Sent(),
+              ElementsAre(Status(kToClient, 1, words), event, Status(kToHost, 1, words), event));
+}
+
+TEST_F(MessagesTest, CutTheWordsOfAFailedTestInTheStatus) {
+  const std::string message(255, 'm');
+  job().tests = {FailingTest(message)};
+  EXPECT_EQ(Start(job()), ICFG_TEST_FAILED);
+  EXPECT_THAT(Sent(),
+              ElementsAre(Status(kToClient, 1, ("Upgrade Failed: " + message).substr(0, 255)),
+                          Event(205180, message)));
 }
 
 TEST_F(MessagesTest, EndTheConnectionThreeSecondsAfterARefusal) {
