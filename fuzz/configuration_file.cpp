@@ -76,7 +76,7 @@ std::string_view Text(const char (&field)[Capacity]) {
 
 void CheckFolder(std::string_view folder, bool may_be_ram) {
   const bool is_ram = folder.size() == 4 && folder.back() == ':';
-  Require(folder.size() == 255 || folder.back() == '\\' || (may_be_ram && is_ram));
+  Require(folder.back() == '\\' || (may_be_ram && is_ram));
 }
 
 void CheckRecords(const UpgradeConfig& job) {

@@ -165,8 +165,10 @@ class ORVENIX_EXPORT UpgradeConfig {
   ///
   /// @param name  converted with the device's code page; null counts as empty. A path of more than
   ///   259 characters cannot be opened.
-  /// @return 0 when the file cannot be opened, otherwise 1: also when it is malformed, which adds
-  ///   nothing, and when there is no memory to read it, which adds nothing and deletes nothing.
+  /// @return 0 when the file cannot be opened, otherwise 1. That is also the answer when what could
+  ///   be read is malformed, or there is no memory for its elements, which adds nothing; and when
+  ///   there is no memory for its bytes, which adds nothing and deletes nothing. A list that there
+  ///   was no memory for the whole of says that it is incomplete.
   int LoadFromFile(const orvenix::WideChar* name) noexcept;
 
   /// Writes what the job holds, line by line and cut at 4095 characters, to the library's

@@ -1,13 +1,13 @@
 #include "upgrade_config/configuration_reader.h"
 
-#include <coredll.h>
-
 #include <cstddef>
+#include <utility>
 
 #include "base/number.h"
 #include "base/text.h"
 #include "device/local_memory.h"
 #include "report/log/log.h"
+#include "upgrade_config/list_keeper.h"
 #include "upgrade_config/package_selection.h"
 
 namespace orvenix {
@@ -19,18 +19,19 @@ using base::LeadingInt;
 using base::View;
 using xml::XmlStep;
 
-constexpr std::string_view kShowGui = "ShowGUI";
-
 /// The file name and extension at the end of a path.
 std::string_view FileNameOf(std::string_view path) noexcept {
   const std::size_t separator = path.find_last_of("\\/:");
   return separator == std::string_view::npos ? path : base::Part(path, separator + 1);
 }
 
+/// Copies a folder so that it ends in a backslash even where it is cut: without one, names of files
+/// would be joined to its last name.
 template <std::size_t Capacity>
 void CopyFolder(char (&field)[Capacity], std::string_view folder) noexcept {
-  base::FixedText<Capacity> text(folder);
-  if (!base::EndsWith(folder, "\\")) text.Append("\\");
+  if (base::EndsWith(folder, "\\")) folder.remove_suffix(1);
+  base::FixedText<Capacity> text(base::Part(folder, 0, Capacity - 2));
+  text.Append("\\");
   CopyText(field, text.view());
 }
 
@@ -56,7 +57,8 @@ void TakeTestField(tagRegistryTest& test, std::string_view name, std::string_vie
 
 }  // namespace
 
-const ConfigurationReader::TextElement ConfigurationReader::kTextElements[] = {
+// Constant expressions: the library has nothing to do before its first call.
+constexpr ConfigurationReader::TextElement ConfigurationReader::kTextElements[] = {
     {"HTTPPort",
      [](UpgradeConfig& job, const char* text) noexcept { job.SetHTTPPort(LeadingInt(text)); }},
     {"BaseUrl",
@@ -78,17 +80,18 @@ const ConfigurationReader::TextElement ConfigurationReader::kTextElements[] = {
      }},
     {"BeginText", [](UpgradeConfig& job, const char* text) noexcept { job.SetUpgBeginMsg(text); }},
     {"EndText", [](UpgradeConfig& job, const char* text) noexcept { job.SetUpgEndMsg(text); }},
-    {kShowGui,
+    {"ShowGUI",
      [](UpgradeConfig& job, const char* text) noexcept {
        job.SetShowGUI(EqualIgnoringCase(text, "false") ? 0 : 1);
-     }},
+     },
+     true},
     {"DownloadLoopCnt",
      [](UpgradeConfig& job, const char* text) noexcept {
        job.fields_.download_loop_count = LeadingInt(text);
      }},
 };
 
-const ConfigurationReader::OtherElement ConfigurationReader::kOtherElements[] = {
+constexpr ConfigurationReader::OtherElement ConfigurationReader::kOtherElements[] = {
     {"UpgradeConfig", &ConfigurationReader::TakeVersion},
     {"Syslog", &ConfigurationReader::TakeSyslog},
     {"FlashWriter", &ConfigurationReader::TakeFlashWriter},
@@ -115,8 +118,8 @@ XmlStep ConfigurationReader::Next() noexcept {
 
 void ConfigurationReader::TakeElement() noexcept {
   for (const TextElement& element : kTextElements) {
-    const bool same =
-        element.name == kShowGui ? EqualIgnoringCase(Name(), kShowGui) : Name() == element.name;
+    const bool same = element.in_any_letter_case ? EqualIgnoringCase(Name(), element.name)
+                                                 : Name() == element.name;
     if (!same) continue;
     if (const char* const text = cursor_.Text(); text != nullptr) element.take(job_, text);
     return;
@@ -175,10 +178,10 @@ void ConfigurationReader::TakeDownload() noexcept {
   const char* const to = cursor_.Attribute("DestDir");
   if (from == nullptr || to == nullptr) return;
   auto file = device::LocalBlock<tagDownloadFile>::Allocate();
-  if (!file) return;
+  if (!file) return ListKeeper::NoteMissing(job_.download_files_);
   CopyText(file->source, from);
   CopyText(file->destination, to);
-  job_.AddDownloadFile(file.Release());
+  ListKeeper::TakeNew(job_.download_files_, std::move(file));
 }
 
 void ConfigurationReader::ReadDiskCleanup() noexcept {
@@ -195,7 +198,8 @@ void ConfigurationReader::TakeCleanup() noexcept {
   if (EqualIgnoringCase(action, "save")) job_.AddFileSave(path);
 }
 
-// A test from a file has no defaults: without a root or a type of its own it can only fail.
+// A test from a file has no defaults: without a type of its own it can only fail. Without a root it
+// is made where the test before it was.
 void ConfigurationReader::ReadRegistry() noexcept {
   report::Log("UpgradeConfig - Registry\r\n");
   auto test = device::LocalBlock<tagRegistryTest>::Allocate();
@@ -203,9 +207,9 @@ void ConfigurationReader::ReadRegistry() noexcept {
     const char* const text = cursor_.Text();
     if (test && text != nullptr) TakeTestField(*test, Name(), text);
   });
-  if (!test) return;
+  if (!test) return ListKeeper::NoteMissing(job_.registry_tests_);
   report::Log("UpgradeConfig - Adding Registry Item\r\n");
-  job_.AddRegistryTest(test.Release());
+  ListKeeper::TakeNew(job_.registry_tests_, std::move(test));
 }
 
 void ConfigurationReader::ReadFirmware() noexcept {
@@ -226,7 +230,7 @@ void ConfigurationReader::TakePackage() noexcept {
   const char* const from = cursor_.Attribute("SourceDir");
   if (from == nullptr) return;
   device::LocalObject<FirmwarePackage> package(new FirmwarePackage);
-  if (!package) return;
+  if (!package) return ListKeeper::NoteMissing(job_.firmware_packages_);
   CopyFolder(package->source_folder, from);
   CopyText(package->base, View(cursor_.Attribute("Base")));
   const char* const to = cursor_.Attribute("DestDir");
@@ -239,8 +243,9 @@ void ConfigurationReader::TakePackage() noexcept {
   CopyText(package->command_line, View(cursor_.Attribute("CmdLine")));
   CopyText(package->additional_parameters, View(cursor_.Attribute("AdditionalParms")));
   const std::string_view options = package->additional_parameters;
-  if (options.find("Pass=") != std::string_view::npos) job_.fields_.multi_pass = 1;
-  job_.AddFirmwarePkg(package.Release());
+  const bool names_pass = options.find("Pass=") != std::string_view::npos;
+  const bool listed = ListKeeper::TakeNew(job_.firmware_packages_, std::move(package));
+  if (listed && names_pass) job_.fields_.multi_pass = 1;
 }
 
 }  // namespace orvenix

@@ -9,8 +9,8 @@
 namespace orvenix {
 
 /// One walk over a parsed configuration file. Elements are known by their names, wherever they
-/// stand; what is unknown or lacks a part that it needs is passed over, and so is what there is no
-/// memory for.
+/// stand; what is unknown or lacks a part that it needs is passed over. So is what there is no
+/// memory for, and its list says that it is incomplete.
 class ConfigurationReader {
  public:
   explicit ConfigurationReader(UpgradeConfig& job) noexcept : job_(job) {}
@@ -24,6 +24,7 @@ class ConfigurationReader {
   struct TextElement {
     std::string_view name;
     void (*take)(UpgradeConfig& job, const char* text) noexcept;
+    bool in_any_letter_case = false;
   };
   /// Elements that have attributes or children.
   struct OtherElement {

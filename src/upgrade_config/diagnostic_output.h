@@ -1,4 +1,4 @@
-// Where diagnostic texts of the library go.
+// Where diagnostic texts of the library go: nowhere, unless a test or a developer's build listens.
 #pragma once
 
 namespace orvenix {

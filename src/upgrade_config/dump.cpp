@@ -1,6 +1,4 @@
 // The job record as a text for people who look for a mistake in it.
-#include <coredll.h>
-
 #include <atomic>
 #include <cstdarg>
 #include <cstddef>

@@ -13,6 +13,16 @@ struct ListKeeper {
     if (!list.Append(element) && element != nullptr && !Holds(list, element)) release(element);
   }
 
+  /// Lists an element that was made for this list and that nothing else knows yet; looking for it
+  /// in a long list would be in vain. When there is no memory, its owner frees it.
+  /// @return whether it is listed
+  template <typename T, typename Owner>
+  static bool TakeNew(PointerList<T>& list, Owner element) noexcept {
+    if (!list.Append(element.get())) return false;
+    static_cast<void>(element.Release());
+    return true;
+  }
+
   /// Notes that an element could not even be made.
   template <typename T>
   static void NoteMissing(PointerList<T>& list) noexcept {

@@ -5,10 +5,12 @@
 
 #include <cstddef>
 #include <string_view>
+#include <utility>
 
 #include "base/format.h"
 #include "base/text.h"
 #include "device/identity/identity.h"
+#include "device/local_memory.h"
 #include "upgrade_config/list_keeper.h"
 
 namespace {
@@ -34,10 +36,10 @@ void FreeRecord(void* record) noexcept {
 
 void AddCopy(PointerList<char>& list, const char* text) noexcept {
   const std::string_view view = base::View(text);
-  auto* const copy = static_cast<char*>(LocalAlloc(LMEM_FIXED, view.size() + 1));
-  if (copy == nullptr) return ListKeeper::NoteMissing(list);
-  base::CopyText<char>(copy, view.size() + 1, view);
-  ListKeeper::Take(list, copy, FreeRecord);
+  device::LocalBlock<char> copy(static_cast<char*>(LocalAlloc(LMEM_FIXED, view.size() + 1)));
+  if (!copy) return ListKeeper::NoteMissing(list);
+  base::CopyText<char>(copy.get(), view.size() + 1, view);
+  ListKeeper::TakeNew(list, std::move(copy));
 }
 
 }  // namespace

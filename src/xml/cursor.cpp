@@ -1,6 +1,5 @@
 #include <cstring>
 
-#include "base/text.h"
 #include "xml/document.h"
 
 namespace xml {

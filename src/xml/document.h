@@ -4,8 +4,6 @@
 // levels. What the parser accepts stands in docs/formats/xml.md.
 #pragma once
 
-#include <coredll.h>
-
 #include <cstddef>
 #include <cstdint>
 
@@ -46,13 +44,13 @@ enum FormatFlag : std::uint8_t {
 class XmlDocument;
 
 /// Takes one piece of a written document. The bytes are only valid during the call.
-using XmlSink = void (*)(XmlDocument& document, const char* bytes, std::uint32_t length);
+using XmlSink = void (*)(XmlDocument& document, const char* bytes, std::uint32_t length) noexcept;
 
 /// Where the writer puts its output; see xml/writer.h.
 struct XmlOutput {
   XmlSink sink = nullptr;           ///< takes the pieces
   device::LocalBlock<char> buffer;  ///< result of the last Serialize()
-  char* position = nullptr;         ///< where the next piece goes while the buffer is being filled
+  char* position = nullptr;         ///< where CopyingSink puts the next piece
   /// Bytes counted by the last Serialize(). After a failed LoadFromText(): the error's offset.
   std::uint32_t length = 0;
 };
@@ -91,7 +89,8 @@ class XmlDocument {
   /// Of the last LoadFromText().
   [[nodiscard]] XmlParseError last_error() const noexcept { return last_error_; }
 
-  /// Where the parser stopped, after a failed LoadFromText(): bytes from the start of the text.
+  /// Where the parser stopped, after a failed LoadFromText() and until the document is written:
+  /// bytes from the start of the text.
   ///
   /// KEPT ODDITY: the place of an error is counted in the decoded text, in which every entity
   /// before it is the one byte that it became.

@@ -25,5 +25,7 @@ struct XmlElement {
 
 static_assert(sizeof(XmlElement) == 6 * sizeof(void*) && sizeof(XmlAttribute) == 3 * sizeof(void*),
               "nothing but pointers, so that records lie side by side in a pool block");
+static_assert(sizeof(void*) != 4 || sizeof(XmlElement) == 24,
+              "what XmlDocument::element_size() says");
 
 }  // namespace xml

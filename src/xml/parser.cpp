@@ -2,8 +2,8 @@
 
 #include <cstddef>
 #include <cstring>
+#include <string_view>
 
-#include "base/text.h"
 #include "xml/entities.h"
 
 namespace xml {
@@ -48,8 +48,8 @@ constexpr bool Is(Byte byte, Byte classes) noexcept {
 
 /// The first byte from `at` on that is in one of the classes. Four at a time: most of a document is
 /// passed here, and the loop's own work is as much as a byte's.
-template <Byte kStops, typename Place>
-Place* SkipUntil(Place* at) noexcept {
+template <Byte kStops, typename AnyByte>
+AnyByte* SkipUntil(AnyByte* at) noexcept {
   for (;; at += 4) {
     if (Is(at[0], kStops)) return at;
     if (Is(at[1], kStops)) return at + 1;
@@ -199,6 +199,7 @@ XmlParseError Parser::ParseMarkup() noexcept {
     ++at_;
     return ParseEndTag();
   }
+  // Quotes do not count there: an instruction with a ">" in a value ends early.
   if (*at_ == '?') return SkipPast(">", XmlParseError::kUnclosedTag);
   if (BeginsWith(at_, "!--")) {
     at_ += 3;

@@ -1,7 +1,10 @@
 #include "xml/writer.h"
 
+#include <coredll.h>
+
 #include <cstddef>
 #include <cstring>
+#include <string_view>
 
 #include "xml/entities.h"
 
@@ -91,12 +94,12 @@ class SinkOutput {
  public:
   explicit SinkOutput(XmlDocument& document) noexcept : document_(document) {}
 
-  void Put(std::string_view piece) {
+  void Put(std::string_view piece) noexcept {
     if (piece.empty()) return;
     document_.output().sink(document_, piece.data(), static_cast<std::uint32_t>(piece.size()));
   }
-  void PutName(const char* name) { Put(name); }
-  void PutEscaped(const char* text) {
+  void PutName(const char* name) noexcept { Put(name); }
+  void PutEscaped(const char* text) noexcept {
     for (;;) {
       const char* const run = text;
       while (EndsRun(*text) == 0) ++text;
@@ -163,7 +166,7 @@ class CopyingOutput {
 };
 
 template <typename Output>
-[[gnu::always_inline]] inline void WriteStart(const XmlElement& element, Output& out) {
+[[gnu::always_inline]] inline void WriteStart(const XmlElement& element, Output& out) noexcept {
   out.Put("<");
   out.PutName(element.name);
   for (const XmlAttribute* at = element.first_attribute; at != nullptr; at = at->next) {
@@ -176,7 +179,7 @@ template <typename Output>
 }
 
 template <typename Output>
-[[gnu::always_inline]] inline void WriteEnd(const XmlElement& element, Output& out) {
+[[gnu::always_inline]] inline void WriteEnd(const XmlElement& element, Output& out) noexcept {
   out.Put("</");
   out.PutName(element.name);
   out.Put(">");
@@ -185,7 +188,7 @@ template <typename Output>
 /// Depth first, back up along the links to the parents.
 template <typename Output>
 [[gnu::always_inline]] inline void WriteTree(const XmlElement* element, const Layout& layout,
-                                             Output& out) {
+                                             Output& out) noexcept {
   std::size_t level = 0;
   for (;;) {
     WriteStart(*element, out);
@@ -216,7 +219,7 @@ template <typename Output>
 /// @param out  a copy, so that its state stays in registers
 /// @return the output as it is then
 template <typename Output>
-Output Write(const XmlDocument& document, Output out) {
+Output Write(const XmlDocument& document, Output out) noexcept {
   const Layout layout(document.format_flags());
   if ((document.format_flags() & kFormatByteOrderMark) != 0) out.Put(kByteOrderMark);
   out.Put(kDeclaration);
@@ -227,12 +230,12 @@ Output Write(const XmlDocument& document, Output out) {
 
 }  // namespace
 
-void CountingSink(XmlDocument& document, const char* /*bytes*/, std::uint32_t length) {
+void CountingSink(XmlDocument& document, const char* /*bytes*/, std::uint32_t length) noexcept {
   std::uint32_t& sum = document.output().length;
   sum = length < UINT32_MAX - sum ? sum + length : UINT32_MAX;
 }
 
-void CopyingSink(XmlDocument& document, const char* bytes, std::uint32_t length) {
+void CopyingSink(XmlDocument& document, const char* bytes, std::uint32_t length) noexcept {
   char*& position = document.output().position;
   std::memcpy(position, bytes, length);
   position += length;
@@ -240,32 +243,30 @@ void CopyingSink(XmlDocument& document, const char* bytes, std::uint32_t length)
 
 // The two sinks of this file are taken in line: a call for each piece would cost more than its
 // bytes.
-void WriteToSink(XmlDocument& document) {
+void WriteToSink(XmlDocument& document) noexcept {
   XmlOutput& output = document.output();
   if (output.sink == CountingSink) {
     output.length = Write(document, CountingOutput(output.length)).length();
   } else if (output.sink == CopyingSink) {
+    if (output.position == nullptr) return;
     output.position = Write(document, CopyingOutput(output.position)).position();
   } else if (output.sink != nullptr) {
     Write(document, SinkOutput(document));
   }
 }
 
-const char* Serialize(XmlDocument& document, std::uint32_t* length) {
+// Sink and position are the caller's and stay as they are: a position left in the buffer would let
+// the next WriteToSink() write behind its end.
+const char* Serialize(XmlDocument& document, std::uint32_t* length) noexcept {
   XmlOutput& output = document.output();
   output.buffer.Reset();
-  output.length = 0;
-  output.sink = CountingSink;
-  WriteToSink(document);
+  output.length = Write(document, CountingOutput(0)).length();
   if (length != nullptr) *length = output.length;
   if (output.length == UINT32_MAX) return nullptr;
   output.buffer = device::LocalBlock<char>(
       static_cast<char*>(LocalAlloc(LMEM_FIXED, std::size_t{output.length} + 1)));
   if (!output.buffer) return nullptr;
-  output.position = output.buffer.get();
-  output.sink = CopyingSink;
-  WriteToSink(document);
-  *output.position = '\0';
+  *Write(document, CopyingOutput(output.buffer.get())).position() = '\0';
   return output.buffer.get();
 }
 

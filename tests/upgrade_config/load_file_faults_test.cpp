@@ -63,6 +63,18 @@ std::size_t Listed(const UpgradeConfig& job) {
          job.FilesToSave().size() + job.RegistryTests().size() + job.FirmwarePackages().size();
 }
 
+/// Lists that say that something is missing.
+std::size_t Incomplete(const UpgradeConfig& job) {
+  std::size_t lists = 0;
+  for (const bool incomplete :
+       {job.ProcessesToStop().incomplete(), job.DownloadFiles().incomplete(),
+        job.FilesToDelete().incomplete(), job.FilesToSave().incomplete(),
+        job.RegistryTests().incomplete(), job.FirmwarePackages().incomplete()}) {
+    if (incomplete) ++lists;
+  }
+  return lists;
+}
+
 // ---- where it lies ----
 
 TEST_F(LoadFileFaultsTest, PrefersTheSystemFolderAndDeletesTheFileThere) {
@@ -345,6 +357,8 @@ TEST_F(LoadFileFaultsTest, LosesOnlyWhatThereIsNoMemoryForAndLeaksNothing) {
       const bool understood = *job.GetUpgEndMsg() != '\0';
       EXPECT_EQ(understood, *job.GetBaseURL() != '\0') << nth << ": all or nothing of a document";
       EXPECT_EQ(listed, !understood ? 0U : fired ? 5U : 6U) << nth;
+      EXPECT_EQ(Incomplete(job), understood && fired ? 1U : 0U) << nth << ": what is lost is known";
+      EXPECT_EQ(job.IsMultiPass(), static_cast<int>(job.FirmwarePackages().size())) << nth;
       EXPECT_EQ(job.GetFirmwarePackageCount(), understood ? 1 : 0) << nth;
       EXPECT_EQ(Exists(kInSystemFolder), nth == 1) << nth;
     }

@@ -240,6 +240,24 @@ TEST_F(LoadFileTest, FindsElementsAtAnyDepth) {
   EXPECT_EQ(job.GetDownloadLoopCount(), 3);
 }
 
+TEST_F(LoadFileTest, FindsElementsInsideOthersThatItKnows) {
+  UpgradeConfig job;
+  EXPECT_EQ(LoadText(job,
+                     "<Any><UpgradeConfig Version='1'><HTTPPort>81</HTTPPort><Syslog Port='5'>"
+                     "<FlashWriter Name='w'><EndText>e</EndText></FlashWriter></Syslog>"
+                     "<Downloads><File SourceDir='a' DestDir='b'/></Downloads></UpgradeConfig>"
+                     "<BeginText>lost<DownloadLoopCnt>4</DownloadLoopCnt></BeginText></Any>"),
+            1);
+  EXPECT_STREQ(job.GetVersion(), "1");
+  EXPECT_EQ(job.GetHTTPPort(), 81);
+  EXPECT_EQ(job.GetSysLogPort(), 5);
+  EXPECT_STREQ(job.GetProcessName(), "w");
+  EXPECT_STREQ(job.GetUpgEndMsg(), "e");
+  EXPECT_THAT(Downloads(job), ElementsAre("a -> b"));
+  EXPECT_STREQ(job.GetUpgBeginMsg(), "") << "an element with children has no text";
+  EXPECT_EQ(job.GetDownloadLoopCount(), 4);
+}
+
 // ---- lists ----
 
 TEST_F(LoadFileTest, ListsProcessesToStop) {
@@ -482,9 +500,20 @@ TEST_F(LoadFileTest, CutsTheTextsOfAPackageToTheirFields) {
   Load(job, Package("HardwareVersion='*' SourceDir='" + x + "' Base='" + x + "' DestDir='" + x +
                     "' CmdLine='" + x + "' AdditionalParms='" + x + "'"));
   const std::string cut(255, 'x');
-  EXPECT_THAT(Packages(job), ElementsAre(cut + "|" + cut + "|" + cut));
+  const std::string folder = std::string(254, 'x') + "\\";
+  EXPECT_THAT(Packages(job), ElementsAre(folder + "|" + cut + "|" + folder));
   EXPECT_EQ(job.FirmwarePackages()[0]->command_line, cut);
   EXPECT_EQ(job.FirmwarePackages()[0]->additional_parameters, cut);
+}
+
+TEST_F(LoadFileTest, EndsAFolderOfAnyLengthWithABackslash) {
+  for (const std::size_t length : {253U, 254U, 255U, 256U, 300U}) {
+    const std::string name(length, 'x');
+    const std::string folder = name.substr(0, 254) + "\\";
+    UpgradeConfig job;
+    Load(job, Package("HardwareVersion='*' SourceDir='" + name + "' DestDir='" + name + "\\'"));
+    EXPECT_THAT(Packages(job), ElementsAre(folder + "||" + folder)) << length;
+  }
 }
 
 TEST_F(LoadFileTest, CountsPackagesThatItDoesNotTake) {
@@ -528,6 +557,14 @@ TEST_F(LoadFileTest, KnowsSeveralPassesByAParameterOfASelectedPackage) {
   UpgradeConfig job;
   Load(job, Package("HardwareVersion='MR' SourceDir='fw' AdditionalParms='Pass=2'"));
   EXPECT_EQ(job.IsMultiPass(), 0) << "for another device";
+
+  // Of a parameter that is cut, what is left counts.
+  for (const std::size_t before : {250U, 251U}) {
+    UpgradeConfig cut;
+    Load(cut, Package("HardwareVersion='*' SourceDir='fw' AdditionalParms='" +
+                      std::string(before, 'x') + "Pass=2'"));
+    EXPECT_EQ(cut.IsMultiPass(), before == 250 ? 1 : 0);
+  }
 }
 
 class LoadFileOnAnotherDeviceTest : public test::ConfigurationTest {

@@ -179,7 +179,7 @@ std::vector<std::string>& Pieces() {
   static std::vector<std::string> pieces;
   return pieces;
 }
-void Collect(XmlDocument& /*document*/, const char* bytes, std::uint32_t length) {
+void Collect(XmlDocument& /*document*/, const char* bytes, std::uint32_t length) noexcept {
   Pieces().emplace_back(bytes, length);
 }
 
@@ -201,7 +201,7 @@ TEST_F(WriterTest, HandsTheSamePiecesToAnySink) {
 
 /// Another sink that hands on what it gets, so that the sinks of the library see every piece.
 XmlSink handed_on_to = nullptr;
-void HandOn(XmlDocument& document, const char* bytes, std::uint32_t length) {
+void HandOn(XmlDocument& document, const char* bytes, std::uint32_t length) noexcept {
   handed_on_to(document, bytes, length);
 }
 
@@ -241,6 +241,54 @@ TEST_F(WriterTest, WritesNothingWithoutASink) {
   ASSERT_EQ(Load("<a/>"), XmlParseError::kNone);
   WriteToSink(document());
   EXPECT_EQ(document().output().length, 0U);
+}
+
+TEST_F(WriterTest, LeavesTheSinkToItsOwner) {
+  ASSERT_EQ(Load("<a/>"), XmlParseError::kNone);
+  const std::string written = Written();
+  WriteToSink(document());  // no sink: nothing may follow the text that was serialised
+  EXPECT_EQ(document().output().sink, nullptr);
+  EXPECT_EQ(document().output().position, nullptr);
+
+  document().output().sink = Collect;
+  EXPECT_EQ(Written(), written);
+  Pieces().clear();
+  WriteToSink(document());
+  EXPECT_FALSE(Pieces().empty());
+
+  document().Clear();
+  Pieces().clear();
+  WriteToSink(document());
+  EXPECT_EQ(Pieces(), std::vector<std::string>{kDeclaration}) << "the sink outlives the document";
+}
+
+TEST_F(WriterTest, CopiesNothingToNowhere) {
+  ASSERT_EQ(Load("<a/>"), XmlParseError::kNone);
+  XmlOutput& output = document().output();
+  std::string copy(42, '#');
+  output.sink = CopyingSink;
+  output.position = copy.data();
+  const std::string written = Written();
+  EXPECT_EQ(output.position, copy.data()) << "serialising has a place of its own";
+  WriteToSink(document());
+  EXPECT_EQ(copy, written);
+
+  ASSERT_NE(document().NewDocument("b"), nullptr);
+  EXPECT_EQ(output.sink, CopyingSink);
+  WriteToSink(document());
+  EXPECT_EQ(output.position, nullptr);
+}
+
+TEST_F(WriterTest, CountsWhereTheErrorsPlaceWas) {
+  ASSERT_EQ(Load("<a>"), XmlParseError::kNoTag);
+  EXPECT_EQ(document().error_offset(), 3U);
+  ASSERT_NE(Serialize(document()), nullptr);
+  EXPECT_EQ(document().error_offset(), 38U) << "the declaration's length";
+}
+
+TEST_F(WriterTest, WritesEmptyNamesThatCannotBeReadAgain) {
+  EXPECT_EQ(Rewritten("<a><></></a>"), "<a></></a>");
+  EXPECT_EQ(Load("<a></></a>"), XmlParseError::kWrongEndTag);
 }
 
 }  // namespace

@@ -28,9 +28,9 @@ struct SyslogLink : device::OnLocalHeap {
 /// As old as the process, and without a destructor: a target outlives its job.
 struct State {
   device::Lock lock;  ///< around what follows
-  std::uint16_t syslog_port;
-  SyslogLink* syslog;  ///< owned; null when there is no socket
-  FILE* file;          ///< stays open between lines only while there is a syslog port
+  std::uint16_t syslog_port = 0;
+  SyslogLink* syslog = nullptr;  ///< owned; null when there is no socket
+  FILE* file = nullptr;          ///< stays open between lines only while there is a syslog port
 };
 State state;
 
