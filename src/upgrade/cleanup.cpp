@@ -6,6 +6,7 @@
 #include "device/tree_walk.h"
 #include "device/wide_text.h"
 #include "upgrade/paths.h"
+#include "upgrade/saved_files.h"
 
 namespace upgrade {
 namespace {
@@ -36,10 +37,6 @@ bool HasDot(base::WideView text) noexcept {
   return text.find(TEXT('.')) != base::WideView::npos;
 }
 
-void ToLowerCase(WidePath& path) noexcept {
-  CharLowerBuffW(path.data(), static_cast<DWORD>(path.size()));
-}
-
 /// The name of the folder in which this device keeps its flash files.
 const char* FlashStoreName(const UpgradeConfig& job) noexcept {
   if (job.GetFlashFileStore()[0] != '\0') return job.GetFlashFileStore();
@@ -47,14 +44,14 @@ const char* FlashStoreName(const UpgradeConfig& job) noexcept {
   return is_tq ? "TQ_FFS" : "Flash File Store";
 }
 
-/// Empties one folder of the delete list. About 6 KiB large.
+/// Empties the folders of one job's delete list. About 5 KiB large.
 class FolderCleaner : public device::OnLocalHeap {
  public:
   explicit FolderCleaner(const UpgradeConfig& job) noexcept
-      : job_(job), flash_store_known_(flash_store_.Assign(FlashStoreName(job))) {}
+      : saved_(job.FilesToSave()), flash_store_known_(flash_store_.Assign(FlashStoreName(job))) {}
 
   void Empty(const WidePath& folder) noexcept {
-    if (!Begin(folder)) return;
+    if (!saved_.known() || !Begin(folder)) return;
     for (Step step = walk_.Next(); step != Step::kEnd; step = walk_.Next()) {
       if (step == Step::kFile && IsToBeDeleted()) DeleteOneFile(walk_.path());
       if (step == Step::kFolder && IsToBeEmptied()) walk_.Enter();
@@ -67,35 +64,21 @@ class FolderCleaner : public device::OnLocalHeap {
     const bool closed = folder.view().back() == TEXT('\\');
     WidePath pattern = folder;
     if (!pattern.Append(closed ? TEXT("*.*") : TEXT("\\*.*"))) return false;
-    // KEPT ODDITY: but for the root, a folder named with a backslash at its end gets one more
-    // before the names of its files, so that no entry of the save list is equal to them.
+    // KEPT ODDITY: paths are put together as the job has them and compared with the save list as
+    // they are. A folder named "\Temp\", "\Temp\\Sub", "\\Temp" or "Temp", or the root as "\\", is
+    // found, but the paths of its files are equal to no entry that is written properly.
     WidePath prefix = folder;
     if (folder.view() != TEXT("\\") && !prefix.Append(TEXT("\\"))) return false;
     return walk_.Begin(pattern.c_str(), prefix.view());
   }
 
   bool IsToBeDeleted() noexcept {
-    return (walk_.found().dwFileAttributes & kInRom) == 0 && !IsSaved();
-  }
-
-  /// Whether the file that was found is on the save list.
-  bool IsSaved() noexcept {
-    if (job_.FilesToSave().incomplete()) return true;
+    if ((walk_.found().dwFileAttributes & kInRom) != 0) return false;
     path_.Assign(base::WideView(walk_.path()));
-    ToLowerCase(path_);
-    const std::size_t length = path_.size();
-    for (const char* saved : job_.FilesToSave()) {
-      const std::string_view text = base::View(saved);
-      // Too long for a path, or too short for this one: an 8-bit text is never the shorter of the
-      // two.
-      if (text.size() >= kPathSize || text.size() < length) continue;
-      if (!saved_.Assign(text)) return true;  // unreadable: better one file too many than one lost
-      ToLowerCase(saved_);
-      if (saved_.view() == path_.view()) return true;
-    }
-    return false;
+    return !saved_.Contains(path_);
   }
 
+  /// KEPT ODDITY: in the flash file store's name letter case counts, unlike in the save list.
   bool IsToBeEmptied() const noexcept {
     const base::WideView name = walk_.found().cFileName;
     if (HasDot(name)) return false;
@@ -103,33 +86,50 @@ class FolderCleaner : public device::OnLocalHeap {
     return flash_store_known_ && base::StartsWith(name, flash_store_.view());
   }
 
-  const UpgradeConfig& job_;
+  const SavedFiles saved_;
   device::TreeWalk walk_;
   WidePath flash_store_;
   bool flash_store_known_;  ///< without the name no volume is touched
-  WidePath path_;           ///< of the file that was found, in lower case
-  WidePath saved_;          ///< an entry of the save list, in lower case
+  WidePath path_;           ///< of the file that was found
+};
+
+/// Deletes entries of one job's delete list. What it takes to empty folders is made for the first
+/// one that is.
+class Deleter {
+ public:
+  explicit Deleter(const UpgradeConfig& job) noexcept : job_(job) {}
+
+  void Delete(const char* path) noexcept {
+    WidePath wide;
+    if (!wide.Assign(path) || wide.empty()) return;
+    if (HasDot(wide.view())) {
+      if (device::File().Exists(path)) DeleteOneFile(wide.c_str());
+      return;
+    }
+    if (!folders_) folders_.Reset(new FolderCleaner(job_));
+    if (folders_) folders_->Empty(wide);
+  }
+
+ private:
+  const UpgradeConfig& job_;
+  device::LocalObject<FolderCleaner> folders_;
 };
 
 }  // namespace
 
 void DeletePath(const char* path, const UpgradeConfig& job) noexcept {
-  WidePath wide;
-  if (!wide.Assign(path) || wide.empty()) return;
-  if (HasDot(wide.view())) {
-    if (device::File().Exists(path)) DeleteOneFile(wide.c_str());
-    return;
-  }
-  const device::LocalObject<FolderCleaner> cleaner(new FolderCleaner(job));
-  if (cleaner) cleaner->Empty(wide);
+  Deleter(job).Delete(path);
 }
 
+// KEPT ODDITY: nobody waits for the end of a program that is ended here. What it holds open at that
+// moment cannot be deleted, and stays.
 void CleanUpDevice(const UpgradeConfig& job) noexcept {
   {
     device::File programs;
     for (const char* name : job.ProcessesToStop()) programs.StopProcess(name);
   }
-  for (const char* path : job.FilesToDelete()) DeletePath(path, job);
+  Deleter deleter(job);
+  for (const char* path : job.FilesToDelete()) deleter.Delete(path);
 }
 
 }  // namespace upgrade

@@ -8,8 +8,9 @@
 namespace upgrade {
 
 /// Carries out the job's registry tests in their order, up to the first that fails. Writes each
-/// reason of its own to the log. A null entry is passed over. Host's thread before an upgrade, or
-/// the upgrade thread.
+/// reason of its own to the log. A null entry is passed over. When a test has been lost for want of
+/// memory, none is carried out and they count as failed, with an empty message. Host's thread
+/// before an upgrade, or the upgrade thread.
 /// @param failure_text  receives the message of the test that failed; untouched when all passed.
 ///   Null: the message is not logged either
 /// @param size  of `failure_text`; 256 holds every message

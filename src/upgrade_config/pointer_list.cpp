@@ -5,6 +5,8 @@
 #include <cstring>
 #include <utility>
 
+#include "base/heap_sort.h"
+
 namespace orvenix {
 namespace {
 
@@ -16,25 +18,6 @@ void** AllocateItems(std::uint32_t capacity) noexcept {
 
 std::uintptr_t Address(const void* pointer) noexcept {
   return reinterpret_cast<std::uintptr_t>(pointer);
-}
-
-/// Lets the item at `from` sink to its place in the heap of `size` items.
-void Sink(void** items, std::size_t from, std::size_t size) noexcept {
-  for (std::size_t child = 2 * from + 1; child < size; child = 2 * from + 1) {
-    if (child + 1 < size && Address(items[child]) < Address(items[child + 1])) ++child;
-    if (Address(items[from]) >= Address(items[child])) return;
-    std::swap(items[from], items[child]);
-    from = child;
-  }
-}
-
-/// Heap sort: no memory, and no list that a host could build makes it slow.
-void Sort(void** items, std::size_t size) noexcept {
-  for (std::size_t at = size / 2; at-- > 0;) Sink(items, at, size);
-  for (std::size_t left = size; left-- > 1;) {
-    std::swap(items[0], items[left]);
-    Sink(items, 0, left);
-  }
 }
 
 }  // namespace
@@ -82,7 +65,8 @@ bool PointerArray::Append(void* pointer) noexcept {
 }
 
 void PointerArray::SortAndDropDuplicates() noexcept {
-  Sort(items_, size_);
+  base::HeapSort(items_, size_,
+                 [](const void* a, const void* b) { return Address(a) < Address(b); });
   const void* previous = nullptr;  // sorts before all others, so nulls drop out too
   std::uint32_t kept = 0;
   for (std::uint32_t i = 0; i < size_; ++i) {

@@ -360,6 +360,9 @@ TEST_F(LoadFileFaultsTest, LosesOnlyWhatThereIsNoMemoryForAndLeaksNothing) {
       EXPECT_EQ(Incomplete(job), understood && fired ? 1U : 0U) << nth << ": what is lost is known";
       EXPECT_EQ(job.IsMultiPass(), static_cast<int>(job.FirmwarePackages().size())) << nth;
       EXPECT_EQ(job.GetFirmwarePackageCount(), understood ? 1 : 0) << nth;
+      EXPECT_EQ(job.RegistryTests().incomplete(), understood && job.RegistryTests().empty())
+          << nth << ": a device is not upgraded untested";
+      EXPECT_EQ(job.FilesToSave().incomplete(), understood && job.FilesToSave().empty()) << nth;
       EXPECT_EQ(Exists(kInSystemFolder), nth == 1) << nth;
     }
     EXPECT_EQ(Blocks(), blocks) << nth;

@@ -85,6 +85,30 @@ TEST_F(ProcessesTest, AreNotRunWithParametersThatDoNotFit) {
   EXPECT_EQ(device().processes().Launches().front().command_line, std::string(299, 'x'));
 }
 
+TEST_F(ProcessesTest, AreNotRunAndLeaveNothingOpenWhenTheStartFails) {
+  const std::size_t before = device().kernel().OpenHandles();
+  for (const char* call : {"CreateProcessW", "MultiByteToWideChar"}) {
+    for (std::uint64_t nth = 1;; ++nth) {
+      const std::uint64_t fired = device().faults().fired();
+      device().faults().Add({call, nth, 1, ERROR_NOT_ENOUGH_MEMORY});
+      const std::uint32_t result = file_.RunProcess("quick.exe", "-a", INFINITE);
+      const bool has_failed = device().faults().fired() != fired;
+      device().faults().Clear();
+      EXPECT_EQ(result, has_failed ? 0xFFFFFFFFU : WAIT_OBJECT_0) << call << nth;
+      EXPECT_EQ(device().kernel().OpenHandles(), before) << call << nth;
+      if (!has_failed) break;
+    }
+  }
+}
+
+TEST_F(ProcessesTest, AreLetGoOfWhenTheyCannotBeWaitedFor) {
+  const std::size_t before = device().kernel().OpenHandles();
+  device().faults().Add({"WaitForSingleObject", 1, 1, ERROR_INVALID_HANDLE});
+  EXPECT_EQ(file_.RunProcess("quick.exe", "-a", INFINITE), WAIT_FAILED);
+  EXPECT_EQ(device().kernel().OpenHandles(), before) << "although the program still runs";
+  EXPECT_EQ(device().processes().Launches().size(), 1U);
+}
+
 TEST_F(ProcessesTest, LeaveNoHandlesOpen) {
   const std::size_t before = device().kernel().OpenHandles();
   file_.RunProcess("quick.exe", "", 100);

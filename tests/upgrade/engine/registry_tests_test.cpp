@@ -10,6 +10,7 @@
 #include <string_view>
 #include <vector>
 
+#include "base/text.h"
 #include "ce/errors.h"
 #include "ce/system.h"
 #include "faults/faults.h"
@@ -145,6 +146,25 @@ TEST_F(RegistryTestsTest, ReadTheDefaultValueOfAKey) {
   EXPECT_TRUE(Perform());
 }
 
+TEST_F(RegistryTestsTest, ReadAValueOfTheRootItself) {
+  Store(u"Value", REG_SZ, u"x", 4, HKEY_LOCAL_MACHINE, u"");
+  test::AddTest(job(), {"HKEY_LOCAL_MACHINE", "", "Value", "REG_SZ", "EQ", "x", ""});
+  EXPECT_TRUE(Perform());
+}
+
+TEST_F(RegistryTestsTest, ReadKeysAndNamesInTheDevicesCodePage) {
+  Store(u"W\u00E4rme", REG_SZ, u"x", 4, HKEY_LOCAL_MACHINE, u"Ger\u00E4t");
+  test::AddTest(job(), {"HKEY_LOCAL_MACHINE", "Ger\xE4t", "W\xE4rme", "REG_SZ", "EQ", "x", ""});
+  EXPECT_TRUE(Perform());
+}
+
+TEST_F(RegistryTestsTest, FindAKeyThatIsWrittenWithALeadingBackslash) {
+  StoreNumber(7);
+  test::AddTest(job(), {"HKEY_LOCAL_MACHINE", std::string("\\") + kKey, "Number", "REG_DWORD", "EQ",
+                        "7", ""});
+  EXPECT_TRUE(Perform());
+}
+
 TEST_F(RegistryTestsTest, KnowFourRoots) {
   struct Case {
     const char* name;
@@ -205,7 +225,9 @@ TEST_F(RegistryTestsTest, DecideByTheTypeThatTheRegistryTells) {
       {REG_DWORD, number, "reg_dword", "letter case counts", false, ""},
       {REG_BINARY, number, "REG_DWORD", "another type", false, kUnsupported},
       {REG_BINARY, text, "REG_SZ", "another type", false, kUnsupported},
+      {REG_BINARY, longer, "REG_DWORD", "bytes that do not fit a number", false, kNoValue},
       {REG_MULTI_SZ, text, "REG_SZ", "another type", false, kUnsupported},
+      {REG_EXPAND_SZ, text, "REG_SZ", "another type", false, kUnsupported},
       {REG_BINARY, number, "REG_BINARY", "a type that no test can name", false, kUnsupported},
       {REG_DWORD, {7, 0}, "REG_DWORD", "half a number", false, ""},
       {REG_DWORD, {}, "REG_DWORD", "no number at all", false, ""},
@@ -339,10 +361,63 @@ TEST_F(RegistryTestsTest, FindNoValueThatIsLongerThan512Bytes) {
   EXPECT_THAT(test::LogLinesWith("No such valuename"), ::testing::SizeIs(1));
 }
 
-TEST_F(RegistryTestsTest, ReadRecordsWithoutAnyTerminator) {
+/// A record that passes once the value is there.
+tagRegistryTest* MakeRecord(std::string_view value_name, std::string_view value) {
   auto* const record = static_cast<tagRegistryTest*>(LocalAlloc(LPTR, sizeof(tagRegistryTest)));
-  ASSERT_NE(record, nullptr);
-  std::memset(record, 'x', sizeof *record);
+  base::CopyText(record->root, "HKEY_LOCAL_MACHINE");
+  base::CopyText(record->key, kKey);
+  base::CopyText(record->value_name, value_name);
+  base::CopyText(record->value, value);
+  base::CopyText(record->type, "REG_SZ");
+  base::CopyText(record->operation, "EQ");
+  base::CopyText(record->error_message, "message");
+  return record;
+}
+
+template <std::size_t Size>
+void FillUp(char (&field)[Size]) {
+  std::memset(field, 'x', Size);
+}
+
+TEST_F(RegistryTestsTest, ReadFieldsWithoutTerminator) {
+  struct Case {
+    void (*fill)(tagRegistryTest& test);
+    bool holds;
+    const char* log;
+  };
+  static constexpr Case kCases[] = {
+      {[](tagRegistryTest&) {}, true, ""},
+      {[](tagRegistryTest& test) { FillUp(test.root); }, true, ""},
+      {[](tagRegistryTest& test) { FillUp(test.key); }, false, "No such key"},
+      {[](tagRegistryTest& test) { FillUp(test.value_name); }, false, "No such valuename"},
+      {[](tagRegistryTest& test) { FillUp(test.value); }, false, "failed test"},
+      {[](tagRegistryTest& test) { FillUp(test.type); }, false, "failed test"},
+      {[](tagRegistryTest& test) { FillUp(test.operation); }, false, "failed test"},
+      {[](tagRegistryTest& test) { FillUp(test.error_message); }, true, ""},
+  };
+  StoreText(std::u16string(255, u'x'));
+  for (const Case& c : kCases) {
+    const std::size_t before = test::LogLinesWith(c.log).size();
+    tagRegistryTest* const record = MakeRecord("Text", std::string(255, 'x'));
+    c.fill(*record);
+    job().AddRegistryTest(record);
+    EXPECT_EQ(PerformAndForget(), c.holds) << &c - kCases;
+    EXPECT_GT(test::LogLinesWith(c.log).size(), before) << &c - kCases;
+  }
+}
+
+TEST_F(RegistryTestsTest, CompareAllOfAValueWithoutTerminator) {
+  StoreText(std::u16string(255, u'x'));
+  tagRegistryTest* const record = MakeRecord("Text", "");
+  FillUp(record->value);
+  base::CopyText(record->operation, "LT");
+  job().AddRegistryTest(record);
+  EXPECT_TRUE(Perform()) << "the 260 characters of the record are more than the registry's 255";
+}
+
+TEST_F(RegistryTestsTest, CutAMessageWithoutTerminator) {
+  tagRegistryTest* const record = MakeRecord("None", "");
+  FillUp(record->error_message);
   job().AddRegistryTest(record);
   EXPECT_FALSE(Perform());
   EXPECT_EQ(FailureText(), std::string(255, 'x'));
@@ -368,6 +443,30 @@ TEST_F(RegistryTestsTest, CutTheMessageToTheRoomThereIs) {
 }
 
 // ---- failures ----
+
+TEST_F(RegistryTestsTest, FailWhenOneOfThemHasBeenLost) {
+  constexpr int kListed = 8;  // the room that a list begins with
+  StoreNumber(7);
+  for (int i = 0; i < kListed; ++i) TestNumber("EQ", "7");
+  device().faults().Add({"LocalAlloc", 2, 1, ERROR_OUTOFMEMORY});  // behind the record
+  TestNumber("EQ", "8");
+  device().faults().Clear();
+  ASSERT_EQ(job().RegistryTests().size(), kListed);
+
+  EXPECT_FALSE(Perform());
+
+  EXPECT_EQ(FailureText(), "") << "whatever it would have said";
+  EXPECT_EQ(test::ReadLog(), "PerformTests - 8\r\nOrvenix - PerformTests - failed test\r\n\r\n");
+  EXPECT_FALSE(PerformTests(job(), nullptr, 0));
+}
+
+TEST_F(RegistryTestsTest, FailWhenTheOnlyOneHasBeenLost) {
+  device().faults().Add({"LocalAlloc", 2, 1, ERROR_OUTOFMEMORY});
+  TestNumber("EQ", "8");
+  device().faults().Clear();
+  ASSERT_TRUE(job().RegistryTests().empty());
+  EXPECT_FALSE(Perform());
+}
 
 TEST_F(RegistryTestsTest, FailAndLeaveNothingOpenWhicheverCallFails) {
   StoreNumber(7);
