@@ -21,6 +21,7 @@ IcfgResult BeginTop(Walk& walk, std::uint32_t mode) noexcept {
   auto* const job = new UpgradeConfig;
   const WalkLock lock;
   walk.job = job;
+  ++walk.jobs;
   walk.job_started = false;
   walk.download_file.Forget();
   walk.storage.Forget();
@@ -153,7 +154,9 @@ IcfgResult EndRegistry(Walk& walk) noexcept {
   return IcfgResult::kOk;
 }
 
-/// KEPT ODDITY: runs also when the beginning of "Upgrade" was refused or never came.
+/// KEPT ODDITY: runs also when the beginning of "Upgrade" was refused or never came. A second end
+/// of the same group tests and cleans once more, beside the upgrade that runs: files that this has
+/// fetched into a folder of the delete list are gone then.
 IcfgResult EndUpgradeGroup(Walk& walk) noexcept {
   return StartJob(walk);
 }

@@ -28,7 +28,7 @@ constexpr DWORD kFailurePauseMs = 3000;
 using FailureText = base::FixedText<256>;
 
 /// Why the job does not start.
-enum class Preflight : std::uint8_t { kReady, kPowerLow, kTestFailed, kSpaceShort };
+enum class Preflight : std::uint8_t { kReady, kPowerLow, kTestFailed, kSpaceShort, kJobGone };
 
 /// No `default`: a reason added later does not compile until it has a code.
 constexpr IcfgResult ToResult(Preflight outcome) noexcept {
@@ -37,6 +37,7 @@ constexpr IcfgResult ToResult(Preflight outcome) noexcept {
     case Preflight::kPowerLow: return IcfgResult::kNoPower;
     case Preflight::kTestFailed: return IcfgResult::kTestFailed;
     case Preflight::kSpaceShort: return IcfgResult::kNoSpace;
+    case Preflight::kJobGone: return IcfgResult::kOk;
   }
   return IcfgResult::kOk;  // not reached
 }
@@ -51,37 +52,48 @@ bool HasPower() noexcept {
          status.BatteryFlag == BATTERY_FLAG_CHARGING;
 }
 
-void SetUpSyslog(const Walk& walk) noexcept {
+/// The job that is to start, as the walk had it when "Upgrade" ended. The client may call on
+/// another thread or from inside its callback: meanwhile an upgrade thread that runs the same job
+/// may end it, and a new job may have begun, which nobody has filled, let alone tested.
+class Candidate {
+ public:
+  explicit Candidate(Walk& walk) noexcept : walk_(walk) {
+    const WalkLock lock;
+    number_ = walk.jobs;
+    exists_ = walk.job != nullptr;
+    if (exists_) unique_id_.Assign(walk.job->GetUniqueId());
+  }
+
+  [[nodiscard]] bool exists() const noexcept { return exists_; }
+  [[nodiscard]] const char* unique_id() const noexcept { return unique_id_.c_str(); }
+
+  /// Calls `step` with the job, which nobody frees or replaces meanwhile.
+  /// @return false when the walk has another job by now, or none.
+  template <typename Step>
+  bool With(const Step& step) const noexcept {
+    const WalkLock lock;
+    UpgradeConfig* const job = walk_.numbered_job(number_);
+    if (job == nullptr) return false;
+    step(*job);
+    return true;
+  }
+
+ private:
+  Walk& walk_;
+  std::uint32_t number_ = 0;
+  bool exists_ = false;
+  base::FixedText<64> unique_id_;
+};
+
+bool SetUpSyslog(const Candidate& candidate) noexcept {
   base::FixedText<32> address;
   int port = 0;
-  {
-    const WalkLock lock;
-    if (walk.job == nullptr) return;
-    address.Assign(walk.job->GetSysLogIP());
-    port = walk.job->GetSysLogPort();
-  }
-  report::SetSyslogTarget(port, address.c_str());
-}
-
-// The next three hold the lock for as long as they read the job, however many files are deleted
-// meanwhile: an upgrade thread that was started with the same job may be about to free it. Only
-// that thread ever waits for this, and nothing in here waits for it or calls the host. A job that
-// is gone meanwhile needs nothing; nothing will start.
-
-bool TestsPass(const Walk& walk, FailureText* failure) noexcept {
-  const WalkLock lock;
-  return walk.job == nullptr ||
-         upgrade::PerformTests(*walk.job, failure->data(), failure->capacity());
-}
-
-void CleanUp(const Walk& walk) noexcept {
-  const WalkLock lock;
-  if (walk.job != nullptr) upgrade::CleanUpDevice(*walk.job);
-}
-
-bool HasSpace(const Walk& walk, std::uint32_t* total) noexcept {
-  const WalkLock lock;
-  return walk.job == nullptr || upgrade::CheckSpace(*walk.job, total);
+  const bool found = candidate.With([&](const UpgradeConfig& job) {
+    address.Assign(job.GetSysLogIP());
+    port = job.GetSysLogPort();
+  });
+  if (found) report::SetSyslogTarget(port, address.c_str());
+  return found;
 }
 
 /// Only a failed test is told by a status, too, before the event.
@@ -92,22 +104,27 @@ void ReportFailedTest(const FailureText& failure) noexcept {
 }
 
 /// @param failure  receives the words for what is not met
-Preflight Check(const Walk& walk, FailureText* failure) noexcept {
-  if (!HasPower()) {
-    failure->Assign("Power requirement not met");
-    return Preflight::kPowerLow;
-  }
-  SetUpSyslog(walk);
+///
+// KEPT ODDITY: the device is cleaned before its room is measured. When that does not suffice, the
+// files are gone all the same.
+Preflight CheckJob(const Candidate& candidate, FailureText* failure) noexcept {
+  if (!SetUpSyslog(candidate)) return Preflight::kJobGone;
   report::Log("Orvenix - PerformTests\r\n");
-  if (!TestsPass(walk, failure)) {
-    ReportFailedTest(*failure);
-    return Preflight::kTestFailed;
+  bool met = false;
+  if (!candidate.With([&](const UpgradeConfig& job) {
+        met = upgrade::PerformTests(job, failure->data(), failure->capacity());
+      })) {
+    return Preflight::kJobGone;
   }
+  if (!met) return Preflight::kTestFailed;
   report::Log("Orvenix - Cleanup\r\n");
-  CleanUp(walk);
+  if (!candidate.With(upgrade::CleanUpDevice)) return Preflight::kJobGone;
   report::Log("Orvenix - CheckSpace\r\n");
   std::uint32_t total = 0;
-  if (!HasSpace(walk, &total)) {
+  if (!candidate.With([&](const UpgradeConfig& job) { met = upgrade::CheckSpace(job, &total); })) {
+    return Preflight::kJobGone;
+  }
+  if (!met) {
     failure->Assign("No space available");
     return Preflight::kSpaceShort;
   }
@@ -116,67 +133,62 @@ Preflight Check(const Walk& walk, FailureText* failure) noexcept {
   return Preflight::kReady;
 }
 
-/// Takes the job's place in the queue before its own thread, if one runs, can free it.
-std::uint32_t TakeNumber(Walk& walk, bool* was_started) noexcept {
-  const WalkLock lock;
-  *was_started = walk.job_started;
-  if (walk.job == nullptr) return 0;
-  walk.job_started = true;
-  walk.download_file.ForgetJobs();
-  walk.storage.ForgetJobs();
-  walk.registry_test.ForgetJobs();
-  return upgrade::TakeNumber(walk.job, 0);
+Preflight Check(const Candidate& candidate, FailureText* failure) noexcept {
+  if (!HasPower()) {
+    failure->Assign("Power requirement not met");
+    return Preflight::kPowerLow;
+  }
+  const Preflight outcome = CheckJob(candidate, failure);
+  if (outcome == Preflight::kTestFailed) ReportFailedTest(*failure);
+  return outcome;
 }
 
-void StartThread(Walk& walk) noexcept {
+/// Takes the job's place in the queue before its own thread, if one runs, can free it.
+/// @return 0 when it gets none.
+std::uint32_t TakeNumber(Walk& walk, const Candidate& candidate, bool* was_started) noexcept {
+  std::uint32_t number = 0;
+  candidate.With([&](UpgradeConfig& job) {
+    *was_started = walk.job_started;
+    walk.job_started = true;
+    walk.download_file.ForgetJobs();
+    walk.storage.ForgetJobs();
+    walk.registry_test.ForgetJobs();
+    number = upgrade::TakeNumber(&job, 0);
+  });
+  return number;
+}
+
+void StartThread(Walk& walk, const Candidate& candidate) noexcept {
   report::Log("Orvenix - StartUpgradeThread\r\n");
   upgrade::SetJobFreedListener(ForgetJob);
   bool was_started = false;
-  const device::ThreadHandle thread(upgrade::StartNumber(TakeNumber(walk, &was_started)));
+  const device::ThreadHandle thread(
+      upgrade::StartNumber(TakeNumber(walk, candidate, &was_started)));
   if (thread) return;  // the thread clears the word when it is through
-  {
-    const WalkLock lock;
-    walk.job_started = walk.job != nullptr && was_started;
-  }
+  candidate.With([&](const UpgradeConfig&) { walk.job_started = was_started; });
   upgrade::EndUpgrade();
-}
-
-base::FixedText<64> UniqueId(const Walk& walk) noexcept {
-  base::FixedText<64> id;
-  const WalkLock lock;
-  if (walk.job != nullptr) id.Assign(walk.job->GetUniqueId());
-  return id;
 }
 
 /// Tells the management system and gives it time to look, before the connection ends. An upgrade
 /// that runs beside this opens another for its next message.
-void ReportFailure(const Walk& walk, const FailureText& failure) noexcept {
-  const base::FixedText<64> id = UniqueId(walk);
-  report::SendDeviceEvent(id.c_str(), report::kEventUpgradeFailed, failure.c_str());
+void ReportFailure(const Candidate& candidate, const FailureText& failure) noexcept {
+  report::SendDeviceEvent(candidate.unique_id(), report::kEventUpgradeFailed, failure.c_str());
   Sleep(kFailurePauseMs);
   report::CloseTransferHandle();
-}
-
-bool HasJob(const Walk& walk) noexcept {
-  const WalkLock lock;
-  return walk.job != nullptr;
 }
 
 }  // namespace
 
 IcfgResult StartJob(Walk& walk) noexcept {
-  if (!HasJob(walk)) {
-    upgrade::EndUpgrade();
+  const Candidate candidate(walk);
+  FailureText failure;
+  const Preflight outcome = candidate.exists() ? Check(candidate, &failure) : Preflight::kJobGone;
+  if (outcome == Preflight::kReady) {
+    StartThread(walk, candidate);
     return IcfgResult::kOk;
   }
-  FailureText failure;
-  const Preflight outcome = Check(walk, &failure);
-  if (outcome == Preflight::kReady) {
-    StartThread(walk);
-  } else {
-    ReportFailure(walk, failure);
-    upgrade::EndUpgrade();
-  }
+  if (outcome != Preflight::kJobGone) ReportFailure(candidate, failure);
+  upgrade::EndUpgrade();
   return ToResult(outcome);
 }
 

@@ -3,7 +3,7 @@
 
 #include <coredll.h>
 
-#include <utility>
+#include <cstdint>
 
 #include "base/text.h"
 #include "device/lock.h"
@@ -50,6 +50,7 @@ class CurrentRecord {
 struct Walk {
   base::FixedText<128> group;    ///< begun most recently; its end does not bring the parent back
   UpgradeConfig* job = nullptr;  ///< being filled, and still after it was started
+  std::uint32_t jobs = 0;        ///< begun so far: tells one job from a later one in its place
   bool job_started = false;      ///< an upgrade thread reads `job`: nothing more goes into it
   bool in_file_list = false;
   bool in_disk_cleanup = false;
@@ -64,6 +65,12 @@ struct Walk {
   /// The job as long as it may be filled. Hold a WalkLock.
   [[nodiscard]] UpgradeConfig* open_job() const noexcept { return job_started ? nullptr : job; }
 
+  /// The job that was the `number`-th to begin, null when it is not this walk's any more. Hold a
+  /// WalkLock.
+  [[nodiscard]] UpgradeConfig* numbered_job(std::uint32_t number) const noexcept {
+    return jobs == number ? job : nullptr;
+  }
+
   static constexpr char kNoAction = ' ';
   static constexpr char kDelete = 'D';
   static constexpr char kSave = 'S';
@@ -72,8 +79,10 @@ struct Walk {
 /// The one walk of this module.
 Walk& TheWalk() noexcept;
 
-/// Keeps the upgrade thread from freeing the job for the length of a scope. No call that could come
-/// back to the host is made under it.
+/// Keeps the upgrade thread from freeing the job for the length of a scope, which may be as long as
+/// it takes to test, clean and measure a device: an upgrade thread at its end, and a host that
+/// calls on another thread, then wait. No call that could come back to the host or wait for another
+/// thread's end is made under it.
 class [[nodiscard]] WalkLock {
  public:
   WalkLock() noexcept;

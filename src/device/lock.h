@@ -13,8 +13,11 @@ namespace device {
 /// compare-and-swap. Who finds it taken sleeps, because spinning could keep a holder of lower
 /// priority from ever going on.
 ///
-/// While it is held nothing may be called that waits for another thread, draws or sends a message.
-/// A thread must not take it twice.
+/// While it is held nothing may be called that draws, that calls the host, or that waits for a
+/// thread which could wait for this lock. Most are held for a few instructions. Two are held for
+/// long, and say so: the walk's, while a device is tested and cleaned, and the message link's,
+/// while the queue's library is loaded and called. Others are taken under these two, never the
+/// other way round. A thread must not take one twice.
 class Lock {
  public:
   void Acquire() noexcept {

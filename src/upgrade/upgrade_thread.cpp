@@ -74,6 +74,9 @@ void PauseForTheEye(const UpgradeConfig& job) noexcept {
 
 /// Everything by HTTP, for a caller from outside the configlet: nobody has looked at the device
 /// before. Files are counted before it is cleaned, for which the INF file is fetched once more.
+///
+/// KEPT ODDITY: some lines have no end: the next one stands right behind "UpgradeClient Mode..."
+/// and "Processing OS files...", here as behind "Multicast Fallback Mode...".
 void RunAsUpgradeClient(Run& run) noexcept {
   Log("UpgradeClient Mode...");
   run.succeeded = PerformTests(run.job, run.error_text.data(), run.error_text.capacity());

@@ -1,15 +1,14 @@
-// The end of "Upgrade".
+// The end of "Upgrade": what is checked, in which order, and what a failure does.
+#include "configlet/start_up_test.h"
+
 #include <gmock/gmock.h>
 
+#include <cstdint>
 #include <string>
 
 #include "ce/errors.h"
 #include "ce/files.h"
-#include "ce/kernel.h"
-#include "configlet/configlet_test.h"
 #include "power/power.h"
-#include "trace/trace.h"
-#include "upgrade/run_state/run_state.h"
 
 namespace configlet {
 namespace {
@@ -17,69 +16,6 @@ namespace {
 using ::testing::HasSubstr;
 using ::testing::Not;
 using ::testing::StartsWith;
-
-constexpr sim::Micros kPause = std::chrono::milliseconds(3000);
-
-class StartUpTest : public ConfigletTest {
- protected:
-  /// A job without files, for a device that has room.
-  static void Fill(const char* required_space = "1") {
-    Begin("Orvenix");
-    Begin("Upgrade");
-    Begin("Store");
-    Set("Name", "\\");
-    Set("RequiredSpace", required_space);
-    End("Store");
-    Set("ShowGUI", "false");
-  }
-
-  /// Adds a test of the value that StoreSystem stores.
-  static void FillTest(const char* value, const char* message) {
-    Begin("Registry");
-    Set("Key", "Software\\Orvenix");
-    Set("ValueName", "System");
-    Set("Type", "REG_DWORD");
-    Set("Operator", "EQ");
-    Set("Value", value);
-    Set("ErrorMsg", message);
-    End("Registry");
-  }
-  static void StoreSystem(DWORD number) {
-    HKEY key = nullptr;
-    RegCreateKeyExW(HKEY_LOCAL_MACHINE, TEXT("Software\\Orvenix"), 0, nullptr, 0, KEY_ALL_ACCESS,
-                    nullptr, &key, nullptr);
-    RegSetValueExW(key, TEXT("System"), 0, REG_DWORD, reinterpret_cast<const BYTE*>(&number),
-                   sizeof number);
-    RegCloseKey(key);
-  }
-  static void FillCleanup(const char* path, const char* action) {
-    Begin("DiskCleanup");
-    Begin("File");
-    Set("Name", path);
-    Set("Action", action);
-    End("File");
-    End("DiskCleanup");
-  }
-
-  /// Ends "Upgrade". @return its result; `took` is the time that it took.
-  std::uint32_t EndUpgrade() {
-    const sim::Micros start = world().now();
-    const std::uint32_t result = End("Upgrade");
-    took_ = world().now() - start;
-    return result;
-  }
-  [[nodiscard]] sim::Micros took() const { return took_; }
-
-  /// Lets the upgrade thread run to its end.
-  static bool AwaitTheEnd() {
-    for (int second = 0; second < 3600 && HasJob(); ++second) Sleep(1000);
-    Sleep(10000);
-    return !HasJob() && !upgrade::UpgradeInProgress();
-  }
-
- private:
-  sim::Micros took_{};
-};
 
 TEST_F(StartUpTest, StartsTheJobOnAThreadOfItsOwn) {
   Fill();
@@ -141,6 +77,19 @@ TEST_F(StartUpTest, FailsForATestWhoseTypeTheHostHasLeftOut) {
   EXPECT_EQ(EndUpgrade(), ICFG_TEST_FAILED);
 }
 
+TEST_F(StartUpTest, DoesNotUpgradeUntestedWhenATestHasBeenLost) {
+  StoreSystem(7);
+  Fill();
+  for (int i = 0; i < 8; ++i) FillTest("7", "");  // as many as a list begins with room for
+  Begin("Registry");
+  Set("Key", "Software\\None");
+  device().faults().Add({"LocalAlloc", 1, 1, ERROR_OUTOFMEMORY});
+  End("Registry");
+  device().faults().Clear();
+  ASSERT_EQ(job().RegistryTests().size(), 8U);
+  EXPECT_EQ(EndUpgrade(), ICFG_TEST_FAILED);
+}
+
 TEST_F(StartUpTest, CleansTheDeviceBeforeItMeasuresTheRoom) {
   StoreSystem(7);
   test::PutFile("\\Temp\\a.bin", std::string(1000000, 'a'));
@@ -180,99 +129,6 @@ TEST_F(StartUpTest, NeitherTestsNorCleansWithoutPower) {
   EXPECT_THAT(Log(), Not(HasSubstr("PerformTests")));
 }
 
-TEST_F(StartUpTest, LeavesNothingBehind) {
-  const std::size_t handles = OpenHandles();
-  Fill();
-  EndUpgrade();
-  ASSERT_TRUE(AwaitTheEnd());
-
-  EXPECT_EQ(device().memory().bad_frees(), 0U);
-  EXPECT_EQ(OpenHandles(), handles + 1) << "the mutex that marks the upgrade client";
-}
-
-TEST_F(StartUpTest, RefusesANewUpgradeUntilTheOldOneIsThrough) {
-  Fill();
-  EndUpgrade();
-
-  EXPECT_EQ(Begin("Orvenix"), ICFG_OK) << "a new walk may begin";
-  UpgradeConfig* const second = &job();
-  EXPECT_EQ(Begin("Upgrade"), ICFG_UPGRADE_RUNNING);
-  while (upgrade::UpgradeInProgress()) Sleep(1000);
-
-  EXPECT_EQ(Begin("Upgrade"), ICFG_OK);
-  Sleep(60000);
-  EXPECT_EQ(&job(), second) << "the end of the first job takes only its own pointers away";
-}
-
-TEST_F(StartUpTest, DoesNotAskOtherProgramsWhetherTheyUpgrade) {
-  HANDLE event = CreateEventW(nullptr, FALSE, FALSE, TEXT("TW_UPGRADE_IN_PROGRESS"));
-  ASSERT_NE(event, nullptr);
-
-  Fill();
-  EXPECT_TRUE(upgrade::UpgradeInProgress()) << "begun, although another program has the event";
-  EXPECT_EQ(EndUpgrade(), ICFG_OK);
-
-  EXPECT_TRUE(AwaitTheEnd());
-  CloseHandle(event);
-}
-
-TEST_F(StartUpTest, RunsAlsoWhenUpgradeWasNeverBegun) {
-  Fill();
-  upgrade::EndUpgrade();  // as if "Upgrade" had not been begun
-
-  EXPECT_EQ(EndUpgrade(), ICFG_OK);
-
-  EXPECT_FALSE(upgrade::UpgradeInProgress());
-  EXPECT_EQ(Begin("Upgrade"), ICFG_OK) << "although a job runs";
-  while (HasJob()) Sleep(1000);
-}
-
-TEST_F(StartUpTest, SurvivesTheSameJobTwice) {
-  Fill();
-
-  EXPECT_EQ(EndUpgrade(), ICFG_OK);
-  EXPECT_EQ(EndUpgrade(), ICFG_OK);
-
-  EXPECT_TRUE(AwaitTheEnd());
-  EXPECT_EQ(device().memory().bad_frees(), 0U);
-}
-
-TEST_F(StartUpTest, TakesFieldsAndGroupsWhileTheThreadRunsAndAfterIt) {
-  Fill();
-  Begin("Download");
-  Begin("File");
-  End("File");
-  EndUpgrade();
-  for (int i = 0; i < 40; ++i) {
-    EXPECT_EQ(Set("BaseURL", "http://late/"), ICFG_OK);
-    EXPECT_EQ(Set("CRC", "1"), ICFG_OK);
-    EXPECT_EQ(End("File"), ICFG_OK);
-    Sleep(1000);
-  }
-  EXPECT_TRUE(AwaitTheEnd());
-  EXPECT_EQ(device().memory().bad_frees(), 0U);
-}
-
-TEST_F(StartUpTest, LeavesARunningJobsListsAlone) {
-  Fill();
-  Begin("Download");
-  for (int i = 0; i < 8; ++i) {
-    Begin("File");
-    Set("Source", "absent");
-    Set("MCTMask", "*");
-    Set("CRC", "1");
-    End("File");
-  }
-  const UpgradeConfig* const started = &job();
-  EndUpgrade();
-  Sleep(5000);  // the thread is within the list: nobody answers it
-
-  for (int i = 0; i < 20; ++i) EXPECT_EQ(End("File"), ICFG_OK);
-
-  EXPECT_EQ(started->DownloadFiles().size(), 8U);
-  EXPECT_TRUE(upgrade::UpgradeInProgress());
-}
-
 TEST_F(StartUpTest, DoesNothingWithoutAJob) {
   Begin("Upgrade");
   device().power().SetStatus(0, 4, 1);
@@ -283,40 +139,6 @@ TEST_F(StartUpTest, DoesNothingWithoutAJob) {
   EXPECT_FALSE(upgrade::UpgradeInProgress());
   EXPECT_EQ(Log(), "");
   EXPECT_EQ(took().count(), 0);
-}
-
-TEST_F(StartUpTest, FailsInNothingWhenTheJobEndsMeanwhile) {
-  // Another thread that was started with the same job frees it at one of these calls.
-  for (const char* call : {"GetSystemPowerStatusEx", "fclose"}) {
-    Fill();
-    UpgradeConfig* const ending = &job();
-    const std::string wanted = "\"call\":\"" + std::string(call) + '"';
-    device().trace().SetSink([&wanted](std::string_view line) {
-      if (line.find(wanted) != std::string_view::npos) TheWalk().job = nullptr;
-    });
-
-    EXPECT_EQ(EndUpgrade(), ICFG_OK) << call;
-
-    device().trace().SetSink({});
-    EXPECT_EQ(took().count(), 0) << call;
-    EXPECT_FALSE(HasJob()) << call;
-    EXPECT_FALSE(upgrade::UpgradeInProgress()) << call;
-    delete ending;
-  }
-  EXPECT_EQ(device().memory().bad_frees(), 0U);
-}
-
-TEST_F(StartUpTest, IsOverWhenThereIsNoThreadToBeHad) {
-  Fill();
-  device().faults().Add({"CreateThread", 1, 0, ERROR_NOT_ENOUGH_MEMORY});
-
-  EXPECT_EQ(EndUpgrade(), ICFG_OK);
-
-  EXPECT_FALSE(upgrade::UpgradeInProgress());
-  EXPECT_TRUE(HasJob()) << "the job stays with the walk";
-  device().faults().Clear();
-  EXPECT_EQ(EndUpgrade(), ICFG_OK);
-  EXPECT_TRUE(AwaitTheEnd());
 }
 
 // ---- power ----
@@ -389,18 +211,6 @@ TEST_F(StartUpTest, HasNoRoomForAJobWithoutRequirements) {
   Begin("Upgrade");
 
   EXPECT_EQ(EndUpgrade(), ICFG_NO_SPACE);
-}
-
-TEST_F(StartUpTest, ClearsTheFlagOfAnUpgradeThatRunsWhenAnotherFails) {
-  Fill();
-  EndUpgrade();
-  Begin("Orvenix");
-  ASSERT_TRUE(upgrade::UpgradeInProgress());
-
-  EXPECT_EQ(EndUpgrade(), ICFG_NO_SPACE);
-
-  EXPECT_FALSE(upgrade::UpgradeInProgress());
-  Sleep(60000);
 }
 
 // ---- syslog ----

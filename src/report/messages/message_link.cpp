@@ -18,7 +18,8 @@ namespace {
 /// As old as the process, and without a destructor: library and mutex outlive every job.
 ///
 /// The lock is held from the start of the link to the end of a write, so that no thread closes the
-/// connection under another's message, and never while the host is called.
+/// connection under another's message, and never while the host is called. Loading the library and
+/// calling it may take long: other threads' messages wait for that.
 struct Link {
   device::Lock lock;  ///< around what follows
   HANDLE mutex = nullptr;

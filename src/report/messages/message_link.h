@@ -37,7 +37,8 @@ void CloseTransferHandle() noexcept;
 /// @param reason  goes into the document as it stands, cut to 1,600 characters; null: empty
 void SetRWIStatus(int state, const char* reason) noexcept;
 
-/// Sends a device event with the device's local time to the message queue.
+/// Sends a device event with the device's local time to the message queue. Without memory for its
+/// document it is lost, although the log has its time.
 /// @param unique_id  the job's; null counts as empty
 /// @param code       one of the numbers above; any number goes through
 /// @param text       what the event says besides; null: nothing
