@@ -4,7 +4,7 @@ usage: check_surface.py <liborvenix.so>
 
 Every function of the platform that the library calls stands in that file and has a conformance test
 that names it; a line that nobody calls is removed. The compiler's own run time, mem* and str* are
-free.
+free. Nothing in the library runs before its first call: it has no dynamic initialisers.
 """
 
 import pathlib
@@ -28,6 +28,12 @@ def needed(path):
     return {name.removeprefix("ce_") for name in names if not RUN_TIME.match(name)}
 
 
+def initialisers(path):
+    """The sources with objects that are set up by code when the library is loaded."""
+    names = subprocess.run(["nm", str(path)], check=True, capture_output=True, text=True).stdout
+    return re.findall(r"\b_GLOBAL__sub_I_(\S+)", names)
+
+
 def main():
     if len(sys.argv) != 2:
         sys.exit(__doc__.split("\n\n")[1])
@@ -40,6 +46,8 @@ def main():
     tested = set(re.findall(r"\w+", " ".join(file.read_text() for file in TESTS.glob("*.cpp"))))
     complaints = [f"{path}: needs {name}, which platform/surface.txt does not list"
                   for name in sorted(used - listed)]
+    complaints += [f"{path}: {name} sets something up at load time; make it constant"
+                   for name in initialisers(path)]
     complaints += [f"platform/surface.txt: {name} is not called any more; remove it"
                    for name in sorted(listed - used)]
     complaints += [f"tests/conformance: no test names {name}; add one"

@@ -14,6 +14,7 @@ RULES = [
      re.compile(r"^src/")),
     (re.compile(r"(?<![%\w])[uL]\"|\bstd::(string|vector|thread|mutex|function)\b"),
      "what the device's library does not have", re.compile(r"^src/")),
+    (re.compile(r"\bsubstr\s*\("), "a call that may throw; base::Part does not", re.compile(r"^src/")),
 ]
 
 

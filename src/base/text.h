@@ -71,10 +71,10 @@ template <std::size_t Capacity>
 template <typename Char>
 [[nodiscard]] constexpr bool StartsWith(std::basic_string_view<Char> text,
                                         std::basic_string_view<Char> start) noexcept {
-  return text.substr(0, start.size()) == start;
+  return Part(text, 0, start.size()) == start;
 }
 [[nodiscard]] constexpr bool StartsWith(std::string_view text, std::string_view start) noexcept {
-  return text.substr(0, start.size()) == start;
+  return Part(text, 0, start.size()) == start;
 }
 
 [[nodiscard]] constexpr bool EndsWith(std::string_view text, std::string_view end) noexcept {

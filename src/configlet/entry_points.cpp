@@ -84,7 +84,7 @@ std::uint32_t IcfgGetField(const char* name, std::uint32_t /*unused*/, std::uint
   constexpr std::string_view kAnswered = "Protocol Version";
   constexpr std::string_view kVersion = configlet::kVersionText;
   const std::string_view asked = TextOrEmpty(name);
-  if (!base::EqualIgnoringCase(kAnswered.substr(0, asked.size()), asked)) {
+  if (!base::EqualIgnoringCase(base::Part(kAnswered, 0, asked.size()), asked)) {
     return Answer(IcfgResult::kUnknownName);
   }
   report::Log("Getting MCFTP Version\r\n");

@@ -126,7 +126,7 @@ constexpr FieldRow kFields[] = {
 constexpr const FieldRow* Find(std::string_view name) noexcept {
   for (const FieldRow& row : kFields) {
     const std::string_view known =
-        row.match == NameMatch::kWhole ? row.name : row.name.substr(0, name.size());
+        row.match == NameMatch::kWhole ? row.name : base::Part(row.name, 0, name.size());
     if (base::EqualIgnoringCase(known, name)) return &row;
   }
   return nullptr;

@@ -39,13 +39,13 @@ std::optional<UrlParts> ParseUrl(base::WideView url) noexcept {
   UrlParts parts;
   parts.path = base::Part(rest, end + 1);
   if (colon != base::WideView::npos) {
-    parts.host = rest.substr(0, colon);
+    parts.host = base::Part(rest, 0, colon);
     parts.port = static_cast<std::int32_t>(
         base::LeadingNumber<base::WideChar>(base::Part(rest, colon + 1, end - colon - 1)));
   } else {
     // KEPT ODDITY: without a port the host keeps the separator, so it does not resolve, and the
     // port is 0. Jobs always name a port.
-    parts.host = rest.substr(0, end + 1);
+    parts.host = base::Part(rest, 0, end + 1);
   }
   return parts;
 }

@@ -1,5 +1,6 @@
 #include <coredll.h>
 
+#include "base/text.h"
 #include "device/file.h"
 #include "upgrade/file_lists.h"
 #include "upgrade/paths.h"
@@ -13,7 +14,7 @@ void ApplyRenames(const UpgradeConfig& job) noexcept {
     if (file == nullptr) continue;
     const PathText from(base::FieldView(file->destination));
     if (!base::EndsWith(from.view(), kSuffix)) continue;
-    const PathText to(from.view().substr(0, from.size() - kSuffix.size()));
+    const PathText to(base::Part(from.view(), 0, from.size() - kSuffix.size()));
     files.MoveFile(from.c_str(), to.c_str());
   }
 }

@@ -1,5 +1,6 @@
 #include "upgrade/paths.h"
 
+#include "base/text.h"
 #include "device/file.h"
 
 namespace upgrade {
@@ -19,7 +20,7 @@ bool ExistsOrCreated(device::File& files, std::string_view folder) noexcept {
 // Climbs until a folder is there or can be made, then makes the ones below it. A loop, because the
 // depth of a path from a list file is the list's choice.
 void CreateFolderOf(std::string_view path) noexcept {
-  const std::string_view whole = FolderOf(path.substr(0, kPathSize - 1));
+  const std::string_view whole = FolderOf(base::Part(path, 0, kPathSize - 1));
   device::File files;
   std::string_view there = whole;
   while (!there.empty() && there != "\\" && !ExistsOrCreated(files, there)) {
@@ -27,7 +28,7 @@ void CreateFolderOf(std::string_view path) noexcept {
   }
   while (there.size() < whole.size()) {
     const std::size_t next = whole.find('\\', there.size() + 1);
-    there = whole.substr(0, next);
+    there = base::Part(whole, 0, next);
     static_cast<void>(Create(files, there));  // the next level tells by itself
   }
 }

@@ -26,7 +26,7 @@ static_assert(FileName("a\\b") == "b" && FileName("b") == "b" && FileName("a\\")
 /// What stands before the last backslash, empty without one.
 [[nodiscard]] constexpr std::string_view FolderOf(std::string_view path) noexcept {
   const std::size_t at = path.rfind('\\');
-  return at == std::string_view::npos ? std::string_view{} : path.substr(0, at);
+  return at == std::string_view::npos ? std::string_view{} : base::Part(path, 0, at);
 }
 static_assert(FolderOf("\\a\\b") == "\\a" && FolderOf("\\b").empty() && FolderOf("b").empty());
 

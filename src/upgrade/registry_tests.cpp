@@ -92,7 +92,7 @@ bool TextHolds(const tagRegistryTest& test, const Value& value) noexcept {
   device::NarrowText<Value::kTextBytes / sizeof(WCHAR) * kMostBytesAUnit + 1> text;
   const DWORD size = value.size < Value::kTextBytes ? value.size : Value::kTextBytes;
   const base::WideView units(value.text, size / sizeof(WCHAR));
-  if (!text.Assign(units.substr(0, units.find(WCHAR{})))) return false;
+  if (!text.Assign(base::Part(units, 0, units.find(WCHAR{})))) return false;
   return Holds(base::FieldView(test.operation), Order(text.view(), base::FieldView(test.value)));
 }
 

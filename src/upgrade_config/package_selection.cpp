@@ -11,8 +11,8 @@ constexpr std::size_t kComparedCharacters = 63;
 
 /// What of a text is compared.
 std::string_view Compared(std::string_view text) noexcept {
-  const std::string_view beginning = text.substr(0, kComparedCharacters);
-  return beginning.substr(0, beginning.find_first_of("\r\n"));
+  const std::string_view beginning = base::Part(text, 0, kComparedCharacters);
+  return base::Part(beginning, 0, beginning.find_first_of("\r\n"));
 }
 
 }  // namespace
@@ -31,7 +31,7 @@ bool SelectsDevice(std::string_view patterns, std::string_view device) noexcept 
   // An empty piece is no pattern: as one it would select every device.
   for (std::size_t from = patterns.find_first_not_of(','); from != std::string_view::npos;) {
     const std::string_view rest = base::Part(patterns, from);
-    const std::string_view pattern = rest.substr(0, rest.find(','));
+    const std::string_view pattern = base::Part(rest, 0, rest.find(','));
     if (CompareCfgStr(pattern, device)) return true;
     from = patterns.find_first_not_of(',', from + pattern.size());
   }

@@ -99,7 +99,7 @@ class PlatformAnswer {
   [[nodiscard]] std::uint8_t byte(std::size_t index) const noexcept { return bytes_[index]; }
   [[nodiscard]] std::string_view text() const noexcept {
     const std::string_view all(reinterpret_cast<const char*>(bytes_), length_);
-    return all.substr(0, all.find('\0'));
+    return base::Part(all, 0, all.find('\0'));
   }
 
  private:

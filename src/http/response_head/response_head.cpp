@@ -59,7 +59,7 @@ HeadError ParseResponseHead(std::string_view block, bool crc_required, std::uint
   head.content_length = length.value;
   head.attributes = NumberBehind(block, "Content-Attributes:");
   if (const auto stamp = Behind(block, "Content-timestamp:")) {
-    head.time_stamp = stamp->substr(0, stamp->find('\r')).substr(0, kMaxTimeStamp);
+    head.time_stamp = base::Part(base::Part(*stamp, 0, stamp->find('\r')), 0, kMaxTimeStamp);
   }
   head.crc32 = NumberBehind(block, "Content-CRC32:");
   if (crc_required && !head.crc32) return HeadError::kNoCrc;

@@ -1,5 +1,7 @@
 #include "upgrade/list_file/inf_file.h"
 
+#include "base/text.h"
+
 namespace upgrade {
 namespace {
 
@@ -12,7 +14,7 @@ bool TakeQuoted(std::string_view* line, std::string_view* text) noexcept {
   line->remove_prefix(open + 1);
   const std::size_t close = line->find('"');
   if (close == std::string_view::npos) return false;
-  *text = line->substr(0, close);
+  *text = base::Part(*line, 0, close);
   line->remove_prefix(close + 1);
   return text->size() <= InfFileReader::kLongestText && text->find('\0') == std::string_view::npos;
 }
@@ -28,7 +30,7 @@ bool ParseLine(std::string_view line, InfEntry* entry) noexcept {
 
 bool InfFileReader::Next(InfEntry* entry) noexcept {
   while (!rest_.empty()) {
-    const std::string_view line = rest_.substr(0, rest_.find_first_of(kLineEnds));
+    const std::string_view line = base::Part(rest_, 0, rest_.find_first_of(kLineEnds));
     rest_.remove_prefix(line.size() < rest_.size() ? line.size() + 1 : line.size());
     if (ParseLine(line, entry)) return true;
   }

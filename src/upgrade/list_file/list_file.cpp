@@ -2,6 +2,8 @@
 
 #include <cstddef>
 
+#include "base/text.h"
+
 namespace upgrade {
 namespace {
 
@@ -21,7 +23,7 @@ bool Fits(const ListRecord& record) noexcept {
 }  // namespace
 
 ListFileReader::ListFileReader(std::string_view bytes) noexcept
-    : rest_(bytes.substr(0, bytes.find('\0'))) {}
+    : rest_(base::Part(bytes, 0, bytes.find('\0'))) {}
 
 std::string_view ListFileReader::NextField() noexcept {
   const std::size_t from = rest_.find_first_not_of(kSeparators);
@@ -30,7 +32,7 @@ std::string_view ListFileReader::NextField() noexcept {
     return {};
   }
   rest_.remove_prefix(from);
-  const std::string_view field = rest_.substr(0, rest_.find_first_of(kSeparators));
+  const std::string_view field = base::Part(rest_, 0, rest_.find_first_of(kSeparators));
   rest_.remove_prefix(field.size());
   return field;
 }

@@ -29,10 +29,11 @@ DiskNeed PackageDiskNeed(std::string_view options) noexcept {
   const auto found = Behind(options, "DiskSize=");
   if (!found) return need;
   constexpr std::size_t kLongestValue = 127;
-  const std::string_view value = found->substr(0, found->find(',')).substr(0, kLongestValue);
+  const std::string_view value =
+      base::Part(base::Part(*found, 0, found->find(',')), 0, kLongestValue);
   const std::size_t colon = value.find(':');
   if (colon == std::string_view::npos) return need;
-  need.folder.Assign(value.substr(0, colon));
+  need.folder.Assign(base::Part(value, 0, colon));
   need.bytes = base::LeadingInt(base::Part(value, colon + 1));
   return need;
 }

@@ -9,7 +9,7 @@ namespace {
 
 /// The device's string up to the line end that some devices store behind it.
 std::string_view FirstLine(std::string_view text) noexcept {
-  return text.substr(0, text.find_first_of(std::string_view("\r\n\0", 3)));
+  return base::Part(text, 0, text.find_first_of(std::string_view("\r\n\0", 3)));
 }
 
 }  // namespace
@@ -29,7 +29,7 @@ bool AnyListPatternMatches(std::string_view patterns, std::string_view device) n
   for (std::size_t from = patterns.find_first_not_of(kSeparators);
        from != std::string_view::npos;) {
     const std::string_view rest = base::Part(patterns, from);
-    const std::string_view pattern = rest.substr(0, rest.find_first_of(kSeparators));
+    const std::string_view pattern = base::Part(rest, 0, rest.find_first_of(kSeparators));
     if (ListPatternMatches(pattern, device)) return true;
     from = patterns.find_first_not_of(kSeparators, from + pattern.size());
   }
