@@ -12,13 +12,11 @@
 namespace {
 
 using test::GetFile;
-using test::LogLinesWith;
 using test::PutFile;
 using test::ReadLog;
 using ::testing::Contains;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
-using ::testing::Not;
 using ::testing::Optional;
 
 class UpgradeClientTest : public test::ScenarioTest {

@@ -18,7 +18,6 @@
 namespace device {
 namespace {
 
-using test::AttributesOf;
 using test::Exists;
 using test::PutFile;
 using test::SetAttributesOf;

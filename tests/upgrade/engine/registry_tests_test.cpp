@@ -199,10 +199,10 @@ TEST_F(RegistryTestsTest, AskBelowTheRootBeforeWhenTheRootIsUnknown) {
 
 struct TypeCase {
   DWORD stored;
+  bool holds;
   std::vector<BYTE> data;
   const char* type;
   const char* why;
-  bool holds;
   const char* log;
 };
 
@@ -213,24 +213,24 @@ TEST_F(RegistryTestsTest, DecideByTheTypeThatTheRegistryTells) {
   constexpr char kUnsupported[] = "Orvenix - PerformTests - Unsupported reg type\r\n";
   constexpr char kNoValue[] = "Orvenix - PerformTests - No such valuename\r\n";
   const TypeCase cases[] = {
-      {REG_DWORD, number, "REG_DWORD", "as it should be", true, ""},
-      {REG_SZ, text, "REG_SZ", "as it should be", true, ""},
-      {REG_SZ, text, "REG_DWORD", "a short text where a number should be", false, ""},
-      {REG_SZ, longer, "REG_DWORD", "a text that does not fit a number", false, kNoValue},
-      {REG_DWORD, number, "REG_SZ", "a number where a text should be", false, ""},
-      {REG_DWORD, number, "String", "the type of a test that names none", false, ""},
-      {REG_SZ, text, "String", "the type of a test that names none", false, ""},
-      {REG_SZ, text, "", "no type", false, ""},
-      {REG_SZ, text, "reg_sz", "letter case counts", false, ""},
-      {REG_DWORD, number, "reg_dword", "letter case counts", false, ""},
-      {REG_BINARY, number, "REG_DWORD", "another type", false, kUnsupported},
-      {REG_BINARY, text, "REG_SZ", "another type", false, kUnsupported},
-      {REG_BINARY, longer, "REG_DWORD", "bytes that do not fit a number", false, kNoValue},
-      {REG_MULTI_SZ, text, "REG_SZ", "another type", false, kUnsupported},
-      {REG_EXPAND_SZ, text, "REG_SZ", "another type", false, kUnsupported},
-      {REG_BINARY, number, "REG_BINARY", "a type that no test can name", false, kUnsupported},
-      {REG_DWORD, {7, 0}, "REG_DWORD", "half a number", false, ""},
-      {REG_DWORD, {}, "REG_DWORD", "no number at all", false, ""},
+      {REG_DWORD, true, number, "REG_DWORD", "as it should be", ""},
+      {REG_SZ, true, text, "REG_SZ", "as it should be", ""},
+      {REG_SZ, false, text, "REG_DWORD", "a short text where a number should be", ""},
+      {REG_SZ, false, longer, "REG_DWORD", "a text that does not fit a number", kNoValue},
+      {REG_DWORD, false, number, "REG_SZ", "a number where a text should be", ""},
+      {REG_DWORD, false, number, "String", "the type of a test that names none", ""},
+      {REG_SZ, false, text, "String", "the type of a test that names none", ""},
+      {REG_SZ, false, text, "", "no type", ""},
+      {REG_SZ, false, text, "reg_sz", "letter case counts", ""},
+      {REG_DWORD, false, number, "reg_dword", "letter case counts", ""},
+      {REG_BINARY, false, number, "REG_DWORD", "another type", kUnsupported},
+      {REG_BINARY, false, text, "REG_SZ", "another type", kUnsupported},
+      {REG_BINARY, false, longer, "REG_DWORD", "bytes that do not fit a number", kNoValue},
+      {REG_MULTI_SZ, false, text, "REG_SZ", "another type", kUnsupported},
+      {REG_EXPAND_SZ, false, text, "REG_SZ", "another type", kUnsupported},
+      {REG_BINARY, false, number, "REG_BINARY", "a type that no test can name", kUnsupported},
+      {REG_DWORD, false, {7, 0}, "REG_DWORD", "half a number", ""},
+      {REG_DWORD, false, {}, "REG_DWORD", "no number at all", ""},
   };
   std::string log;
   for (const TypeCase& c : cases) {
