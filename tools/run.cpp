@@ -9,6 +9,7 @@
 #include "device/device.h"
 #include "kernel/kernel.h"
 #include "library/management_queue.h"
+#include "process/processes.h"
 #include "storage/storage.h"
 #include "text/names.h"
 #include "tools/configlet_library.h"
@@ -54,7 +55,7 @@ class UpgradeRun {
         job_(ReadJob(options.job)),
         profile_(ReadDeviceFolder(options.device)),
         configlet_(LoadConfiglet(options.library)),
-        view_(StyleOf(options)),
+        view_(StyleOf(options), options.events),
         world_(sim::World::MakeReal()),
         device_(MakeDevice()) {
     callbacks_.set_data = &TakeDocument;
@@ -71,11 +72,12 @@ class UpgradeRun {
     if (options_.callbacks) {
       configlet_.set_callbacks(reinterpret_cast<std::uintptr_t>(&view_), &callbacks_);
     }
-    WalkJob(configlet_, job_, options_.job.string(),
-            [this](const WalkedCall& call) { ShowCall(call); });
+    ShowProcesses();
+    Walk();
     Outcome outcome;
     outcome.ended = WaitForEnd();
     configlet_.uninitialize();
+    ShowProcesses();
     outcome.seconds = Seconds();
     outcome.check = CheckFiles(device_->storage(), job_, profile_.configuration);
     Judge(outcome);
@@ -124,6 +126,23 @@ class UpgradeRun {
       std::string ignored;  // a screen that cannot be kept spoils no upgrade
       static_cast<void>(screen.SavePng(options_.device / kDeviceScreen, ignored));
     });
+  }
+
+  void Walk() {
+    try {
+      WalkJob(configlet_, job_, options_.job.string(),
+              [this](const WalkedCall& call) { ShowCall(call); });
+    } catch (const Failure&) {
+      ShowProcesses();  // a refused job may have stopped some
+      throw;
+    }
+  }
+
+  /// Which programs of the device run: a job may stop some and start one.
+  void ShowProcesses() {
+    nlohmann::ordered_json names = nlohmann::ordered_json::array();
+    for (const auto& process : device_->processes().List()) names.push_back(process.name);
+    view_.ShowEvent({{"event", "processes"}, {"names", names}});
   }
 
   void ShowCall(const WalkedCall& call) {
@@ -213,7 +232,10 @@ class UpgradeRun {
   }
 
   [[nodiscard]] std::string Advice(const Outcome& outcome) const {
-    if (outcome.ended) return "see \\FileXfer.log: orvenix device show " + options_.device.string();
+    if (outcome.ended) {
+      const auto log = device_->storage().HostPath(kTransferLog);
+      return "see its log: orvenix explain " + (log ? *log : options_.device).string();
+    }
     return "is the server running at " + FindField(job_, "HTTPServer", "BaseURL") + ":" +
            FindField(job_, "HTTPServer", "HTTPPort") + "?";
   }

@@ -12,6 +12,7 @@ void AddRunVerb(CLI::App& app, Action& action) {
   run->add_option("--device", options->device, "the device's folder, from 'device new'")
       ->required();
   run->add_option("--screens", options->screens, "save a picture of every paint in this folder");
+  run->add_option("--events", options->events, "also write what --json prints to this file");
   run->add_option("--timeout", options->timeout_s, "seconds to wait for the end of the upgrade")
       ->capture_default_str();
   run->add_flag("--callbacks,!--no-callbacks", options->callbacks,

@@ -4,6 +4,8 @@
 #include <cstdio>
 #include <iostream>
 
+#include "tools/failure.h"
+
 namespace tools {
 namespace {
 
@@ -49,12 +51,24 @@ std::string FormatBar(const sim::BarView& bar, int width) {
   return text + std::string(4 - number.size(), ' ') + number + "%";
 }
 
+RunView::RunView(Style style, const std::filesystem::path& record) : style_(style) {
+  if (record.empty()) return;
+  record_.open(record, std::ios::binary | std::ios::trunc);
+  if (!record_) {
+    throw Failure(ExitCode::kCannotWrite, record.string(), "cannot be written",
+                  "is the folder there and writable?");
+  }
+}
+
 RunView::~RunView() {
   if (bars_shown_) std::cout << std::endl;
 }
 
-void RunView::Print(const nlohmann::ordered_json& event) {
-  std::cout << event.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace) << std::endl;
+void RunView::Tell(const nlohmann::ordered_json& event) {
+  if (style_ != Style::kJson && !record_.is_open()) return;
+  const std::string line = event.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace);
+  if (record_.is_open()) record_ << line << std::endl;
+  if (style_ == Style::kJson) std::cout << line << std::endl;
 }
 
 void RunView::Line(const std::string& text) {
@@ -64,13 +78,7 @@ void RunView::Line(const std::string& text) {
 }
 
 void RunView::Bars(const sim::ProgressView& view) {
-  if (!view.overall) return;
-  if (style_ == Style::kJson) {
-    nlohmann::ordered_json event{{"event", "progress"}, {"overall", Percent(*view.overall)}};
-    if (view.file) event["file"] = Percent(*view.file);
-    Print(event);
-    return;
-  }
+  if (!view.overall || style_ == Style::kJson) return;
   std::string bars = "overall " + FormatBar(*view.overall, kBarWidth);
   if (view.file) bars += "   file " + FormatBar(*view.file, kBarWidth);
   if (style_ == Style::kTerminal) {
@@ -86,28 +94,27 @@ void RunView::ShowProgress(const sim::ProgressView& view) {
   const std::vector<std::string> none;
   const auto lines = NewLines(last_ ? last_->status_lines : none, view.status_lines);
   for (const std::string& line : lines) {
-    if (style_ == Style::kJson) {
-      Print({{"event", "status"}, {"text", line}});
-    } else {
-      Line("  " + line);
-    }
+    Tell({{"event", "status"}, {"text", line}});
+    if (style_ != Style::kJson) Line("  " + line);
   }
   const bool moved =
       !last_ || !SameBar(last_->overall, view.overall) || !SameBar(last_->file, view.file);
+  if (moved && view.overall) {
+    nlohmann::ordered_json event{{"event", "progress"}, {"overall", Percent(*view.overall)}};
+    if (view.file) event["file"] = Percent(*view.file);
+    Tell(event);
+  }
   if (moved || (style_ == Style::kTerminal && !lines.empty())) Bars(view);
   last_ = view;
 }
 
 void RunView::ShowMessage(const Message& message) {
   const std::lock_guard<std::mutex> hold(mutex_);
-  if (style_ != Style::kJson) {
-    Line(DescribeMessage(message));
-    return;
-  }
+  if (style_ != Style::kJson) Line(DescribeMessage(message));
   nlohmann::ordered_json event{{"event", "document"}};
   event.update(MessageMembers(message));
   event["text"] = message.document;
-  Print(event);
+  Tell(event);
 }
 
 void RunView::ShowRemark(const std::string& text) {
@@ -117,7 +124,7 @@ void RunView::ShowRemark(const std::string& text) {
 
 void RunView::ShowEvent(const nlohmann::ordered_json& event) {
   const std::lock_guard<std::mutex> hold(mutex_);
-  if (style_ == Style::kJson) Print(event);
+  Tell(event);
 }
 
 std::optional<sim::ProgressView> RunView::last() const {

@@ -2,6 +2,8 @@
 #pragma once
 
 #include <cstdint>
+#include <filesystem>
+#include <fstream>
 #include <mutex>
 #include <nlohmann/json.hpp>
 #include <optional>
@@ -29,7 +31,9 @@ class RunView {
  public:
   enum class Style : std::uint8_t { kTerminal, kPlain, kJson };
 
-  explicit RunView(Style style) : style_(style) {}
+  /// @param record  file that gets every event as JSON does, whatever the style; empty: none
+  /// Throws Failure kCannotWrite.
+  explicit RunView(Style style, const std::filesystem::path& record = {});
   /// Ends the line of the bars.
   ~RunView();
   RunView(const RunView&) = delete;
@@ -39,7 +43,7 @@ class RunView {
   void ShowMessage(const Message& message);
   /// A line of the program's own. With JSON it is left out; the events say the same.
   void ShowRemark(const std::string& text);
-  /// An object of its own; shown with JSON only.
+  /// An object of its own; shown with JSON only, and recorded.
   void ShowEvent(const nlohmann::ordered_json& event);
 
   /// The window as it was seen last.
@@ -48,9 +52,11 @@ class RunView {
  private:
   void Line(const std::string& text);
   void Bars(const sim::ProgressView& view);
-  static void Print(const nlohmann::ordered_json& event);
+  /// Records the event, and prints it in JSON.
+  void Tell(const nlohmann::ordered_json& event);
 
   const Style style_;
+  std::ofstream record_;
   mutable std::mutex mutex_;
   std::optional<sim::ProgressView> last_;
   bool bars_shown_ = false;

@@ -64,10 +64,12 @@ TEST_F(RunTest, BringsEveryFileToTheDeviceAndTellsWhatHappens) {
   scratch_.Write("device/storage/Application/read me.txt", "hello\n");
   scratch_.Write("device/storage/Application/sub/data.bin", "spoilt");
 
-  const Ended run = Run("run out/job.xml --device device --screens screens --json");
+  const Ended run = Run("run out/job.xml --device device --screens screens --json --events all");
 
   ASSERT_EQ(run.code, 0) << run.errors;
+  EXPECT_EQ(ReadWholeFile(scratch_.path() / "all"), run.output);
   const auto events = Events(run.output);
+  EXPECT_THAT(events, Contains(nlohmann::json{{"event", "processes"}, {"names", {"host.exe"}}}));
   const nlohmann::json& ended = events.back();
   EXPECT_EQ(ended.at("outcome"), "ok");
   EXPECT_EQ(ended.at("files").size(), 3U);

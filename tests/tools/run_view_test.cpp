@@ -3,7 +3,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include "server/scratch_folder.h"
 #include "tools/device_table.h"
+#include "tools/failure.h"
+#include "tools/file_text.h"
 
 namespace tools {
 namespace {
@@ -46,6 +49,25 @@ TEST(FormatBytesTest, UsesTheUnitThatLeavesAFewDigits) {
   EXPECT_EQ(FormatBytes(1024), "1.0 KiB");
   EXPECT_EQ(FormatBytes(41'943'040), "40.0 MiB");
   EXPECT_EQ(FormatBytes(std::uint64_t{5} << 30U), "5.0 GiB");
+}
+
+TEST(RunViewTest, RecordsEventsWhateverIsShown) {
+  const ScratchFolder scratch;
+  const auto file = scratch.path() / "events";
+  {
+    RunView view(RunView::Style::kPlain, file);
+    view.ShowEvent({{"event", "started"}});
+    sim::ProgressView progress;
+    progress.status_lines = {"Validating files"};
+    progress.overall = sim::BarView{19, 38};
+    view.ShowProgress(progress);
+    view.ShowRemark("not an event");
+  }
+
+  EXPECT_EQ(ReadWholeFile(file),
+            "{\"event\":\"started\"}\n{\"event\":\"status\",\"text\":\"Validating files\"}\n"
+            "{\"event\":\"progress\",\"overall\":50}\n");
+  EXPECT_THROW(RunView(RunView::Style::kPlain, scratch.path() / "no/folder"), Failure);
 }
 
 }  // namespace

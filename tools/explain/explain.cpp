@@ -77,8 +77,9 @@ void ExplainText(const ExplainOptions& options) {
     PrintJson(json);
     return;
   }
-  std::cout << "a line of the " << (row.on_screen ? "screen" : "log") << ", phase "
-            << NameOf(row.phase) << "\n  " << row.meaning << "\n";
+  std::cout << "a line of the " << (row.on_screen ? "screen" : "log");
+  if (row.phase != Phase::kAny) std::cout << ", phase " << NameOf(row.phase);
+  std::cout << "\n  " << row.meaning << "\n";
   if (code != nullptr) std::cout << "  " << code->name << ": " << code->meaning << "\n";
   const char* remedy = code != nullptr && *code->remedy != '\0' ? code->remedy : row.remedy;
   if (*remedy != '\0') std::cout << "  remedy: " << remedy << "\n";
