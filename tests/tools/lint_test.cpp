@@ -337,6 +337,13 @@ TEST_F(LintServedTest, ReadsTheListAsTheDeviceDoes) {
               ElementsAre("duplicate-destination", "file-size"));
 }
 
+TEST(LintTest, DoesNotTakeTheCrcOfTheListForLeftOut) {
+  const std::string list =
+      Group("FileList", Field("Source", "l") + Field("Dest", "\\l") + Field("CRC", "0"));
+
+  EXPECT_THAT(Ids(LintText(Upgrade(kServer + kStore + list))), ElementsAre("list-crc"));
+}
+
 TEST_F(LintServedTest, MissesTheListItself) {
   server::Site site(scratch_.path());
 

@@ -187,8 +187,12 @@ void FilesCheck::Downloads() {
     const WantedFile file{
         InJob(list.line), list.source.text, list.destination.text, "*", list.crc.text, {}};
     Wanted(file);
-    // A list with the CRC 0 is looked at like any other, but never found right.
-    if (!IsNumber(list.crc.text, kLargestCrc)) Crc(file);
+    if (!IsNumber(list.crc.text, kLargestCrc)) {
+      Crc(file);
+    } else if (site_ == nullptr && base::LeadingNumber(list.crc.text) == 0) {
+      // Unlike a file's, this 0 is compared.
+      Add(Rule::kListCrc, file.where, "the CRC of the list is 0");
+    }
   }
   for (const DownloadSettings& download : job.downloads) {
     const WantedFile file{InJob(download.line), download.source.text, download.destination.text,
