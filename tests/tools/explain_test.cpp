@@ -182,6 +182,8 @@ TEST(LogStoryTest, KeepsTheJobThatIsAskedFor) {
   EXPECT_EQ(Tell(log, 3).end, JobEnd::kUnfinished);
   EXPECT_EQ(Tell(log).number, 3U);
   EXPECT_EQ(Tell(log, 4).number, 0U);
+  EXPECT_EQ(Tell(Lines{"Version=3.44", "Version=3.44"} + kWalk).number, 1U)
+      << "the host has loaded it";
   EXPECT_EQ(Tell(kStart + kEnd + kStart).number, 2U) << "a program other than the host starts jobs";
 }
 

@@ -84,6 +84,8 @@ void LogStory::BeginJob() {
 
 void LogStory::Known(const TextMatch& match, std::string_view text, std::string_view time) {
   const std::string_view format = match.row->format;
+  // Written when the configlet is loaded, before any job.
+  if (jobs_ == 0 && format == "Version=%s\r\n") return;
   const bool starts = format == "Orvenix thread - Started\r\n";
   if (base::EqualIgnoringCase(text, "IcfgBeginGroup - Orvenix") || jobs_ == 0 ||
       (starts && thread_seen_)) {
