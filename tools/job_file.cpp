@@ -26,7 +26,11 @@ class JobReader {
   [[nodiscard]] int Line(std::ptrdiff_t offset) const {
     const auto end =
         std::clamp<std::ptrdiff_t>(offset, 0, static_cast<std::ptrdiff_t>(text_.size()));
-    return 1 + static_cast<int>(std::count(text_.begin(), text_.begin() + end, '\n'));
+    // Asked for one node after the other: only what lies between two of them is counted.
+    if (end < counted_to_) counted_to_ = counted_ = 0;
+    counted_ += std::count(text_.begin() + counted_to_, text_.begin() + end, '\n');
+    counted_to_ = end;
+    return 1 + static_cast<int>(counted_);
   }
   [[noreturn]] void Fail(std::ptrdiff_t offset, const std::string& what,
                          const std::string& advice = {}) const {
@@ -38,6 +42,8 @@ class JobReader {
 
   std::string_view text_;
   std::string name_;
+  mutable std::ptrdiff_t counted_ = 0;     ///< line ends in front of counted_to_
+  mutable std::ptrdiff_t counted_to_ = 0;  ///< an offset
 };
 
 std::string JobReader::NameOf(const pugi::xml_node& node) const {

@@ -197,6 +197,8 @@ std::vector<LintCase> CasesOfFilesAndCleanup() {
        With(Cleanup("Delete", "\\Temp\\") + Cleanup("Save", "\\Temp\\a.txt"))},
       {"save-direct", With(Cleanup("Delete", "\\Temp\\a.txt") + Cleanup("Save", "\\temp\\A.TXT"))},
       {"save-nothing", With(Cleanup("Save", "\\Temp\\a.txt"))},
+      {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp"))},
+      {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp\\sub\\"))},
       {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temper\\a.txt"))},
       {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp\\x.y\\a.txt"))},
       {"stop-path", With(Group("StopProcess", Field("Process", "\\Windows\\a.exe")))},
@@ -262,6 +264,20 @@ TEST(LintTest, HasTheRulesThatItsDocumentLists) {
   }
 
   EXPECT_THAT(document, HasSubstr(table));
+}
+
+TEST(LintTest, TakesALargeJobAtOnce) {
+  std::string cleanup;
+  for (int i = 0; i < 20'000; ++i) {
+    const std::string name = "\\Folder" + std::to_string(i);
+    cleanup += "\n" + Group("File", Field("Name", name) + Field("Action", "Delete")) +
+               Group("File", Field("Name", name + "\\keep.txt") + Field("Action", "Save"));
+  }
+
+  const Findings findings = LintText(With(Group("DiskCleanup", cleanup) + Cleanup("Save", "\\x")));
+
+  ASSERT_EQ(findings.all().size(), 1U);
+  EXPECT_EQ(findings.all()[0].where, "job.xml:20001");
 }
 
 TEST(LintTest, NamesTheLineAndKeepsWhatFitsAsTheDeviceDoes) {

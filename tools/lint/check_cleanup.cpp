@@ -1,7 +1,8 @@
 // The checks of a job's delete and save lists.
-#include <algorithm>
+#include <set>
+#include <string>
+#include <vector>
 
-#include "base/text.h"
 #include "tools/lint/checks.h"
 
 namespace tools {
@@ -36,51 +37,80 @@ void CheckDelete(const JobCheck& check, const Setting& entry) {
   if (path.front() != '\\') check.Add(Rule::kDeleteRelative, entry.line, found);
 }
 
-/// How a walk below a folder of the delete list would name the files in it.
-std::string WalkedPrefix(std::string_view folder) {
-  return folder == "\\" ? "\\" : PathKey(folder) + "\\";
-}
-
-enum class Reach : std::uint8_t { kNot, kByFolder, kDoubled, kDirectly };
-
-/// Whether the walk of `folder` comes to a file `saved`, whose path is a key.
-Reach ReachOf(const std::string& folder, const std::string& saved) {
-  if (IsFilePath(folder)) return PathKey(folder) == saved ? Reach::kDirectly : Reach::kNot;
-  const std::string prefix = WalkedPrefix(folder);
-  if (folder != "\\" && folder.back() == '\\') {
-    // "\Temp\" is walked as "\Temp\\name": an entry "\Temp\name" never equals that.
-    if (base::StartsWith(saved, prefix)) return Reach::kByFolder;
-    return base::StartsWith(saved, prefix.substr(0, prefix.size() - 1)) ? Reach::kDoubled
-                                                                        : Reach::kNot;
+/// How a job's deletes come to a file, to find what its save list protects.
+class Deletes {
+ public:
+  explicit Deletes(const std::vector<Setting>& entries) {
+    for (const Setting& entry : entries) {
+      std::string key = PathKey(entry.text);
+      if (IsFilePath(key)) {
+        files_.insert(std::move(key));
+      } else if (IsRoot(key)) {
+        folders_.insert("");
+      } else if (key.back() == '\\') {
+        key.pop_back();
+        doubling_.insert(std::move(key));
+      } else {
+        folders_.insert(std::move(key));
+      }
+    }
   }
-  if (!base::StartsWith(saved, prefix)) return Reach::kNot;
-  // The walk takes a folder with a dot in its name for a file and leaves what is in it alone.
-  const std::string below = saved.substr(prefix.size());
-  const bool behind_dot = below.substr(0, below.rfind('\\') + 1).find('.') != std::string::npos;
-  const bool names_file = !below.empty() && below.back() != '\\';
-  return names_file && !behind_dot ? Reach::kByFolder : Reach::kNot;
-}
 
-void CheckSave(const JobCheck& check, const Setting& entry) {
+  [[nodiscard]] bool NamesFile(const std::string& saved) const { return files_.count(saved) != 0; }
+
+  /// Whether the walk of a folder names the file as `saved` does.
+  [[nodiscard]] bool Reaches(const std::string& saved) const {
+    return Any(saved, [this, &saved](std::size_t slash) {
+      const std::string folder = saved.substr(0, slash);
+      const std::string below = saved.substr(slash + 1);
+      if (doubling_.count(folder) != 0 && below.front() == '\\') return true;
+      // The walk takes a folder with a dot in its name for a file and leaves what is in it alone.
+      const std::string between = below.substr(0, below.rfind('\\') + 1);
+      return folders_.count(folder) != 0 && between.find('.') == std::string::npos;
+    });
+  }
+
+  /// "\Temp\" is walked as "\Temp\\name": an entry "\Temp\name" never equals that.
+  [[nodiscard]] bool Misses(const std::string& saved) const {
+    return Any(saved, [this, &saved](std::size_t slash) {
+      return doubling_.count(saved.substr(0, slash)) != 0 && saved[slash + 1] != '\\';
+    });
+  }
+
+ private:
+  /// Every backslash with something behind it, of a path that does not end in one.
+  template <typename Test>
+  static bool Any(const std::string& saved, Test test) {
+    if (saved.back() == '\\') return false;
+    for (std::size_t at = saved.find('\\'); at != std::string::npos;
+         at = saved.find('\\', at + 1)) {
+      if (test(at)) return true;
+    }
+    return false;
+  }
+
+  std::set<std::string> files_;
+  std::set<std::string> folders_;
+  std::set<std::string> doubling_;  ///< given with a backslash at their end
+};
+
+void CheckSave(const JobCheck& check, const Setting& entry, const Deletes& deletes) {
   const std::string saved = PathKey(entry.text);
-  bool reached = false, doubled = false, directly = false;
-  for (const Setting& removed : check.job.deletes) {
-    const Reach reach = ReachOf(removed.text, saved);
-    reached = reached || reach == Reach::kByFolder;
-    doubled = doubled || reach == Reach::kDoubled;
-    directly = directly || reach == Reach::kDirectly;
-  }
   const std::string found = "saves " + Quoted(entry.text);
+  const bool directly = deletes.NamesFile(saved), missed = deletes.Misses(saved);
   if (directly) check.Add(Rule::kSaveDirect, entry.line, found);
-  if (doubled) check.Add(Rule::kSaveDoubleBackslash, entry.line, found);
-  if (!reached && !doubled && !directly) check.Add(Rule::kSaveNothing, entry.line, found);
+  if (missed) check.Add(Rule::kSaveDoubleBackslash, entry.line, found);
+  if (!directly && !missed && !deletes.Reaches(saved)) {
+    check.Add(Rule::kSaveNothing, entry.line, found);
+  }
 }
 
 }  // namespace
 
 void CheckCleanup(const JobCheck& check) {
   for (const Setting& entry : check.job.deletes) CheckDelete(check, entry);
-  for (const Setting& entry : check.job.saves) CheckSave(check, entry);
+  const Deletes deletes(check.job.deletes);
+  for (const Setting& entry : check.job.saves) CheckSave(check, entry, deletes);
 }
 
 }  // namespace tools

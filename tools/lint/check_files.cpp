@@ -67,7 +67,12 @@ std::vector<std::string_view> Fields(std::string_view line) {
 
 class FilesCheck {
  public:
-  FilesCheck(const JobCheck& check, server::Site* site) : check_(check), site_(site) {}
+  FilesCheck(const JobCheck& check, server::Site* site) : check_(check), site_(site) {
+    const auto& stores = check.job.stores;
+    has_ram_ = std::any_of(stores.begin(), stores.end(), [](const StoreSettings& store) {
+      return base::StartsWith(store.name.text, kRamName);
+    });
+  }
 
   void Downloads();
   void List();
@@ -97,6 +102,7 @@ class FilesCheck {
   std::set<std::string> masks_;
   std::uint64_t listed_bytes_ = 0;
   bool sizes_known_ = true;
+  bool has_ram_ = false;  ///< a requirement gives the RAM buffer its size
 };
 
 // ---- what the job or a line of the list says ----
@@ -127,11 +133,7 @@ void FilesCheck::Destination(const WantedFile& file) {
     return;
   }
   if (base::StartsWith(path, kRamName)) {
-    const auto& stores = check_.job.stores;
-    const bool sized = std::any_of(stores.begin(), stores.end(), [](const StoreSettings& store) {
-      return base::StartsWith(store.name.text, kRamName);
-    });
-    if (!sized) Add(Rule::kRamWithoutStore, file.where, found);
+    if (!has_ram_) Add(Rule::kRamWithoutStore, file.where, found);
     return;
   }
   if (path.find_first_of("<>:\"|?*") != std::string_view::npos) {
