@@ -57,6 +57,11 @@ inline std::vector<std::string> Downloads(const UpgradeConfig& job) {
   return files;
 }
 
+/// A list of one package with these attributes.
+inline std::string Package(const std::string& attributes) {
+  return "<OSFirmware><Package " + attributes + "/></OSFirmware>";
+}
+
 /// Source folder, base and destination folder of each package, divided by bars.
 inline std::vector<std::string> Packages(const UpgradeConfig& job) {
   std::vector<std::string> packages;

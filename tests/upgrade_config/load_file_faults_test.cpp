@@ -166,6 +166,28 @@ TEST_F(LoadFileFaultsTest, DeletesAFileOfTheSystemFolderThatItCannotOpen) {
   EXPECT_TRUE(Exists(kInFlashStore));
 }
 
+TEST_F(LoadFileFaultsTest, LeavesAFileOfTheFlashStoreThatItCannotOpen) {
+  PutFile(kInFlashStore, kPort82);
+  device().faults().Add({"CreateFileW", 1, 1, ERROR_SHARING_VIOLATION});
+  UpgradeConfig job;
+  EXPECT_EQ(job.LoadFromFile(u"job.xml"), 0);
+  EXPECT_EQ(job.GetHTTPPort(), 80);
+  EXPECT_TRUE(Exists(kInFlashStore));
+  EXPECT_EQ(job.LoadFromFile(u"job.xml"), 1);
+  EXPECT_EQ(job.GetHTTPPort(), 82);
+}
+
+TEST_F(LoadFileFaultsTest, TakesNoWildcardForAName) {
+  PutFile(kInSystemFolder, kPort81);
+  PutFile(kInFlashStore, kPort82);
+  UpgradeConfig job;
+  for (const char16_t* name : {u"j?b.xml", u"*.xml", u"*", u"job.xm?"}) {
+    EXPECT_EQ(job.LoadFromFile(name), 0);
+  }
+  EXPECT_EQ(job.GetHTTPPort(), 80);
+  EXPECT_TRUE(Exists(kInSystemFolder) && Exists(kInFlashStore));
+}
+
 TEST_F(LoadFileFaultsTest, LeavesAFileThatSomebodyElseHasOpen) {
   PutFile(kInSystemFolder, kPort81);
   HANDLE const other = CreateFileW(u"\\windows\\job.xml", GENERIC_WRITE, 0, nullptr, OPEN_EXISTING,
@@ -311,7 +333,7 @@ TEST_F(LoadFileFaultsTest, TakesEverythingOfALongFile) {
   EXPECT_EQ(Blocks(), blocks);
 }
 
-TEST_F(LoadFileFaultsTest, TakesOneElementOfManyAttributesAndPiecesWithoutDelay) {
+TEST_F(LoadFileFaultsTest, TakesOneElementOfManyAttributesAndPieces) {
   std::string pieces;
   std::string attributes;
   for (int i = 0; i < 50000; ++i) pieces += "MR41,";
@@ -336,6 +358,26 @@ TEST_F(LoadFileFaultsTest, KeepsTheFileWhenThereIsNoMemoryToReadIt) {
   EXPECT_EQ(Handles(), handles);
   EXPECT_EQ(job.LoadFromFile(u"job.xml"), 1);
   EXPECT_EQ(job.GetHTTPPort(), 81);
+}
+
+TEST_F(LoadFileFaultsTest, TakesAsManyElementsAsThereIsMemoryFor) {
+  std::string text = "<Downloads>";
+  for (int i = 0; i < 5000; ++i) text += "<File SourceDir='' DestDir=''/>";
+  text += "</Downloads><EndText>end</EndText>";
+  const std::size_t blocks = Blocks();
+  {
+    UpgradeConfig job;
+    device().faults().Add({"LocalAlloc", 1000, 0, ERROR_OUTOFMEMORY});  // from then on
+    EXPECT_EQ(Load(job, text), 1);
+    EXPECT_GT(device().faults().fired(), 4000U) << "it reads on";
+    device().faults().Clear();
+    EXPECT_GT(job.DownloadFiles().size(), 900U);
+    EXPECT_LT(job.DownloadFiles().size(), 1000U);
+    EXPECT_TRUE(job.DownloadFiles().incomplete());
+    EXPECT_STREQ(job.GetUpgEndMsg(), "end") << "what needs no memory is taken";
+  }
+  EXPECT_EQ(Blocks(), blocks);
+  EXPECT_EQ(BadFrees(), 0U);
 }
 
 TEST_F(LoadFileFaultsTest, LosesOnlyWhatThereIsNoMemoryForAndLeaksNothing) {

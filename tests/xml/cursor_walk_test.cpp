@@ -161,5 +161,41 @@ TEST_F(CursorWalkTest, WalksTheDeepestDocument) {
   EXPECT_EQ(cursor.depth(), 0);
 }
 
+TEST_F(CursorWalkTest, MeetsWhatIsAddedAheadOfItAndNothingBehind) {
+  XmlCursor walk = AtRoot();
+  std::string met;
+  ASSERT_TRUE(walk.BeginChildren());
+  for (XmlStep step = XmlStep::kStart; step != XmlStep::kOver; step = walk.Next()) {
+    ASSERT_LT(met.size(), 100U);
+    met += step == XmlStep::kStart ? "+" : "-";
+    met += walk.Name();
+    if (step != XmlStep::kStart) continue;
+    XmlCursor edit = walk;  // the walk itself stays where it is
+    const std::string name = walk.Name();
+    if (name == "b") {
+      EXPECT_TRUE(edit.AddElement("child", Place::kLastChild));
+    } else if (name == "c") {
+      EXPECT_TRUE(edit.AddElement("before", Place::kFirstSibling));
+      EXPECT_TRUE(edit.AddElement("after", Place::kLastSibling));
+    } else if (name == "e") {
+      EXPECT_STREQ(edit.SetText("changed"), "changed");
+      EXPECT_STREQ(walk.Text(), "changed");
+      EXPECT_TRUE(edit.AddElement("next", Place::kAfter));
+    }
+  }
+  EXPECT_EQ(met, "+b+c-c+d-d+child-child+after-after-b+e-e+next-next");
+  EXPECT_EQ(Shape(document()), "a[x=1]{b{before c d child after} e|changed| next}");
+}
+
+TEST_F(CursorWalkTest, GoesOnFromAnElementThatItAdded) {
+  XmlCursor cursor = AtRoot();
+  ASSERT_TRUE(cursor.BeginChildren());
+  ASSERT_TRUE(cursor.AddElement("new", Place::kAfter));  // b has started; now "new" has
+  EXPECT_EQ(cursor.Next(), XmlStep::kEnd);
+  EXPECT_STREQ(cursor.Name(), "new");
+  EXPECT_EQ(cursor.Next(), XmlStep::kStart);
+  EXPECT_STREQ(cursor.Name(), "e");
+}
+
 }  // namespace
 }  // namespace xml
