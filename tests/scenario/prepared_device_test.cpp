@@ -5,10 +5,12 @@
 #include "ce/kernel.h"
 #include "ce/system.h"
 #include "faults/faults.h"
+#include "memory/memory.h"
 #include "orvenix/configlet.h"
 #include "orvenix/upgrade_thread.h"
 #include "process/processes.h"
 #include "product_support/jobs.h"
+#include "product_support/messages.h"
 #include "scenario/scenario_test.h"
 
 namespace {
@@ -177,6 +179,50 @@ TEST_F(PreparedDeviceTest, FailsForAnOutsideCallerWhenATestFails) {
   EXPECT_THAT(log, Not(HasSubstr("Processing OS files")));
   EXPECT_THAT(log, Not(HasSubstr("Local Upgrade Executing")));
   EXPECT_THAT(LogLines(), Contains("needs system 7").Times(2)) << "found, and at the end";
+}
+
+TEST_F(PreparedDeviceTest, FailsForAnOutsideCallerWhateverTheMessageOfTheTestSays) {
+  StoreSystem(6);
+  for (const std::string message : {"", "first\r\nsecond\r\n", "100%s"}) {
+    const test::MessageRecord record(device());
+    job_.tests.front().message = message;
+    RunAsClient(NewClientJob());
+    ExpectOldApplication();
+    EXPECT_THAT(ShownLines(), Contains(message)) << message;
+    EXPECT_EQ(record.Lines().back(),
+              "TW_CLIENT: " + test::StatusText(1, "Upgrade Failed: " + message));
+  }
+}
+
+TEST_F(PreparedDeviceTest, LosesWhatItHasFetchedWhenTheHostEndsTheSameUpgradeAgain) {
+  EXPECT_EQ(Start(job_), ICFG_OK);
+  for (int s = 0; s < 600 && !Exists("\\Apps\\new.bin"); ++s) Sleep(100);
+  ASSERT_TRUE(Exists("\\Apps\\new.bin"));
+  EXPECT_EQ(IcfgEndGroup("Upgrade", 0, 0), ICFG_OK);
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_FALSE(Exists("\\Apps\\new.bin"));
+  EXPECT_EQ(device().memory().bad_frees(), 0U);
+}
+
+TEST_F(PreparedDeviceTest, BeginsAtItsFirstPassForEverWhenItsPassStateIsCleared) {
+  server().Put("fw/os1.bin", "first");
+  server().Put("fw/os2.bin", "second");
+  const auto run = [this](const char* saved) {
+    UpgradeConfig* const job = NewClientJob();
+    test::SetMultiPass(*job);
+    test::AddPackage(*job, {0, "os1.bin", "\\", "fw/", "", "Pass=1"});
+    test::AddPackage(*job, {0, "os2.bin", "\\", "fw/", "", "Pass=2"});
+    job->AddFileDelete("\\");
+    if (saved != nullptr) job->AddFileSave(saved);
+    RunAsClient(job);
+    return test::GetFile("\\kvoupgclnt.txt").value_or("none");
+  };
+  EXPECT_EQ(run(nullptr), "none");
+  EXPECT_THAT(ShownLines(), Contains("Start, CurrentPass = 1"));
+  EXPECT_EQ(run(nullptr), "none");
+  EXPECT_THAT(ShownLines(), Not(Contains("Start, CurrentPass = 2")));
+  EXPECT_EQ(run("\\kvoupgclnt.txt"), "1") << "unless the file is saved";
+  EXPECT_EQ(run("\\kvoupgclnt.txt"), "2");
 }
 
 TEST_F(PreparedDeviceTest, IsNeitherTestedNorCleanedByTheThreadOfAHostsJob) {

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "ce/kernel.h"
+#include "ce/system.h"
 #include "faults/faults.h"
 #include "memory/memory.h"
 #include "orvenix/configlet.h"
@@ -102,6 +103,35 @@ class RandomHost {
     Set("Name", "\\");
     Set("RequiredSpace", Below(8) == 0 ? "4000000000" : "1000");
     IcfgEndGroup("Store", 0, 0);
+    if (Below(2) == 0) SendTest();
+    if (Below(2) == 0) SendCleanup();
+  }
+
+  /// A test that passes unless a later field spoils it.
+  static void SendTest() {
+    IcfgBeginGroup("Registry", 0, 0);
+    Set("Key", "Software\\Orvenix");
+    Set("ValueName", "Number");
+    Set("Type", "REG_DWORD");
+    Set("Operator", "EQ");
+    Set("Value", "7");
+    IcfgEndGroup("Registry", 0, 0);
+  }
+
+  /// Empties a folder but for one file: no job ever deletes more of it.
+  void SendCleanup() {
+    IcfgBeginGroup("DiskCleanup", 0, 0);
+    SendCleanupFile("Save", "\\kept\\Sub\\KEEP.txt");
+    SendCleanupFile("Delete", "\\kept");
+    IcfgEndGroup("DiskCleanup", 0, 0);
+  }
+
+  void SendCleanupFile(const char* action, const char* path) {
+    IcfgBeginGroup("File", 0, 0);
+    SendFile(file_);  // inside "Download" the group begins a record of a file all the same
+    Set("Action", action);
+    Set("Name", path);
+    IcfgEndGroup("File", 0, 0);
   }
 
   void SendFile(const HostFile& file) {
@@ -159,7 +189,18 @@ class RandomHostTest : public ScenarioTest, public ::testing::WithParamInterface
  protected:
   RandomHostTest()
       : host_(GetParam(), {"a.bin", "\\a.bin", "*", server().Put("a.bin", std::string(5000, 'a'))},
-              {"list.txt", "\\list.txt", "*", PutList()}) {}
+              {"list.txt", "\\list.txt", "*", PutList()}) {
+    PutFile("\\kept\\Sub\\keep.txt", "kept");
+    PutFile("\\kept\\Sub\\go.txt", "old");
+    PutFile("\\old\\a.txt", "old");
+    const DWORD seven = 7;
+    HKEY key = nullptr;
+    RegCreateKeyExW(HKEY_LOCAL_MACHINE, TEXT("Software\\Orvenix"), 0, nullptr, 0, KEY_ALL_ACCESS,
+                    nullptr, &key, nullptr);
+    RegSetValueExW(key, TEXT("Number"), 0, REG_DWORD, reinterpret_cast<const BYTE*>(&seven),
+                   sizeof seven);
+    RegCloseKey(key);
+  }
 
   std::string PutList() {
     const std::string crc = server().Put("b.bin", std::string(3000, 'b'));
@@ -193,6 +234,8 @@ TEST_P(RandomHostTest, LosesNeitherMemoryNorHandlesWhateverItCallsAndWhen) {
   EXPECT_GT(host_.started(), 0);
   EXPECT_GT(server().received().size(), 0U) << "some of the jobs have fetched something";
 
+  EXPECT_EQ(GetFile("\\kept\\Sub\\keep.txt"), "kept");
+  EXPECT_FALSE(Exists("\\kept\\Sub\\go.txt"));
   EXPECT_FALSE(upgrade::UpgradeInProgress());
   EXPECT_EQ(device().memory().bad_frees(), 0U);
   report::SetSyslogTarget(0, "");
