@@ -37,7 +37,7 @@ namespace {
 using test::CrcText;
 using test::GetFile;
 
-constexpr int kShards = 16;
+constexpr int kShards = 32;
 
 const std::string kRight = "right from the beginning";
 const std::string kNew(3000, 'n');
@@ -194,7 +194,7 @@ Outcome RunCall(std::uint64_t nth) {
 
 class FaultWalkTest : public ::testing::TestWithParam<int> {};
 
-// Each shard takes every sixteenth call: a failure names the call, and its number is enough to
+// Each shard takes every 32nd call: a failure names the call, and its number is enough to
 // repeat the run.
 TEST_P(FaultWalkTest, SurvivesTheFailureOfEachCallInTurn) {
   std::uint64_t nth = static_cast<std::uint64_t>(GetParam()) + 1;
@@ -209,6 +209,6 @@ TEST_P(FaultWalkTest, SurvivesTheFailureOfEachCallInTurn) {
   RecordProperty("calls", static_cast<int>(nth));
 }
 
-INSTANTIATE_TEST_SUITE_P(EverySixteenth, FaultWalkTest, ::testing::Range(0, kShards));
+INSTANTIATE_TEST_SUITE_P(EveryThirtySecond, FaultWalkTest, ::testing::Range(0, kShards));
 
 }  // namespace
