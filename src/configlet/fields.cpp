@@ -79,8 +79,7 @@ void Action(Walk& walk, const char* value) noexcept {
 
 void Name(Walk& walk, const char* value) noexcept {
   if (walk.group.view() == "File") {
-    // Cut, it could be the name of another file.
-    if (!walk.cleanup_name.Assign(value)) walk.cleanup_name.Clear();
+    walk.cleanup_name.Assign(value);  // cut as every field is
   } else if (walk.group.view() == "Store" && walk.storage.get() != nullptr) {
     base::CopyText(walk.storage.get()->name, value);
   }
