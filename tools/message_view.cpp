@@ -1,6 +1,7 @@
 #include "tools/message_view.h"
 
-#include <cstdlib>
+#include <charconv>
+#include <cstdint>
 #include <optional>
 #include <pugixml.hpp>
 
@@ -38,13 +39,24 @@ std::optional<Status> ReadStatus(const std::string& document) {
 std::optional<pugi::xml_document> ReadEvent(const std::string& document) {
   if (document.find(kEventMark) == std::string::npos) return std::nullopt;
   pugi::xml_document parsed;
-  if (!parsed.load_string(document.c_str())) return std::nullopt;
+  // A detail is what the job says, to the last blank and line end.
+  constexpr unsigned kAsItStands =
+      (pugi::parse_default | pugi::parse_ws_pcdata_single) & ~pugi::parse_eol;
+  if (!parsed.load_string(document.c_str(), kAsItStands)) return std::nullopt;
   return parsed;
 }
 
 std::string FieldOf(const pugi::xml_document& event, const char* name) {
   const pugi::xml_node group = event.child("DevInfo").child("Subsystem").child("Group");
   return group.find_child_by_attribute("Field", "Name", name).text().get();
+}
+
+/// 0 for what is no number.
+template <typename Number>
+Number NumberIn(const std::string& text) {
+  Number number = 0;
+  std::from_chars(text.data(), text.data() + text.size(), number);
+  return number;
 }
 
 }  // namespace
@@ -65,11 +77,11 @@ nlohmann::ordered_json MessageMembers(const Message& message) {
   nlohmann::ordered_json members{{"kind", "other"}, {"to", message.to}};
   if (const auto status = ReadStatus(message.document)) {
     members["kind"] = "status";
-    members["state"] = std::atoi(status->state.c_str());
+    members["state"] = NumberIn<std::int32_t>(status->state);
     members["reason"] = status->reason;
   } else if (const auto event = ReadEvent(message.document)) {
     members["kind"] = "device-event";
-    members["code"] = std::strtoul(FieldOf(*event, "msgNum").c_str(), nullptr, 10);
+    members["code"] = NumberIn<std::uint32_t>(FieldOf(*event, "msgNum"));
     members["time"] = FieldOf(*event, "timestampString");
     members["unique_id"] = FieldOf(*event, "uniqueId");
     members["detail"] = FieldOf(*event, "optArgArrayElement");

@@ -82,6 +82,7 @@ class UpgradeRun {
     outcome.check = CheckFiles(device_->storage(), job_, profile_.configuration);
     Judge(outcome);
     device_->screen().OnPaint({});
+    view_.EndUpgrade();
     KeepScreen();
     Tell(outcome);
     return outcome.code;

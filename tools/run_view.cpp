@@ -17,11 +17,15 @@ bool SameBar(const std::optional<sim::BarView>& a, const std::optional<sim::BarV
   return !a || (a->filled == b->filled && a->total == b->total);
 }
 
-/// Texts of the device may hold anything, and a terminal obeys control characters.
+/// Texts of the device may hold anything, and a terminal obeys control characters: those below the
+/// blank, 0x7F, and those that UTF-8 writes as C2 80 to C2 9F.
 std::string WithoutControls(std::string text) {
-  std::replace_if(
-      text.begin(), text.end(), [](unsigned char letter) { return letter < ' ' || letter == 0x7F; },
-      ' ');
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    const auto byte = static_cast<unsigned char>(text[i]);
+    const bool is_second = byte >= 0x80 && byte < 0xA0 && i > 0 && text[i - 1] == '\xC2';
+    if (is_second) text[i - 1] = ' ';
+    if (is_second || byte < ' ' || byte == 0x7F) text[i] = ' ';
+  }
   return text.substr(0, text.find_last_not_of(' ') + 1);
 }
 
@@ -91,6 +95,7 @@ void RunView::Bars(const sim::ProgressView& view) {
 
 void RunView::ShowProgress(const sim::ProgressView& view) {
   const std::lock_guard<std::mutex> hold(mutex_);
+  if (is_over_) return;
   const std::vector<std::string> none;
   const auto lines = NewLines(last_ ? last_->status_lines : none, view.status_lines);
   for (const std::string& line : lines) {
@@ -110,11 +115,17 @@ void RunView::ShowProgress(const sim::ProgressView& view) {
 
 void RunView::ShowMessage(const Message& message) {
   const std::lock_guard<std::mutex> hold(mutex_);
+  if (is_over_) return;
   if (style_ != Style::kJson) Line(DescribeMessage(message));
   nlohmann::ordered_json event{{"event", "document"}};
   event.update(MessageMembers(message));
   event["text"] = message.document;
   Tell(event);
+}
+
+void RunView::EndUpgrade() {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  is_over_ = true;
 }
 
 void RunView::ShowRemark(const std::string& text) {

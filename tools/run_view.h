@@ -41,6 +41,9 @@ class RunView {
 
   void ShowProgress(const sim::ProgressView& view);
   void ShowMessage(const Message& message);
+  /// Progress and messages that come from now on are not shown: threads of an upgrade that has not
+  /// ended in time go on, and the last word is the program's.
+  void EndUpgrade();
   /// A line of the program's own. With JSON it is left out; the events say the same.
   void ShowRemark(const std::string& text);
   /// An object of its own; shown with JSON only, and recorded.
@@ -60,6 +63,7 @@ class RunView {
   mutable std::mutex mutex_;
   std::optional<sim::ProgressView> last_;
   bool bars_shown_ = false;
+  bool is_over_ = false;
 };
 
 }  // namespace tools

@@ -50,6 +50,19 @@ TEST(DescribeMessageTest, ShowsAnythingElseAsItStands) {
             "message to X: <Subsystem Name=\"TW_Client\"></Field>");
 }
 
+TEST(DescribeMessageTest, KeepsBlanksAndLineEndsOfADetail) {
+  const auto members = MessageMembers(Event("<Field Name=\"optArgArrayElement\"> \r\n </Field>"));
+  EXPECT_EQ(members["detail"], " \r\n ");
+  EXPECT_EQ(DescribeMessage(Event("<Field Name=\"optArgArrayElement\">  </Field>")),
+            "event 205180 to TW_Event_DB@~MASTERKX:   ");
+}
+
+TEST(MessageMembersTest, CountsAStateThatIsNoNumberAsZero) {
+  EXPECT_EQ(MessageMembers(Status("99999999999999999999", ""))["state"], 0);
+  EXPECT_EQ(MessageMembers(Status("x", ""))["state"], 0);
+  EXPECT_EQ(MessageMembers(Status("-2147483648", ""))["state"], -2147483648LL);
+}
+
 TEST(MessageMembersTest, NameWhatAMessageSays) {
   EXPECT_EQ(MessageMembers(Status("4", "<b>")).dump(),
             R"({"kind":"status","to":"TW_CLIENT","state":4,"reason":"<b>"})");

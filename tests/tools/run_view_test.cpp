@@ -3,6 +3,10 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <functional>
+#include <string>
+#include <vector>
+
 #include "server/scratch_folder.h"
 #include "tools/device_table.h"
 #include "tools/failure.h"
@@ -68,6 +72,47 @@ TEST(RunViewTest, RecordsEventsWhateverIsShown) {
             "{\"event\":\"started\"}\n{\"event\":\"status\",\"text\":\"Validating files\"}\n"
             "{\"event\":\"progress\",\"overall\":50}\n");
   EXPECT_THROW(RunView(RunView::Style::kPlain, scratch.path() / "no/folder"), Failure);
+}
+
+/// What `show` makes a view of that style print.
+std::string Printed(RunView::Style style, const std::function<void(RunView&)>& show) {
+  testing::internal::CaptureStdout();
+  RunView view(style);
+  show(view);
+  return testing::internal::GetCapturedStdout();
+}
+
+TEST(RunViewTest, PassesNoControlCharacterToTheTerminal) {
+  const auto shown = [](const std::string& text) {
+    return Printed(RunView::Style::kPlain, [&](RunView& view) { view.ShowRemark(text); });
+  };
+  EXPECT_EQ(shown("a\x1B[2Jb\x7Fz\r\n"), "a [2Jb z\n");
+  EXPECT_EQ(shown("a\xC2\x9B"
+                  "2Jb \xC2\x80\xC2\x9F."),
+            "a  2Jb     .\n")
+      << "those of two bytes, too";
+  EXPECT_EQ(shown("\xC2\xA0 \xC3\x9F \xC2"), "\xC2\xA0 \xC3\x9F \xC2\n") << "letters stay";
+}
+
+TEST(RunViewTest, ShowsNothingOfTheDeviceAfterTheUpgradesEnd) {
+  for (const auto style : {RunView::Style::kPlain, RunView::Style::kJson}) {
+    EXPECT_EQ(Printed(style,
+                      [](RunView& view) {
+                        view.EndUpgrade();
+                        view.ShowMessage({"TW_CLIENT", "late"});
+                        sim::ProgressView progress;
+                        progress.status_lines = {"late"};
+                        view.ShowProgress(progress);
+                      }),
+              "");
+  }
+  EXPECT_THAT(Printed(RunView::Style::kPlain,
+                      [](RunView& view) {
+                        view.ShowMessage({"TW_CLIENT", "in time"});
+                        view.EndUpgrade();
+                        view.ShowRemark("the end");
+                      }),
+              "message to TW_CLIENT: in time\nthe end\n");
 }
 
 }  // namespace
