@@ -21,6 +21,7 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr const char* kFolder = "messages";
+constexpr std::uint32_t kHighestNumber = 999'999'999;
 
 /// Names of who gets a message come from the device's programs.
 std::string FileNameOf(const QueuedMessage& message) {
@@ -37,7 +38,8 @@ std::string FileNameOf(const QueuedMessage& message) {
   return number + who + ".xml";
 }
 
-/// The highest number of the messages in `folder`, 0 when there are none.
+/// The highest number of the messages in `folder`, 0 when there are none. Files with higher numbers
+/// than a device can reach are somebody else's.
 std::uint32_t LastNumberIn(const fs::path& folder) {
   std::uint32_t last = 0;
   std::error_code error;
@@ -46,7 +48,7 @@ std::uint32_t LastNumberIn(const fs::path& folder) {
     const std::string name = file->path().filename().string();
     std::uint32_t number = 0;
     std::from_chars(name.data(), name.data() + name.size(), number);
-    last = std::max(last, number);
+    if (number <= kHighestNumber) last = std::max(last, number);
   }
   return last;
 }

@@ -1,6 +1,5 @@
 // The device's message queue for its management system, and the library through which programs
 // reach it.
-// reach it.
 //
 //   HMODULE library = LoadLibraryW(TEXT("kx_clapi_dll"));
 //   auto open = reinterpret_cast<...>(GetProcAddressW(library, TEXT("lapi_open")));

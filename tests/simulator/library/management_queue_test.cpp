@@ -118,6 +118,16 @@ TEST_F(ManagementQueueTest, GoesOnCountingWhenTheDeviceStartsAgain) {
   EXPECT_THAT(Files(), ElementsAre("000001-A.xml: one", "000002-A.xml: two"));
 }
 
+TEST_F(ManagementQueueTest, CountsOnFromNoFileOfSomebodyElse) {
+  fs::create_directory(device().folder() / "messages");
+  for (const char* name : {"4294967295-A.xml", "99999999999999999999-A.xml", "1000000000-A.xml",
+                           "-5-A.xml", "x.xml", "000041-A.xml"}) {
+    std::ofstream(device().folder() / "messages" / name) << "old";
+  }
+  Send(Connect(), "A", "", "new");
+  EXPECT_THAT(Files(), ::testing::Contains("000042-A.xml: new"));
+}
+
 TEST_F(ManagementQueueTest, MakesNoFolderWithoutMessages) {
   Disconnect(Connect());
   EXPECT_FALSE(fs::exists(device().folder() / "messages"));
