@@ -64,10 +64,12 @@ MessageRecord::MessageRecord(sim::Device& device) : device_(device) {
 }
 
 MessageRecord::~MessageRecord() {
+  if (is_host_) LeaveStatuses();
   device_.messages().StopListening(listener_);
 }
 
 void MessageRecord::TakeStatuses() {
+  is_host_ = true;
   IcfgSetCallbacks(reinterpret_cast<std::uintptr_t>(this), &callbacks_);
 }
 

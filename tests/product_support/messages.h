@@ -28,7 +28,7 @@ class MessageRecord {
  public:
   /// Listens at the queue from now on.
   explicit MessageRecord(sim::Device& device);
-  /// The device must still be there.
+  /// Leaves the statuses to the queue, too. The device must still be there.
   ~MessageRecord();
   MessageRecord(const MessageRecord&) = delete;
   MessageRecord& operator=(const MessageRecord&) = delete;
@@ -48,6 +48,7 @@ class MessageRecord {
   sim::Device& device_;
   std::size_t listener_ = 0;
   IcfgCallbacks callbacks_{};
+  bool is_host_ = false;  ///< has been at some time
   mutable std::mutex mutex_;
   std::vector<std::string> lines_;
 };

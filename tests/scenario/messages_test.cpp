@@ -31,6 +31,7 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::SizeIs;
 
+constexpr const char* kUniqueId = "TQ52MR700123";  // of the device that tests have by default
 constexpr const char* kToClient = "TW_CLIENT: ";
 constexpr const char* kToEvents = "TW_Event_DB@~MASTERKX: ";
 constexpr const char* kToHost = "host: ";
@@ -54,9 +55,8 @@ class MessagesTest : public test::ScenarioTest {
   [[nodiscard]] static std::string Status(const char* to, int state, const std::string& reason) {
     return to + StatusText(state, reason);
   }
-  /// With the unique id that the device's own configuration gives its jobs.
   [[nodiscard]] static std::string Event(std::uint32_t code, const std::string& text = "") {
-    return kToEvents + EventText(kNow, UpgradeConfig().GetUniqueId(), code, text);
+    return kToEvents + EventText(kNow, kUniqueId, code, text);
   }
 
   [[nodiscard]] static test::HostTest FailingTest(const std::string& message) {
@@ -84,9 +84,10 @@ TEST_F(MessagesTest, TellStatusesToAHostThatTakesThemAndEventsToTheQueue) {
 
 TEST_F(MessagesTest, AreSentAtTheseTimes) {
   std::vector<sim::Micros> times;
-  device().messages().Listen(
+  const std::size_t listener = device().messages().Listen(
       [this, &times](const sim::QueuedMessage&) { times.push_back(world().now()); });
   Run();
+  device().messages().StopListening(listener);
   ASSERT_EQ(times.size(), 4U);
   EXPECT_EQ(times[1], times[0]) << "first the status, then the event";
   EXPECT_EQ(times[3] - times[2], seconds(2)) << "first the event, then the status";
@@ -96,7 +97,7 @@ TEST_F(MessagesTest, AreSentAtTheseTimes) {
 TEST_F(MessagesTest, AreLoggedAroundTheSteps) {
   Run();
   const std::string log = ReadLog();
-  const std::string id = UpgradeConfig().GetUniqueId();
+  const std::string id = kUniqueId;
   const auto event = [&id](const std::string& time, std::uint32_t code) {
     return "Orvenix - SendDeviceEvent - entering\r\n" + time +
            "Orvenix - SendDeviceEvent - send msg\r\n" + EventText(time, id, code) + "\r\n";
@@ -187,6 +188,52 @@ TEST_F(MessagesTest, TellWhyAnOutsideProgramsUpgradeFailed) {
                                   Status(kToClient, 1, "Upgrade Failed: Wrong model")));
 }
 
+TEST_F(MessagesTest, TellOfAFailedTestInAnOutsideProgramsUpgradeHoweverLongItsTextIs) {
+  const std::string longest(255, 'm');
+  for (const std::string& message : {std::string(), longest}) {
+    auto* const job = new UpgradeConfig;
+    job->SetBaseURL(test::kServerUrl);
+    test::AddTest(
+        *job, {"HKEY_LOCAL_MACHINE", "No\\Such\\Key", "Name", "REG_SZ", "EQ", "value", message});
+    const std::size_t before = Sent().size();
+    CloseHandle(StartUpgradeThread(job, 1));
+    ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+    const std::vector<std::string> sent = Sent();
+    ASSERT_EQ(sent.size(), before + 4);
+    EXPECT_EQ(sent[before + 2], Event(205180, message));
+    EXPECT_EQ(sent[before + 3],
+              Status(kToClient, 1, ("Upgrade Failed: " + message).substr(0, 255)));
+  }
+}
+
+/// A host that walks its next job from inside the callback of every status.
+struct EagerHost {
+  IcfgCallbacks callbacks{};
+  std::vector<std::string> heard;
+  std::vector<std::uint32_t> results;
+
+  static int Take(std::uintptr_t context, const char* text, std::int32_t, const IcfgCallbacks*) {
+    auto& host = *reinterpret_cast<EagerHost*>(context);
+    host.heard.emplace_back(text);
+    host.results.push_back(IcfgBeginGroup("Upgrade", 0, 0));
+    IcfgSetField("BeginText", 0, "too late");
+    IcfgSetCallbacks(context, &host.callbacks);
+    return 0;
+  }
+};
+
+TEST_F(MessagesTest, MayMakeTheHostCallBackFromTheUpgradesOwnThread) {
+  EagerHost host;
+  host.callbacks.set_data = &EagerHost::Take;
+  IcfgSetCallbacks(reinterpret_cast<std::uintptr_t>(&host), &host.callbacks);
+  Run();
+  EXPECT_THAT(host.heard,
+              ElementsAre(StatusText(4, "Device Upgrading"), StatusText(1, "Upgrade Complete")));
+  EXPECT_THAT(host.results, ElementsAre(ICFG_UPGRADE_RUNNING, ICFG_UPGRADE_RUNNING));
+  EXPECT_THAT(test::GetFile("\\a.txt"), ::testing::Optional(std::string("content")));
+  IcfgSetCallbacks(0, nullptr);
+}
+
 // ---- refusals ----
 
 TEST_F(MessagesTest, TellWhyAnUpgradeDoesNotStart) {
@@ -266,6 +313,35 @@ TEST_F(MessagesTest, AreAllThatIsLostWhenTheQueueRefuses) {
   EXPECT_THAT(test::GetFile("\\a.txt"), ::testing::Optional(std::string("content")));
   EXPECT_THAT(Sent(), SizeIs(0));
   EXPECT_THAT(LogLinesWith("InitKXTransfer - open"), SizeIs(4));
+}
+
+TEST_F(MessagesTest, GoThroughALibraryOfTheOldName) {
+  device().libraries().Remove(sim::kQueueLibrary);
+  device().libraries().Install(sim::MakeQueueLibrary(sim::kOldQueueLibrary));
+  const test::Holdings before = test::HoldingsOf(device());
+  Run();
+  EXPECT_THAT(Sent(), SizeIs(4));
+  EXPECT_EQ(test::HoldingsOf(device()), before);
+}
+
+TEST_F(MessagesTest, AreAllThatIsLostWithoutAFunctionToWrite) {
+  device().libraries().Install(sim::MakeQueueLibrary(sim::kQueueLibrary, u"lapi_write"));
+  const test::Holdings before = test::HoldingsOf(device());
+  Run();
+  EXPECT_THAT(test::GetFile("\\a.txt"), ::testing::Optional(std::string("content")));
+  EXPECT_THAT(Sent(), SizeIs(0));
+  EXPECT_EQ(test::HoldingsOf(device()), before);
+}
+
+TEST_F(MessagesTest, OfAllJobsGoThroughOneConnectionThatCannotBeClosed) {
+  device().libraries().Install(sim::MakeQueueLibrary(sim::kQueueLibrary, u"lapi_close"));
+  test::Holdings before = test::HoldingsOf(device());
+  ++before.queue_connections;
+  Run();
+  EXPECT_EQ(test::HoldingsOf(device()), before);
+  Run();
+  EXPECT_EQ(test::HoldingsOf(device()), before);
+  EXPECT_THAT(Sent(), SizeIs(8));
 }
 
 TEST_F(MessagesTest, StillReachTheHostWithoutTheLibrary) {

@@ -28,7 +28,7 @@ struct Link {
   LapiClose close = nullptr;
   LapiWrite write = nullptr;
   HANDLE transfer = nullptr;  ///< the connection, null while there is none
-  std::uint32_t options = 1;
+  std::uint32_t options = 0;  ///< see Options
 };
 Link link;
 
@@ -36,6 +36,12 @@ Link link;
 // TW_EVENT_DB within the documents.
 constexpr QueueAddress kClient = {"TW_CLIENT", ""};
 constexpr QueueAddress kEventDatabase = {"TW_Event_DB", "~MASTERKX"};
+
+/// The word is the library's to write to, and in its place as long as the process lives.
+std::uint32_t* Options() noexcept {
+  link.options = 1;
+  return &link.options;
+}
 
 /// Nobody waits for it: other programs only look whether it exists.
 void MarkPresence() noexcept {
@@ -45,6 +51,7 @@ void MarkPresence() noexcept {
   link.mutex = mutex;
 }
 
+// KEPT ODDITY: a library that is missing is looked for, and logged, with every message again.
 bool LoadQueueLibrary() noexcept {
   if (link.library != nullptr) return true;
   Log("Orvenix - InitKXTransfer - LoadLibrary\r\n");
@@ -75,7 +82,7 @@ bool StartLink() noexcept {
   if (!LoadQueueLibrary() || !FindFunctions()) return false;
   if (link.transfer != nullptr) return true;
   Log("Orvenix - InitKXTransfer - open\r\n");
-  link.open(&link.transfer, "127.0.0.1", "UPG_KX_QUEUE", 0, 1, 0, 0, &link.options, 1);
+  link.open(&link.transfer, "127.0.0.1", "UPG_KX_QUEUE", 0, 1, 0, 0, Options(), 1);
   return link.transfer != nullptr;
 }
 
@@ -84,7 +91,7 @@ void Write(QueueAddress destination, const char* text, std::size_t length) noexc
   if (link.write == nullptr) return;
   QueueAddress source = {};
   link.write(link.transfer, 60, 1, 248, 0, 0, &destination, &source, text,
-             static_cast<std::int32_t>(length + 1), 1, 0, 0, &link.options);
+             static_cast<std::int32_t>(length + 1), 1, 0, 0, Options());
 }
 
 void HandToHost(const HostCallbacks& host, const char* text, std::size_t length) noexcept {
@@ -98,7 +105,8 @@ void SendEvent(DeviceEvent event) noexcept {
   GetLocalTime(&now);
   const base::FixedText<33> timestamp = EventTimestamp(now);
   event.timestamp = timestamp.c_str();
-  Log("%s", event.timestamp);  // the next line begins right behind it
+  // KEPT ODDITY: the event's time is logged without a line end: the next line begins behind it.
+  Log("%s", event.timestamp);
   xml::XmlDocument document;
   std::uint32_t length = 0;
   const char* const text = WriteEvent(document, event, &length);
@@ -119,6 +127,7 @@ void InitKXTransfer() noexcept {
 void CloseTransferHandle() noexcept {
   const device::LockGuard lock(link.lock);
   if (link.transfer == nullptr || link.close == nullptr) return;
+  // KEPT ODDITY: logged without the prefix of the other lines, and without a line end.
   Log("CloseTransferHandle");
   link.close(link.transfer);
   link.transfer = nullptr;

@@ -22,9 +22,12 @@ inline constexpr std::uint32_t kEventUpgradeStarted = 205181;
 inline constexpr std::uint32_t kEventUpgradeComplete = 205182;
 
 /// Starts the link to the message queue as far as it is not started yet: library, entry points,
-/// connection. What is missing is looked for again, and logged again, at every call. Each call
-/// also makes sure that the mutex "UPGRADE_CLIENT" exists, by which other programs see that there
-/// is an upgrade client; it stays for the life of the process.
+/// connection. A library, its lapi_open or a connection that is missing is looked for again, and
+/// logged again, at every call. The other two entry points are looked up together with lapi_open
+/// and, once that was found, never again: without lapi_write all messages are lost, without
+/// lapi_close the connection stays. Each call also makes sure that the mutex "UPGRADE_CLIENT"
+/// exists, by which other programs see that there is an upgrade client; it stays for the life of
+/// the process.
 void InitKXTransfer() noexcept;
 
 /// Ends the connection to the message queue; the next message opens another. The library stays

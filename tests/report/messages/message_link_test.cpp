@@ -1,89 +1,44 @@
-#include "report/messages/message_link.h"
-
-#include <gmock/gmock.h>
-
-#include <atomic>
-#include <memory>
-#include <string>
-#include <vector>
+#include "report/messages/message_link_test.h"
 
 #include "ce/errors.h"
 #include "ce/kernel.h"
-#include "faults/faults.h"
 #include "kernel/kernel.h"
 #include "library/libraries.h"
-#include "library/management_queue.h"
+#include "memory/memory.h"
+#include "net/virtual/virtual_server.h"
 #include "orvenix/configlet.h"
-#include "product_support/log_lines.h"
-#include "product_support/messages.h"
-#include "support/device_test.h"
-#include "trace/trace.h"
+#include "report/log/log.h"
 
 namespace report {
 namespace {
 
-using test::EventText;
-using test::kNow;
-using test::ReadLog;
-using test::StatusText;
-using ::testing::Contains;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::Not;
 
-constexpr const char* kTime = "2006/03/01:14:05:09";  // at which a virtual world begins
+/// Everything that is no letter, and "%" in forms that would read or write as a format.
+std::string HostileText() {
+  std::string text;
+  for (int byte = 1; byte < 256; ++byte) text += static_cast<char>(byte);
+  return text + "\r\n%s%n%1000000d%%";
+}
 
-constexpr const char* kLoad = "Orvenix - InitKXTransfer - LoadLibrary\r\n";
-constexpr const char* kFind = "Orvenix - InitKXTransfer - GetHandles\r\n";
-constexpr const char* kOpen = "Orvenix - InitKXTransfer - open\r\n";
-const std::string kStart = std::string(kLoad) + kFind + kOpen;
-constexpr const char* kStatusEntered = "Orvenix - SetRWIStatus - entering\r\n";
-constexpr const char* kStatusSent =
-    "Orvenix - SetRWIStatus - send msg\r\nOrvenix - SetRWIStatus - send msg lapi write\r\n";
-constexpr const char* kEventEntered = "Orvenix - SendDeviceEvent - entering\r\n";
-
-/// Each test runs in a process of its own: the link lives as long as its process.
-class MessageLinkTest : public DeviceTest {
- protected:
-  MessageLinkTest() { Restart({}); }
-  ~MessageLinkTest() override { device().trace().SetSink(nullptr); }
-
-  void Restart(const sim::Profile& profile) {
-    record_.reset();
-    DeviceTest::Restart(profile);
-    record_ = std::make_unique<test::MessageRecord>(device());
-    device().trace().SetSink([this](std::string_view line) { trace_.emplace_back(line); });
-  }
-  void RestartWith(const char* library, const char* lacks, bool opens = true) {
-    sim::Profile profile;
-    profile.message_library = library;
-    profile.message_library_lacks = lacks;
-    profile.message_queue_opens = opens;
-    Restart(profile);
-  }
-
-  [[nodiscard]] test::MessageRecord& record() { return *record_; }
-  [[nodiscard]] std::vector<std::string> Sent() const { return record_->Lines(); }
-  std::uint64_t Calls(const char* call) { return device().faults().Count(call); }
-
-  /// The trace of all calls of that name, from their arguments to their results; the last error,
-  /// which the library leaves alone, is left out.
-  [[nodiscard]] std::vector<std::string> Traced(const std::string& call) const {
-    std::vector<std::string> found;
-    for (const std::string& line : trace_) {
-      const std::size_t at = line.find("\"call\":\"" + call + "\",");
-      if (at == std::string::npos) continue;
-      const std::size_t from = line.find("\"args\"");
-      found.push_back(line.substr(from, line.rfind(",\"error\"") - from));
+/// As it stands within a document.
+std::string Escaped(const std::string& text) {
+  std::string escaped;
+  for (const char letter : text) {
+    switch (letter) {
+      case '<': escaped += "&lt;"; break;
+      case '>': escaped += "&gt;"; break;
+      case '&': escaped += "&amp;"; break;
+      case '"': escaped += "&quot;"; break;
+      case '\'': escaped += "&apos;"; break;
+      default: escaped += letter;
     }
-    return found;
   }
-
- private:
-  std::unique_ptr<test::MessageRecord> record_;
-  std::vector<std::string> trace_;
-};
+  return escaped;
+}
 
 // ---- status ----
 
@@ -189,235 +144,63 @@ TEST_F(MessageLinkTest, SendsAnEventThatIsLongerThanALogLine) {
   EXPECT_THAT(ReadLog(), HasSubstr(EventText(kTime, "id", 1, text).substr(0, 1024) + "\r\n"));
 }
 
+TEST_F(MessageLinkTest, LogsAnEventToSyslogInFourDatagramsMore) {
+  sim::Profile profile;
+  profile.address = "10.0.0.1";
+  Restart(profile);
+  std::vector<std::string> received;
+  const sim::VirtualPort syslog(world(), {0x0A000005, 514},
+                                [&](sim::VirtualPort&, const sim::Endpoint&,
+                                    std::string_view bytes) { received.emplace_back(bytes); });
+  InitKXTransfer();
+  SetSyslogTarget(514, "10.0.0.5");
+  const std::string text(1500, 'e');
+  SendDeviceEvent("id", 1, text.c_str());
+  Sleep(10);
+  SetSyslogTarget(0, "");
+  const std::string head = "< 14>2006-03-01 14:05:09 ";
+  EXPECT_THAT(received,
+              ElementsAre(head + kEventEntered, head + kTime,
+                          head + "Orvenix - SendDeviceEvent - send msg\r\n",
+                          head + EventText(kTime, "id", 1, text).substr(0, 1024), head + "\r\n"));
+  EXPECT_THAT(Sent(), ElementsAre("TW_Event_DB@~MASTERKX: " + EventText(kNow, "id", 1, text)));
+}
+
+TEST_F(MessageLinkTest, PassesEveryByteOfAReasonAsItStands) {
+  SetRWIStatus(4, HostileText().c_str());
+  ASSERT_EQ(device().messages().Messages().size(), 1U);
+  EXPECT_EQ(device().messages().Messages()[0].text, StatusText(4, HostileText()));
+  EXPECT_EQ(ReadLog(), kStatusEntered + kStart + kStatusSent) << "the log has no word of it";
+}
+
+TEST_F(MessageLinkTest, EscapesNothingButFiveLettersInEvents) {
+  InitKXTransfer();
+  SendDeviceEvent(HostileText().c_str(), 7, HostileText().c_str());
+  const std::string text = Escaped(HostileText());
+  ASSERT_EQ(device().messages().Messages().size(), 1U);
+  EXPECT_EQ(device().messages().Messages()[0].text, EventText(kTime, text, 7, text));
+  EXPECT_EQ(ReadLog(), kStart + kEventEntered + kTime + "Orvenix - SendDeviceEvent - send msg\r\n" +
+                           EventText(kTime, text, 7, text).substr(0, 1024) + "\r\n");
+}
+
+TEST_F(MessageLinkTest, TakesNullForNothing) {
+  SetRWIStatus(4, nullptr);
+  SendDeviceEvent(nullptr, 1, nullptr);
+  EXPECT_THAT(Sent(), ElementsAre("TW_CLIENT: " + StatusText(4, ""),
+                                  "TW_Event_DB@~MASTERKX: " + EventText(kNow, "", 1)));
+}
+
 TEST_F(MessageLinkTest, SendsNoEventWithoutMemoryForIt) {
   InitKXTransfer();
+  const std::size_t blocks = device().memory().live_blocks();
   device().faults().Add({"LocalAlloc", 1, 0, 0});
   SendDeviceEvent("id", 1, "x");
   EXPECT_THAT(Sent(), IsEmpty());
   EXPECT_THAT(ReadLog(), Not(HasSubstr("SendDeviceEvent - send msg")));
+  EXPECT_EQ(device().memory().live_blocks(), blocks);
   device().faults().Clear();
   SendDeviceEvent("id", 1, "y");
   EXPECT_THAT(Sent(), ElementsAre("TW_Event_DB@~MASTERKX: " + EventText(kNow, "id", 1, "y")));
-}
-
-// ---- the library's functions ----
-
-TEST_F(MessageLinkTest, CallsTheLibraryWithExactlyTheseArguments) {
-  SetRWIStatus(1, "x");
-  SendDeviceEvent("id", 1, nullptr);
-  CloseTransferHandle();
-  EXPECT_THAT(Traced("lapi_open"),
-              ElementsAre("\"args\":{\"host\":\"127.0.0.1\",\"queue\":\"UPG_KX_QUEUE\","
-                          "\"numbers\":\"0 1 0 0 1 1\"},\"result\":0"));
-  const auto written = [](std::size_t length, const char* to, const char* master) {
-    return "\"args\":{\"connection\":14680065,\"numbers\":\"60 1 248 0 0 1 0 0 1\",\"length\":" +
-           std::to_string(length) + ",\"destination\":\"" + to + "\",\"master\":\"" + master +
-           "\",\"source\":\"\"},\"result\":0";
-  };
-  EXPECT_THAT(
-      Traced("lapi_write"),
-      ElementsAre(written(StatusText(1, "x").size() + 1, "TW_CLIENT", ""),
-                  written(EventText(kTime, "id", 1).size() + 1, "TW_Event_DB", "~MASTERKX")));
-  EXPECT_THAT(Traced("lapi_close"), ElementsAre("\"args\":{\"connection\":14680065},\"result\":0"));
-}
-
-TEST_F(MessageLinkTest, LooksPastResults) {
-  device().faults().Add({"lapi_write", 1, 1, 0});
-  SetRWIStatus(1, "lost");
-  SetRWIStatus(1, "sent");
-  EXPECT_THAT(Sent(), ElementsAre("TW_CLIENT: " + StatusText(1, "sent")));
-  EXPECT_EQ(Calls("lapi_open"), 1U);
-  EXPECT_EQ(ReadLog(), kStatusEntered + kStart + kStatusSent + kStatusEntered + kStatusSent);
-}
-
-// ---- the link ----
-
-TEST_F(MessageLinkTest, StartsOnceAndSaysSo) {
-  InitKXTransfer();
-  InitKXTransfer();
-  EXPECT_EQ(ReadLog(), kStart);
-  EXPECT_EQ(device().messages().open_connections(), 1U);
-}
-
-TEST_F(MessageLinkTest, KeepsOneHandleOfTheMutexThatMarksTheClient) {
-  const std::size_t before = device().kernel().OpenHandles();
-  for (int i = 0; i < 5; ++i) InitKXTransfer();
-  EXPECT_EQ(Calls("CreateMutexW"), 5U) << "at every start";
-  EXPECT_EQ(device().kernel().OpenHandles(), before + 1);
-  EXPECT_THAT(device().kernel().NamedObjects(), ElementsAre("UPGRADE_CLIENT"));
-  CloseTransferHandle();
-  EXPECT_THAT(device().kernel().NamedObjects(), ElementsAre("UPGRADE_CLIENT"));
-  HANDLE const other = CreateMutexW(nullptr, FALSE, TEXT("UPGRADE_CLIENT"));
-  EXPECT_EQ(WaitForSingleObject(other, 0), WAIT_OBJECT_0) << "nobody owns it";
-  ReleaseMutex(other);
-  CloseHandle(other);
-}
-
-TEST_F(MessageLinkTest, KeepsTheMutexWhenItCannotBeMadeAgain) {
-  InitKXTransfer();
-  device().faults().Add({"CreateMutexW", 1, 0, 0});
-  SetRWIStatus(1, "x");
-  EXPECT_THAT(device().kernel().NamedObjects(), ElementsAre("UPGRADE_CLIENT"));
-  EXPECT_THAT(Sent(), ElementsAre("TW_CLIENT: " + StatusText(1, "x")));
-}
-
-TEST_F(MessageLinkTest, EndsOnlyWhatIsOpen) {
-  CloseTransferHandle();
-  EXPECT_EQ(ReadLog(), "");
-  InitKXTransfer();
-  CloseTransferHandle();
-  CloseTransferHandle();
-  EXPECT_EQ(ReadLog(), kStart + "CloseTransferHandle") << "without a line end";
-  EXPECT_EQ(device().messages().open_connections(), 0U);
-  EXPECT_EQ(device().messages().bad_uses(), 0U);
-}
-
-TEST_F(MessageLinkTest, OpensAnotherConnectionAfterTheEndOfTheFirst) {
-  SetRWIStatus(1, "first");
-  CloseTransferHandle();
-  SetRWIStatus(1, "second");
-  EXPECT_EQ(ReadLog(), kStatusEntered + kStart + kStatusSent + "CloseTransferHandle" +
-                           kStatusEntered + kOpen + kStatusSent)
-      << "the library stays loaded";
-  EXPECT_EQ(Sent().size(), 2U);
-  EXPECT_EQ(Calls("LoadLibraryW"), 1U);
-}
-
-TEST_F(MessageLinkTest, TakesTheOldNameOfTheLibrary) {
-  RestartWith("kx_lapi_c_wrapper", "");
-  SetRWIStatus(1, "x");
-  EXPECT_EQ(ReadLog(), kStatusEntered + kStart + kStatusSent);
-  EXPECT_THAT(Traced("LoadLibraryW"), ElementsAre(HasSubstr("\"name\":\"kx_clapi_dll\"}"),
-                                                  HasSubstr("\"name\":\"kx_lapi_c_wrapper\"}")));
-  EXPECT_EQ(Sent().size(), 1U);
-}
-
-// ---- what may be missing ----
-
-TEST_F(MessageLinkTest, LooksForAMissingLibraryWithEveryMessage) {
-  RestartWith("", "");
-  SetRWIStatus(4, "x");
-  SendDeviceEvent("id", 1, "x");
-  CloseTransferHandle();
-  EXPECT_EQ(ReadLog(), std::string(kStatusEntered) + kLoad + kEventEntered + kLoad)
-      << "neither a time nor a document";
-  EXPECT_THAT(Sent(), IsEmpty());
-  EXPECT_EQ(Calls("LoadLibraryW"), 4U) << "both names each time";
-
-  device().libraries().Install(sim::MakeQueueLibrary(sim::kQueueLibrary));
-  SetRWIStatus(1, "there");
-  EXPECT_THAT(Sent(), ElementsAre("TW_CLIENT: " + StatusText(1, "there")));
-}
-
-TEST_F(MessageLinkTest, StillReachesTheHostWithoutALibrary) {
-  RestartWith("", "");
-  record().TakeStatuses();
-  SetRWIStatus(4, "x");
-  SendDeviceEvent("id", 1, "x");
-  EXPECT_THAT(Sent(), ElementsAre("host: " + StatusText(4, "x")));
-}
-
-TEST_F(MessageLinkTest, LooksForAMissingOpenWithEveryMessage) {
-  RestartWith("kx_clapi_dll", "lapi_open");
-  SetRWIStatus(4, "x");
-  SendDeviceEvent("id", 1, "x");
-  CloseTransferHandle();
-  EXPECT_EQ(ReadLog(), std::string(kStatusEntered) + kLoad + kFind + kEventEntered + kFind);
-  EXPECT_THAT(Sent(), IsEmpty());
-}
-
-TEST_F(MessageLinkTest, LosesMessagesWithoutAWriteAndNothingElse) {
-  RestartWith("kx_clapi_dll", "lapi_write");
-  SetRWIStatus(4, "x");
-  SendDeviceEvent("id", 1, "x");
-  CloseTransferHandle();
-  EXPECT_THAT(Sent(), IsEmpty());
-  EXPECT_EQ(device().messages().open_connections(), 0U);
-}
-
-TEST_F(MessageLinkTest, KeepsItsConnectionWithoutAClose) {
-  RestartWith("kx_clapi_dll", "lapi_close");
-  SetRWIStatus(4, "x");
-  CloseTransferHandle();
-  SetRWIStatus(1, "y");
-  EXPECT_EQ(Sent().size(), 2U);
-  EXPECT_EQ(ReadLog(), kStatusEntered + kStart + kStatusSent + kStatusEntered + kStatusSent);
-  EXPECT_EQ(device().messages().open_connections(), 1U);
-}
-
-TEST_F(MessageLinkTest, AsksAgainForAConnectionThatWasRefused) {
-  RestartWith("kx_clapi_dll", "", false);
-  SetRWIStatus(4, "lost");
-  SendDeviceEvent("id", 1, "lost");
-  EXPECT_EQ(ReadLog(), kStatusEntered + kStart + kEventEntered + kOpen);
-  device().messages().SetOpens(true);
-  SendDeviceEvent("id", 1, "sent");
-  EXPECT_THAT(Sent(), ElementsAre("TW_Event_DB@~MASTERKX: " + EventText(kNow, "id", 1, "sent")));
-}
-
-// ---- from several threads ----
-
-class MessageLinkThreadsTest : public RealDeviceTest {};
-
-TEST_F(MessageLinkThreadsTest, SendsEveryMessageWholeWhileOthersCloseTheConnection) {
-  constexpr int kMessages = 40;
-  test::MessageRecord record(device());
-  const auto work = [](void* text) -> DWORD {
-    const auto* const name = static_cast<const char*>(text);
-    for (int i = 0; i < kMessages; ++i) {
-      SetRWIStatus(i, name);
-      SendDeviceEvent(name, static_cast<std::uint32_t>(i), name);
-      if (i % 8 == 7) CloseTransferHandle();
-    }
-    return 0;
-  };
-  char names[][8] = {"one", "two"};
-  HANDLE threads[2];
-  for (int i = 0; i < 2; ++i) {
-    threads[i] = CreateThread(nullptr, 0, work, names[i], 0, nullptr);
-    ASSERT_NE(threads[i], nullptr);
-  }
-  for (HANDLE thread : threads) {
-    EXPECT_EQ(WaitForSingleObject(thread, INFINITE), WAIT_OBJECT_0);
-    CloseHandle(thread);
-  }
-  const std::vector<std::string> lines = record.Lines();
-  EXPECT_EQ(lines.size(), 4U * kMessages);
-  EXPECT_EQ(device().messages().bad_uses(), 0U) << "nobody closed it under another's message";
-  for (const char* name : names) {
-    for (int i = 0; i < kMessages; ++i)
-      EXPECT_THAT(lines, Contains("TW_CLIENT: " + StatusText(i, name)));
-  }
-}
-
-TEST_F(MessageLinkThreadsTest, GivesTheHostContextAndTableAsTheyWereSetTogether) {
-  struct Host {
-    IcfgCallbacks callbacks{};
-    std::atomic<int> heard{0};
-    static int Take(std::uintptr_t context, const char*, std::int32_t, const IcfgCallbacks* table) {
-      auto& host = *reinterpret_cast<Host*>(context);
-      EXPECT_EQ(table, &host.callbacks);
-      ++host.heard;
-      return 0;
-    }
-  };
-  static Host hosts[2];
-  for (Host& host : hosts) host.callbacks.set_data = &Host::Take;
-  IcfgSetCallbacks(reinterpret_cast<std::uintptr_t>(&hosts[0]), &hosts[0].callbacks);
-  HANDLE const thread = CreateThread(
-      nullptr, 0,
-      [](void*) -> DWORD {
-        for (int i = 0; i < 200; ++i) {
-          Host& host = hosts[i % 2];
-          IcfgSetCallbacks(reinterpret_cast<std::uintptr_t>(&host), &host.callbacks);
-        }
-        return 0;
-      },
-      nullptr, 0, nullptr);
-  for (int i = 0; i < 50; ++i) SetRWIStatus(4, "x");
-  WaitForSingleObject(thread, INFINITE);
-  CloseHandle(thread);
-  EXPECT_EQ(hosts[0].heard + hosts[1].heard, 50);
 }
 
 }  // namespace
