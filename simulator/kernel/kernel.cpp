@@ -25,6 +25,11 @@ void Kernel::ForgetSleeps() {
   sleeps_.clear();
 }
 
+void Kernel::SkipSleeps() {
+  const auto lock = device_.world().Acquire();
+  skips_sleeps_ = true;
+}
+
 std::size_t Kernel::LiveThreads() const {
   const auto lock = device_.world().Acquire();
   return device_.world().LiveThreads(device_);

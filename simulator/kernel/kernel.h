@@ -33,6 +33,9 @@ class Kernel {
   /// The most recent Sleeps (65,536 at most), oldest first.
   [[nodiscard]] std::vector<SleepRecord> Sleeps() const;
   void ForgetSleeps();
+  /// From now on Sleep notes its length and returns at once: for measuring what a program does
+  /// between its pauses.
+  void SkipSleeps();
   /// Threads of the device that have not ended, attached host threads included.
   [[nodiscard]] std::size_t LiveThreads() const;
   /// Names of the events, mutexes and semaphores that exist, sorted.
@@ -65,11 +68,13 @@ class Kernel {
   void RemoveSection(const CRITICAL_SECTION* section);
 
   void NoteSleep(std::uint32_t thread, std::uint32_t length_ms);
+  [[nodiscard]] bool skips_sleeps() const { return skips_sleeps_; }
   [[nodiscard]] std::uint32_t TickCount() const;
 
  private:
   Device& device_;
   std::deque<SleepRecord> sleeps_;
+  bool skips_sleeps_ = false;
   std::uint32_t tick_base_ = 0;
   // Each kind has names of its own. A name lives as long as its object.
   mutable std::map<std::pair<Kind, std::u16string>, std::weak_ptr<KernelObject>> named_;

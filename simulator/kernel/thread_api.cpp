@@ -97,8 +97,9 @@ void Sleep(DWORD duration_ms) {
   call.Argument("ms", duration_ms);
   sim::World& world = call.world();
   sim::World::Lock lock = world.Acquire();
-  call.device().kernel().NoteSleep(call.thread().id, duration_ms);
-  if (duration_ms == 0) {
+  sim::Kernel& kernel = call.device().kernel();
+  kernel.NoteSleep(call.thread().id, duration_ms);
+  if (duration_ms == 0 || kernel.skips_sleeps()) {
     world.Yield(lock);
     return;
   }

@@ -45,6 +45,15 @@ TEST_F(KernelTest, RecordsEverySleepWithItsLength) {
   EXPECT_TRUE(device().kernel().Sleeps().empty());
 }
 
+TEST_F(KernelTest, NotesSleepsThatItIsToldToSkip) {
+  device().kernel().SkipSleeps();
+  Sleep(3000);
+
+  EXPECT_LT(world().now(), milliseconds(3000));
+  ASSERT_EQ(device().kernel().Sleeps().size(), 1U);
+  EXPECT_EQ(device().kernel().Sleeps()[0].length_ms, 3000U);
+}
+
 TEST_F(KernelTest, KnowsTheNamedObjectsThatExist) {
   HANDLE event = CreateEventW(nullptr, TRUE, FALSE, u"TW_UPGRADE_IN_PROGRESS");
   HANDLE mutex = CreateMutexW(nullptr, FALSE, u"A mutex");
