@@ -198,6 +198,7 @@ std::vector<LintCase> CasesOfFilesAndCleanup() {
       {"save-direct", With(Cleanup("Delete", "\\Temp\\a.txt") + Cleanup("Save", "\\temp\\A.TXT"))},
       {"save-nothing", With(Cleanup("Save", "\\Temp\\a.txt"))},
       {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp"))},
+      {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp/a.txt"))},
       {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp\\sub\\"))},
       {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temper\\a.txt"))},
       {"save-nothing", With(Cleanup("Delete", "\\Temp") + Cleanup("Save", "\\Temp\\x.y\\a.txt"))},

@@ -1,8 +1,10 @@
 // The checks of a job's delete and save lists.
+#include <algorithm>
 #include <set>
 #include <string>
 #include <vector>
 
+#include "base/text.h"
 #include "tools/lint/checks.h"
 
 namespace tools {
@@ -37,12 +39,19 @@ void CheckDelete(const JobCheck& check, const Setting& entry) {
   if (path.front() != '\\') check.Add(Rule::kDeleteRelative, entry.line, found);
 }
 
+/// As the device compares paths to save: without regard to case, but "/" is no "\\" there.
+std::string Folded(std::string_view path) {
+  std::string folded(path);
+  std::transform(folded.begin(), folded.end(), folded.begin(), base::LowerAscii);
+  return folded;
+}
+
 /// How a job's deletes come to a file, to find what its save list protects.
 class Deletes {
  public:
   explicit Deletes(const std::vector<Setting>& entries) {
     for (const Setting& entry : entries) {
-      std::string key = PathKey(entry.text);
+      std::string key = Folded(entry.text);
       if (IsFilePath(key)) {
         files_.insert(std::move(key));
       } else if (IsRoot(key)) {
@@ -95,7 +104,7 @@ class Deletes {
 };
 
 void CheckSave(const JobCheck& check, const Setting& entry, const Deletes& deletes) {
-  const std::string saved = PathKey(entry.text);
+  const std::string saved = Folded(entry.text);
   const std::string found = "saves " + Quoted(entry.text);
   const bool directly = deletes.NamesFile(saved), missed = deletes.Misses(saved);
   if (directly) check.Add(Rule::kSaveDirect, entry.line, found);
