@@ -7,6 +7,8 @@ set(here ${CMAKE_CURRENT_LIST_DIR})
 # gtest's own macros; comes behind the warnings that it takes back
 add_library(orvenix_test_options INTERFACE)
 target_compile_options(orvenix_test_options INTERFACE -Wno-sign-conversion -Wno-conversion)
+# The product has no run-time type information for the sanitizer to look at.
+target_compile_options(orvenix_test_options INTERFACE -fno-sanitize=vptr)
 
 # The fixture that makes a test a program of a simulated device.
 orvenix_sources(support_sources ${here}/support)
@@ -21,7 +23,5 @@ add_library(product_test_support STATIC ${product_support_sources})
 target_link_libraries(product_test_support PRIVATE orvenix_warnings orvenix_test_options
                                            PUBLIC test_support orvenix_server ZLIB::ZLIB)
 target_link_libraries(product_test_support PUBLIC orvenix_platform)
-# The product has no run-time type information for the sanitizer to look at.
-target_compile_options(product_test_support PUBLIC -fno-sanitize=vptr)
 target_include_directories(product_test_support PUBLIC ${PROJECT_SOURCE_DIR}/src
                                                        ${PROJECT_SOURCE_DIR}/include)

@@ -1,0 +1,2 @@
+// The program of this file is nothing; its target holds the precompiled headers of the tests.
+int main() {}
