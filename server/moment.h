@@ -9,4 +9,8 @@ namespace server {
 /// engine reads no clock; whoever drives it says what time it is.
 using Time = std::chrono::milliseconds;
 
+/// The same where milliseconds are too coarse: a round trip in a quiet network takes a fraction of
+/// one.
+using Micros = std::chrono::microseconds;
+
 }  // namespace server
