@@ -1,0 +1,34 @@
+// What a multicast client and whoever starts it have to say to each other.
+#pragma once
+
+#include <coredll.h>
+
+#include "device/file.h"
+
+namespace mcftp {
+
+/// The owner of a client. Everything in it is optional; it has to outlive the client's thread.
+struct ClientOwner {
+  void* context = nullptr;  ///< handed to `stopped` and `log`
+
+  /// Called once, by the client's thread, when the client has shut down. A few instructions of that
+  /// thread are still to come: McftpClient::AwaitEnd waits for them.
+  void (*stopped)(void* context) = nullptr;
+
+  /// Receives every log line while no syslog server is set: at most 2,048 characters, no line end.
+  /// Called by the starting thread and the client's own, never by both at once, with the client's
+  /// critical section held: it must not wait for another thread of the client.
+  void (*log)(void* context, const WCHAR* line) = nullptr;
+
+  /// Where progress is posted as `message` (wParam: address of the file's name, lParam: percent)
+  /// while no user interface is to be told by datagram. Null or 0: nowhere.
+  HWND window = nullptr;
+  UINT message = 0;
+
+  /// Makes the object for a file of the RAM store, with `new`; null from it says that there is no
+  /// store or no memory. `name` is the announced one, with "RAM:" in front. Without this function
+  /// the device has no RAM store, and such files are refused.
+  device::File* (*make_ram_file)(const char* name) = nullptr;
+};
+
+}  // namespace mcftp
