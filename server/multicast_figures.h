@@ -3,10 +3,10 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <deque>
 #include <functional>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "server/moment.h"
 #include "server/peer.h"
@@ -75,9 +75,9 @@ struct FileFigures {
   std::uint64_t naks = 0;
   std::uint64_t errors = 0;
 
-  std::uint32_t window = 0;  ///< blocks that may be in flight now
-  Micros round_trip{0};      ///< of the device that sets the pace
-  std::vector<DeviceFigures> devices;
+  std::uint32_t window = 0;           ///< blocks that may be in flight now
+  Micros round_trip{0};               ///< of the device that sets the pace
+  std::deque<DeviceFigures> devices;  ///< in the order in which they asked
 
   [[nodiscard]] double WirePerByte() const {
     return size == 0 ? 0 : static_cast<double>(wire_bytes) / size;
@@ -87,8 +87,8 @@ struct FileFigures {
 
 struct MulticastFigures {
   std::uint32_t round = 1;
-  std::size_t current = 0;         ///< index in `files` of the one under way
-  std::vector<FileFigures> files;  ///< of all rounds, in the order of their sessions
+  std::size_t current = 0;        ///< index in `files` of the one under way
+  std::deque<FileFigures> files;  ///< of all rounds, in the order of their sessions
   std::uint64_t frames_sent = 0;
   std::uint64_t frames_received = 0;
   std::uint64_t wire_bytes = 0;

@@ -77,8 +77,10 @@ struct MulticastOptions {
   /// Waiting devices hear something at least so often: they give up after 32 s.
   Micros keepalive = std::chrono::seconds(10);
   Micros linger = std::chrono::milliseconds(500);  ///< between two files
-  /// Repairs for one device alone, in shares of the file, after which it is left to HTTP.
+  /// A device that needs more repairs for itself alone than this share of the file is left to HTTP,
   double release_share = 1.25;
+  /// ... or so long, when it is the last one that is repaired.
+  Micros release_after = std::chrono::seconds(60);
 
   // ---- bounds ----
 

@@ -29,7 +29,7 @@ struct Outgoing {
 /// the sender of the last frame. Its loop:
 ///
 ///   Start with the socket's own address and port; then for every event OnDatagram or OnTime, then
-///   while (const Outgoing* next = run.Next(now)) send it; set a timer for deadline();
+///   while (const Outgoing* next = run.Next(now)) send it; set a timer for deadline(now);
 ///   until finished().
 ///
 /// Whatever arrives is survived. Memory is bounded by the device table and a few bytes a block.
@@ -53,12 +53,11 @@ class MulticastRun {
   void OnTime(Micros now);
 
   /// The next datagram, which counts as sent; null when there is none now. Valid until the next
-  /// call of anything here. A driver whose socket is full keeps what it was given and asks for no
-  /// more.
+  /// call of Next: a driver whose socket is full keeps what it was given and asks for no more.
   [[nodiscard]] const Outgoing* Next(Micros now);
   /// When OnTime, and then Next, want to be called; nothing when only a datagram can change
   /// something.
-  [[nodiscard]] std::optional<Micros> deadline() const;
+  [[nodiscard]] std::optional<Micros> deadline(Micros now) const;
   [[nodiscard]] bool finished() const;
 
   // While it runs:

@@ -1,0 +1,188 @@
+#include "server/multicast/closing.h"
+
+#include <algorithm>
+
+namespace server {
+namespace {
+
+using mcftp::Role;
+using State = Device::Closing;
+
+constexpr Micros kLeastWait = std::chrono::milliseconds(10);
+constexpr Micros kFirstWait = std::chrono::milliseconds(200);
+
+}  // namespace
+
+void Closing::Begin(Micros now) {
+  NextGroup(now);
+}
+
+void Closing::NextGroup(Micros now) {
+  group_.clear();
+  stage_ = Stage::kAsking;
+  to_send_ = 0;
+  sendings_ = 0;
+  for (Device& device : desk_.devices()) {
+    if (device.settled()) continue;
+    if (group_.size() >= desk_.options().poll_group) break;
+    device.closing = State::kAsked;
+    device.tries = 0;
+    group_.push_back(&device);
+  }
+  done_ = group_.empty();
+  for (Device* device : group_) Ask(*device, now);
+}
+
+void Closing::Ask(Device& device, Micros now) {
+  desk_.GiveRole(device, Role::kAckMaster, now);
+  device.asked_at = now;
+  if (++device.tries == 1) device.unanswered_since = now;
+}
+
+std::size_t Closing::Count(State state) const {
+  return static_cast<std::size_t>(
+      std::count_if(group_.begin(), group_.end(),
+                    [state](const Device* device) { return device->closing == state; }));
+}
+
+// ---- what comes back ----
+
+void Closing::OnNak(Device& device, Micros now) {
+  const bool asked = std::find(group_.begin(), group_.end(), &device) != group_.end();
+  if (asked && now >= device.asked_at + Wait(device)) Ask(device, now);
+}
+
+void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
+  if (std::find(group_.begin(), group_.end(), &device) == group_.end()) return;
+  if (block == log_.count()) {
+    if (device.closing >= State::kHasGuard && log_.sent_at(block) != BlockLog::kNever) {
+      desk_.SetProven(device, now);
+      Go(now);
+    } else if (device.closing == State::kAsked) {
+      // It answers so after a file that it has left, whether it had all of it or not.
+      Bury(device, "has given the file up", now);
+      Go(now);
+    }
+  } else if (block == 0 && device.tries > 0) {
+    if (device.tries == 1) device.round_trip.Add(now - device.asked_at);
+    if (device.closing == State::kAsked) {
+      // With one block there is no guard to wait for.
+      Answered(device, log_.count() == 1 ? State::kHasGuard : State::kReady, now);
+    } else if (device.closing == State::kUncertain) {
+      Answered(device, State::kLacksLast, now);
+    } else {
+      device.tries = 0;
+    }
+  } else if (block == log_.guard() && block != 0 && device.closing <= State::kReady) {
+    if (sendings_ == 1) device.round_trip.Add(now - sent_at_);
+    Answered(device, State::kHasGuard, now);
+  }
+}
+
+void Closing::Answered(Device& device, State state, Micros now) {
+  device.closing = state;
+  device.tries = 0;
+  Go(now);
+}
+
+void Closing::OnGivenUp(Device& /*device*/, Micros now) {
+  Go(now);
+}
+
+/// Goes as far as what is known of the group allows.
+void Closing::Go(Micros now) {
+  group_.erase(std::remove_if(group_.begin(), group_.end(),
+                              [](const Device* device) { return device->settled(); }),
+               group_.end());
+  if (group_.empty()) {
+    NextGroup(now);
+    return;
+  }
+  if (stage_ == Stage::kAsking && Count(State::kAsked) == 0) {
+    stage_ = Stage::kGuard;
+    if (Count(State::kReady) > 0) to_send_ = log_.guard();
+  }
+  if (stage_ == Stage::kGuard && Count(State::kAsked) + Count(State::kReady) == 0) {
+    stage_ = Stage::kLast;
+    to_send_ = log_.count();
+  }
+  if (stage_ == Stage::kLast && to_send_ == 0 && Count(State::kUncertain) == 0 &&
+      Count(State::kLacksLast) > 0) {
+    to_send_ = log_.count();
+  }
+}
+
+std::uint32_t Closing::TakeBlock(Micros now) {
+  const std::uint32_t block = to_send_;
+  to_send_ = 0;
+  sent_at_ = now;
+  log_.Sent(block, now);
+  if (stage_ == Stage::kGuard) ++sendings_;
+  for (Device* device : group_) {
+    if (stage_ == Stage::kLast) {
+      device->closing = State::kUncertain;
+      device->tries = 0;
+    }
+    if (stage_ == Stage::kGuard && device->closing == State::kReady && device->tries++ == 0) {
+      device->unanswered_since = now;
+    }
+  }
+  return block;
+}
+
+// ---- time ----
+
+Micros Closing::Wait(const Device& device) const {
+  const Micros most = desk_.options().nak_wait;
+  const Micros once =
+      device.round_trip.known() ? std::max(device.round_trip.Bound(), kLeastWait) : kFirstWait;
+  return std::min(once * (1U << std::min(device.tries, 8U)), most);
+}
+
+bool Closing::IsSilent(const Device& device, Micros now) const {
+  return device.tries >= desk_.options().elect_tries &&
+         now - device.unanswered_since >= desk_.options().silence_limit;
+}
+
+void Closing::Bury(Device& device, const char* why, Micros now) {
+  desk_.SetDead(device, why, now);
+}
+
+/// When the device has kept us waiting long enough; nothing while it has nothing to say.
+std::optional<Micros> Closing::DueAt(const Device& device) const {
+  if (to_send_ != 0) return std::nullopt;
+  const bool waiting = device.closing == State::kAsked || device.closing == State::kUncertain ||
+                       (stage_ == Stage::kGuard && device.closing == State::kReady);
+  if (!waiting) return std::nullopt;
+  const bool block_out = stage_ != Stage::kAsking;
+  const Micros since = block_out ? std::max(device.asked_at, sent_at_) : device.asked_at;
+  return since + Wait(device);
+}
+
+void Closing::OnTime(Micros now) {
+  bool guard_due = false;
+  for (Device* device : group_) {
+    const auto due = DueAt(*device);
+    if (!due || now < *due) continue;
+    if (IsSilent(*device, now)) {
+      Bury(*device,
+           device->closing == State::kUncertain ? "does not say whether it has the last block"
+                                                : "does not answer at the end of the file",
+           now);
+    } else if (stage_ == Stage::kGuard && device->closing == State::kReady) {
+      guard_due = true;
+    } else {
+      Ask(*device, now);
+    }
+  }
+  if (guard_due) to_send_ = log_.guard();
+  if (!group_.empty()) Go(now);
+}
+
+std::optional<Micros> Closing::deadline() const {
+  std::optional<Micros> earliest;
+  for (const Device* device : group_) earliest = Earlier(earliest, DueAt(*device));
+  return earliest;
+}
+
+}  // namespace server

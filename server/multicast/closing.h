@@ -1,0 +1,61 @@
+// The blocks that complete a file on a device.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "server/multicast/block_log.h"
+#include "server/multicast/transfer.h"
+
+namespace server {
+
+/// Devices that have everything else get the blocks that were held back, in ACK mode: an
+/// acknowledgement of the last block, from a device that has acknowledged the one before, is proof
+/// that cannot be mistaken. A group at a time:
+///
+/// 1. each takes the role (it acknowledges block 0);
+/// 2. the guard goes out until all have acknowledged it;
+/// 3. the last block goes out. Who does not acknowledge it is asked by its role, because a device
+///    that has completed leaves at the next block without a word: block 0 says that the block was
+///    lost, the last block's number that only its acknowledgement was. Nobody gets the last block
+///    again before everybody's state is known.
+class Closing {
+ public:
+  Closing(TransferDesk& desk, BlockLog& log) : desk_(desk), log_(log) {}
+
+  void Begin(Micros now);
+  void OnAck(Device& device, std::uint32_t block, Micros now);
+  /// A device that names blocks has not taken the role.
+  void OnNak(Device& device, Micros now);
+  void OnGivenUp(Device& device, Micros now);
+  void OnTime(Micros now);
+  [[nodiscard]] bool HasBlock() const { return to_send_ != 0; }
+  std::uint32_t TakeBlock(Micros now);
+  [[nodiscard]] std::optional<Micros> deadline() const;
+  [[nodiscard]] bool done() const { return done_; }
+
+ private:
+  enum class Stage : std::uint8_t { kAsking, kGuard, kLast };
+
+  void NextGroup(Micros now);
+  void Ask(Device& device, Micros now);
+  void Answered(Device& device, Device::Closing state, Micros now);
+  void Go(Micros now);
+  void Bury(Device& device, const char* why, Micros now);
+  [[nodiscard]] std::size_t Count(Device::Closing state) const;
+  [[nodiscard]] std::optional<Micros> DueAt(const Device& device) const;
+  [[nodiscard]] Micros Wait(const Device& device) const;
+  [[nodiscard]] bool IsSilent(const Device& device, Micros now) const;
+
+  TransferDesk& desk_;
+  BlockLog& log_;
+  Stage stage_ = Stage::kAsking;
+  std::vector<Device*> group_;  ///< those that are not settled
+  std::uint32_t to_send_ = 0;
+  Micros sent_at_{0};
+  std::uint32_t sendings_ = 0;  ///< of the guard, in this group
+  bool done_ = false;
+};
+
+}  // namespace server

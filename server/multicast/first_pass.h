@@ -1,0 +1,81 @@
+// The first sending of a file's blocks, at the pace of one device.
+#pragma once
+
+#include <cstdint>
+#include <deque>
+#include <optional>
+#include <set>
+
+#include "server/multicast/block_log.h"
+#include "server/multicast/send_window.h"
+#include "server/multicast/transfer.h"
+
+namespace server {
+
+/// Sends all blocks but those held back. One device, the master, acknowledges each; as many are in
+/// flight towards it as its window allows. What it does not acknowledge is sent again at once only
+/// when it is alone: an acknowledgement that got lost looks like a lost block, and with several
+/// devices the repair that follows knows better which blocks are worth a frame.
+class FirstPass {
+ public:
+  FirstPass(TransferDesk& desk, BlockLog& log);
+
+  void Begin(Micros now);
+  void OnAck(Device& device, const mcftp::AckFrame& ack, Micros now);
+  void OnNak(Device& device, Micros now);
+  void OnOverrun(Device& device, std::uint16_t percent_x100, Micros now);
+  void OnGivenUp(Device& device, Micros now);
+  void OnTime(Micros now);
+  [[nodiscard]] bool HasBlock() const;
+  std::uint32_t TakeBlock(Micros now);
+  [[nodiscard]] std::optional<Micros> deadline() const;
+  [[nodiscard]] bool done() const { return done_; }
+  [[nodiscard]] const SendWindow& window() const { return window_; }
+
+ private:
+  struct InFlight {
+    std::uint32_t block;
+    Micros sent_at;
+    bool again;               ///< not its first sending
+    std::uint32_t overtaken;  /// acknowledgements of blocks sent after it
+  };
+
+  void Elect(Device& candidate, Micros now);
+  void ElectAfter(const Device* last, Micros now);
+  void Ask(Micros now);
+  void Replace(Device& by, Micros now);
+  void BecomeMaster(Micros now);
+  void Acknowledged(std::uint32_t block, bool duplicate, Micros now);
+  void Lost(const InFlight& gone);
+  void CheckEnd();
+  void Finish();
+  void Measure(Micros now);
+  [[nodiscard]] bool MayRepeat() const;
+  [[nodiscard]] Micros Patience() const;
+
+  TransferDesk& desk_;
+  BlockLog& log_;
+  SendWindow window_;
+  const std::uint32_t end_;  ///< the first block that is held back
+
+  Device* master_ = nullptr;  ///< also the candidate, while electing_
+  bool electing_ = true;
+  Micros election_began_{0};
+  Micros asked_at_{0};
+  std::uint32_t tries_ = 0;
+  bool from_start_ = true;  ///< the master has been master since block 1
+
+  std::uint32_t next_ = 1;
+  std::deque<InFlight> flight_;
+  std::set<std::uint32_t> lacking_;  ///< not acknowledged by the master
+  std::uint32_t wasted_ = 0;         ///< blocks sent again that the master had
+
+  // Whether a slow master is worth waiting for:
+  Micros second_began_{0};
+  std::uint32_t acked_in_second_ = 0;
+  std::uint32_t best_second_ = 0;
+  std::uint32_t slow_seconds_ = 0;
+  bool done_ = false;
+};
+
+}  // namespace server

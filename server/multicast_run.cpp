@@ -1,0 +1,330 @@
+#include "server/multicast_run.h"
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+#include <random>
+#include <set>
+#include <stdexcept>
+#include <string>
+#include <utility>
+
+#include "mcftp/cipher/frame_cipher.h"
+#include "mcftp/wire/frames.h"
+#include "server/multicast/outbox.h"
+#include "server/multicast/pace.h"
+#include "server/multicast/session.h"
+
+namespace server {
+namespace {
+
+/// No frame for a server is longer.
+constexpr std::size_t kLongestReceived = 2048;
+
+void Require(bool holds, const std::string& what) {
+  if (!holds) throw std::invalid_argument(what);
+}
+
+void CheckOptions(const MulticastOptions& options) {
+  Require(IsGroup(options.public_group.address) && options.public_group.port != 0,
+          "the public group " + ToText(options.public_group) + " is not a multicast group");
+  Require(IsGroup(options.private_group),
+          "the private group " + AddressText(options.private_group) + " is not a multicast group");
+  Require(options.private_group != options.public_group.address,
+          "public and private group are the same");
+  Require(options.oack_wait >= std::chrono::milliseconds(1),
+          "clients have to be told to wait for an answer");
+  Require(options.announce_interval.count() > 0 && options.announce_max > 0,
+          "a file has to be announced");
+  Require(options.block_size > 0, "a block has to have a size");
+  Require(options.poll_group > 0 && options.rounds > 0, "nobody would be served");
+}
+
+std::uint64_t LargestFrame(const MulticastOptions& options,
+                           const std::vector<MulticastFile>& files) {
+  std::uint64_t largest = 0;
+  for (const MulticastFile& file : files) {
+    const Blocking blocks = ChooseBlocks(file.content->size(), options.block_size);
+    const std::size_t length = mcftp::kDataOffset + blocks.block_size;
+    largest =
+        std::max(largest, WireBytes(options.encrypt ? mcftp::EncipheredLength(length) : length));
+  }
+  return largest;
+}
+
+}  // namespace
+
+class MulticastRun::Body {
+ public:
+  Body(MulticastOptions options, std::vector<MulticastFile> files)
+      : options_(std::move(options)),
+        files_(std::move(files)),
+        outbox_(options_.encrypt),
+        pace_(options_.rate, LargestFrame(options_, files_)),
+        random_(options_.seed != 0 ? options_.seed : std::random_device{}()) {
+    figures_.rate = options_.rate;
+  }
+
+  void Start(const Peer& own, Micros now);
+  void OnDatagram(const Peer& from, std::string_view bytes, Micros now);
+  void OnTime(Micros now);
+  const Outgoing* Next(Micros now);
+  std::optional<Micros> deadline(Micros now);
+  void StartNow(Micros now);
+  void SetRate(std::uint64_t bits_per_second, Micros now);
+  void Stop(Micros now);
+
+  [[nodiscard]] bool finished() const { return ended_ && outbox_.empty(); }
+  [[nodiscard]] const MulticastFigures& figures() const { return figures_; }
+  [[nodiscard]] const MulticastOptions& options() const { return options_; }
+  void SetListener(MulticastListener listener) { listener_ = std::move(listener); }
+
+ private:
+  void NextFile(Micros now);
+  void BeginSession(Micros now);
+  void EndSession();
+  void EndRun(Micros now);
+  void Advance(Micros now);
+  void Account(const Outgoing& outgoing, Micros now);
+  [[nodiscard]] StartPolicy PolicyForFile() const;
+  [[nodiscard]] std::uint32_t NewTransferId();
+
+  const MulticastOptions options_;
+  const std::vector<MulticastFile> files_;
+  MulticastFigures figures_;
+  MulticastListener listener_;
+  Outbox outbox_;
+  Pace pace_;
+  std::mt19937_64 random_;
+
+  Peer own_;
+  std::size_t index_ = 0;  ///< in files_, of the session under way
+  std::unique_ptr<MulticastSession> session_;
+  std::set<Peer> known_;  ///< devices of this round that are not dead
+  std::set<std::uint32_t> transfer_ids_;
+  bool ended_ = false;
+  std::array<std::uint8_t, kLongestReceived + mcftp::Blowfish::kBlock> received_{};
+};
+
+void MulticastRun::Body::Start(const Peer& own, Micros now) {
+  own_ = own;
+  if (files_.empty()) {
+    EndRun(now);
+  } else {
+    BeginSession(now);
+  }
+}
+
+std::uint32_t MulticastRun::Body::NewTransferId() {
+  for (;;) {
+    const auto id = static_cast<std::uint32_t>(random_());
+    if (id != 0 && transfer_ids_.insert(id).second) return id;
+  }
+}
+
+StartPolicy MulticastRun::Body::PolicyForFile() const {
+  if (index_ == 0) return options_.start;
+  StartPolicy policy;  // the devices are there already
+  policy.expected = static_cast<std::uint32_t>(known_.size());
+  return policy;
+}
+
+void MulticastRun::Body::BeginSession(Micros now) {
+  const MulticastFile& file = files_[index_];
+  SessionPlan plan;
+  plan.file = &file;
+  plan.blocks = ChooseBlocks(file.content->size(), options_.block_size);
+  plan.transfer_id = NewTransferId();
+  plan.last_file = index_ + 1 == files_.size();
+  plan.own = own_;
+  plan.start = PolicyForFile();
+  plan.begins_when_quiet = index_ > 0;
+
+  FileFigures& figures = figures_.files.emplace_back();
+  figures_.current = figures_.files.size() - 1;
+  figures.device_path = file.device_path;
+  figures.masks = file.masks;
+  figures.size = file.content->size();
+  figures.block_size = plan.blocks.block_size;
+  figures.block_count = plan.blocks.block_count;
+  figures.transfer_id = plan.transfer_id;
+  figures.last_file = plan.last_file;
+  session_ =
+      std::make_unique<MulticastSession>(options_, plan, figures_, figures, outbox_, listener_);
+  session_->Begin(now);
+}
+
+void MulticastRun::Body::EndSession() {
+  for (const DeviceFigures& device : figures_.files.back().devices) {
+    if (device.state == DeviceState::kDead) {
+      known_.erase(device.peer);
+    } else {
+      known_.insert(device.peer);
+    }
+  }
+  session_.reset();
+}
+
+void MulticastRun::Body::NextFile(Micros now) {
+  const bool for_all = files_[index_].masks.empty();
+  const bool nobody = figures_.files.back().devices.empty();
+  EndSession();
+  const bool round_over = ++index_ == files_.size() || (figures_.round > 1 && for_all && nobody);
+  if (!round_over) {
+    BeginSession(now);
+    return;
+  }
+  if (figures_.round == options_.rounds || (figures_.round > 1 && known_.empty())) {
+    EndRun(now);
+    return;
+  }
+  ++figures_.round;
+  index_ = 0;
+  known_.clear();
+  BeginSession(now);
+}
+
+void MulticastRun::Body::EndRun(Micros now) {
+  ended_ = true;
+  if (!listener_) return;
+  MulticastEvent event;
+  event.kind = MulticastEventKind::kRunEnded;
+  event.when = now;
+  listener_(event);
+}
+
+void MulticastRun::Body::Advance(Micros now) {
+  while (session_ != nullptr && session_->finished()) NextFile(now);
+}
+
+void MulticastRun::Body::OnTime(Micros now) {
+  if (session_ == nullptr) return;
+  session_->OnTime(now);
+  Advance(now);
+}
+
+void MulticastRun::Body::OnDatagram(const Peer& from, std::string_view bytes, Micros now) {
+  ++figures_.frames_received;
+  mcftp::Header header;
+  bool good = bytes.size() <= kLongestReceived && from.address != own_.address;
+  if (good) {
+    std::copy(bytes.begin(), bytes.end(), received_.begin());
+    good = mcftp::DecodeHeader(received_.data(), bytes.size(), header) &&
+           outbox_.Open(received_.data(), bytes.size());
+  }
+  if (good && session_ != nullptr) {
+    good = session_->OnFrame(from, header, received_.data(), bytes.size(), now);
+  }
+  if (!good) ++figures_.garbage;
+  Advance(now);
+}
+
+void MulticastRun::Body::Account(const Outgoing& outgoing, Micros now) {
+  const std::uint64_t wire = WireBytes(outgoing.bytes.size());
+  pace_.Take(wire, now);
+  ++figures_.frames_sent;
+  figures_.wire_bytes += wire;
+  if (figures_.files.empty()) return;
+  FileFigures& file = figures_.files.back();
+  ++file.frames;
+  file.wire_bytes += wire;
+  if (outbox_.kind() == Outbox::Kind::kControl) ++file.control_frames;
+}
+
+const Outgoing* MulticastRun::Body::Next(Micros now) {
+  const Outgoing* next = outbox_.Next();
+  if (next == nullptr && session_ != nullptr && pace_.Ready(now) && session_->HasBlock(now)) {
+    next = session_->NextBlock(now);
+    if (next == nullptr) next = outbox_.Next();
+  }
+  if (next != nullptr) Account(*next, now);
+  return next;
+}
+
+std::optional<Micros> MulticastRun::Body::deadline(Micros now) {
+  if (session_ == nullptr) return std::nullopt;
+  std::optional<Micros> earliest = session_->deadline(now);
+  if (session_->HasBlock(now)) earliest = Earlier(earliest, pace_.ReadyAt(now));
+  return earliest;
+}
+
+void MulticastRun::Body::StartNow(Micros now) {
+  if (session_ != nullptr) session_->StartNow(now);
+}
+
+void MulticastRun::Body::SetRate(std::uint64_t bits_per_second, Micros now) {
+  pace_.SetRate(bits_per_second, now);
+  figures_.rate = bits_per_second;
+}
+
+void MulticastRun::Body::Stop(Micros now) {
+  if (ended_) return;
+  if (session_ != nullptr) {
+    session_->Stop(now);
+    EndSession();
+  }
+  EndRun(now);
+}
+
+// ---- the face ----
+
+MulticastRun::MulticastRun(MulticastOptions options, std::vector<MulticastFile> files) {
+  CheckOptions(options);
+  for (const MulticastFile& file : files) {
+    const std::string objection = Objection(file);
+    Require(objection.empty(), "\"" + file.device_path + "\" " + objection);
+  }
+  body_ = std::make_unique<Body>(std::move(options), std::move(files));
+}
+
+MulticastRun::~MulticastRun() = default;
+
+void MulticastRun::SetListener(MulticastListener listener) {
+  body_->SetListener(std::move(listener));
+}
+
+void MulticastRun::Start(const Peer& own, Micros now) {
+  body_->Start(own, now);
+}
+
+void MulticastRun::OnDatagram(const Peer& from, std::string_view bytes, Micros now) {
+  body_->OnDatagram(from, bytes, now);
+}
+
+void MulticastRun::OnTime(Micros now) {
+  body_->OnTime(now);
+}
+
+const Outgoing* MulticastRun::Next(Micros now) {
+  return body_->Next(now);
+}
+
+std::optional<Micros> MulticastRun::deadline(Micros now) const {
+  return body_->deadline(now);
+}
+
+bool MulticastRun::finished() const {
+  return body_->finished();
+}
+
+void MulticastRun::StartNow(Micros now) {
+  body_->StartNow(now);
+}
+
+void MulticastRun::SetRate(std::uint64_t bits_per_second, Micros now) {
+  body_->SetRate(bits_per_second, now);
+}
+
+void MulticastRun::Stop(Micros now) {
+  body_->Stop(now);
+}
+
+const MulticastFigures& MulticastRun::figures() const {
+  return body_->figures();
+}
+
+const MulticastOptions& MulticastRun::options() const {
+  return body_->options();
+}
+
+}  // namespace server
