@@ -1,0 +1,146 @@
+#include "mcftp/cipher/blowfish.h"
+
+#include <cstring>
+#include <utility>
+
+#include "mcftp/cipher/pi.h"
+
+namespace mcftp {
+namespace {
+
+using Schedule = Blowfish::Schedule;
+
+constexpr std::size_t kRounds = Blowfish::kRounds;
+constexpr std::size_t kBlock = Blowfish::kBlock;
+
+// A round of one block is a chain of table reads that each wait for the one before. Blocks do not
+// depend on each other, so several go through the rounds together and wait at the same time: as
+// many as saturate a large core, and on a handheld's as many as its registers hold.
+constexpr std::size_t kSideBySide = sizeof(void*) >= 8 ? 8 : 2;
+
+constexpr std::make_index_sequence<1> kOneBlock;
+
+enum class Direction : bool { kEncipher, kDecipher };
+
+std::uint32_t Load(const std::uint8_t* bytes) noexcept {
+  return static_cast<std::uint32_t>(bytes[0]) | static_cast<std::uint32_t>(bytes[1]) << 8 |
+         static_cast<std::uint32_t>(bytes[2]) << 16 | static_cast<std::uint32_t>(bytes[3]) << 24;
+}
+
+void Store(std::uint8_t* bytes, std::uint32_t word) noexcept {
+  bytes[0] = static_cast<std::uint8_t>(word);
+  bytes[1] = static_cast<std::uint8_t>(word >> 8);
+  bytes[2] = static_cast<std::uint8_t>(word >> 16);
+  bytes[3] = static_cast<std::uint8_t>(word >> 24);
+}
+
+std::uint32_t Mix(const Schedule& schedule, std::uint32_t half) noexcept {
+  const auto& boxes = schedule.boxes;
+  const std::uint32_t sum = boxes[0][half >> 24] + boxes[1][half >> 16 & 0xFF];
+  return (sum ^ boxes[2][half >> 8 & 0xFF]) + boxes[3][half & 0xFF];
+}
+
+/// Deciphering is the same with the subkeys from behind.
+template <Direction kDirection>
+std::uint32_t Subkey(const Schedule& schedule, std::size_t at) noexcept {
+  return schedule.subkeys[kDirection == Direction::kEncipher ? at : kRounds + 1 - at];
+}
+
+/// Takes the blocks kLane... of `from` through the rounds side by side. All are read before the
+/// first is written.
+template <Direction kDirection, std::size_t... kLane>
+void Transform(const Schedule& schedule, const std::uint8_t* from, std::uint8_t* to,
+               std::index_sequence<kLane...> /*lanes*/) noexcept {
+  std::uint32_t left[] = {Load(from + kLane * kBlock)...};
+  std::uint32_t right[] = {Load(from + kLane * kBlock + 4)...};
+  for (std::size_t round = 0; round < kRounds; round += 2) {
+    const std::uint32_t even = Subkey<kDirection>(schedule, round);
+    const std::uint32_t odd = Subkey<kDirection>(schedule, round + 1);
+    ((left[kLane] ^= even, right[kLane] ^= Mix(schedule, left[kLane])), ...);
+    ((right[kLane] ^= odd, left[kLane] ^= Mix(schedule, right[kLane])), ...);
+  }
+  const std::uint32_t last = Subkey<kDirection>(schedule, kRounds);
+  const std::uint32_t behind_last = Subkey<kDirection>(schedule, kRounds + 1);
+  (Store(to + kLane * kBlock, right[kLane] ^ behind_last), ...);
+  (Store(to + kLane * kBlock + 4, left[kLane] ^ last), ...);
+}
+
+/// Takes `blocks` blocks, kLanes at a time, and the rest with half as many lanes.
+template <Direction kDirection, std::size_t kLanes>
+void TransformAll(const Schedule& schedule, const std::uint8_t* from, std::uint8_t* to,
+                  std::size_t blocks) noexcept {
+  for (; blocks >= kLanes; blocks -= kLanes) {
+    Transform<kDirection>(schedule, from, to, std::make_index_sequence<kLanes>());
+    from += kLanes * kBlock;
+    to += kLanes * kBlock;
+  }
+  if constexpr (kLanes > 1) TransformAll<kDirection, kLanes / 2>(schedule, from, to, blocks);
+}
+
+template <Direction kDirection>
+void TransformHalves(const Schedule& schedule, std::uint32_t& left, std::uint32_t& right) noexcept {
+  std::uint8_t block[kBlock];
+  Store(block, left);
+  Store(block + 4, right);
+  Transform<kDirection>(schedule, block, block, kOneBlock);
+  left = Load(block);
+  right = Load(block + 4);
+}
+
+/// Replaces the words two by two with what enciphering the halves again and again gives.
+void Fill(const Blowfish& cipher, std::uint32_t* words, std::size_t count, std::uint32_t& left,
+          std::uint32_t& right) noexcept {
+  for (std::size_t i = 0; i < count; i += 2) {
+    cipher.EncipherBlock(left, right);
+    words[i] = left;
+    words[i + 1] = right;
+  }
+}
+
+}  // namespace
+
+Blowfish::Blowfish(const std::uint8_t* key, std::size_t length) noexcept {
+  std::memcpy(&schedule_, &kPiSchedule, sizeof schedule_);
+  std::size_t at = 0;
+  for (std::uint32_t& subkey : schedule_.subkeys) {
+    std::uint32_t word = 0;
+    for (int i = 0; i < 4; ++i) {
+      word = word << 8 | (length == 0 ? 0U : key[at]);
+      at = at + 1 < length ? at + 1 : 0;
+    }
+    subkey ^= word;
+  }
+  std::uint32_t left = 0;
+  std::uint32_t right = 0;
+  Fill(*this, schedule_.subkeys, kRounds + 2, left, right);
+  for (auto& box : schedule_.boxes) Fill(*this, box, 256, left, right);
+}
+
+std::size_t Blowfish::Encipher(const void* from, void* to, std::size_t length) const noexcept {
+  const auto* clear = static_cast<const std::uint8_t*>(from);
+  auto* enciphered = static_cast<std::uint8_t*>(to);
+  const std::size_t whole = length / kBlock * kBlock;
+  TransformAll<Direction::kEncipher, kSideBySide>(schedule_, clear, enciphered, whole / kBlock);
+  if (whole < length) {
+    std::uint8_t last[kBlock] = {};
+    std::memcpy(last, clear + whole, length - whole);
+    Transform<Direction::kEncipher>(schedule_, last, enciphered + whole, kOneBlock);
+  }
+  return PaddedLength(length);
+}
+
+void Blowfish::Decipher(const void* from, void* to, std::size_t length) const noexcept {
+  TransformAll<Direction::kDecipher, kSideBySide>(schedule_, static_cast<const std::uint8_t*>(from),
+                                                  static_cast<std::uint8_t*>(to),
+                                                  PaddedLength(length) / kBlock);
+}
+
+void Blowfish::EncipherBlock(std::uint32_t& left, std::uint32_t& right) const noexcept {
+  TransformHalves<Direction::kEncipher>(schedule_, left, right);
+}
+
+void Blowfish::DecipherBlock(std::uint32_t& left, std::uint32_t& right) const noexcept {
+  TransformHalves<Direction::kDecipher>(schedule_, left, right);
+}
+
+}  // namespace mcftp
