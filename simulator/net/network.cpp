@@ -34,7 +34,11 @@ bool SameName(std::string_view a, std::string_view b) {
 
 }  // namespace
 
-Network::Network(Device& device) : device_(device), own_(OwnAddress(device)) {
+Network::Network(Device& device)
+    : device_(device),
+      own_(OwnAddress(device)),
+      host_sockets_(own_, device.profile().datagram_loss_percent,
+                    device.profile().datagram_loss_seed) {
   if (!device.world().is_virtual()) return;
   const World::Lock lock = device.world().Acquire();
   device.world().Shared<Fabric>().AddHost(own_);
@@ -54,6 +58,16 @@ std::size_t Network::open_sockets() const {
   return sockets_.size();
 }
 
+void Network::ListenToDatagrams(DatagramListener listener) {
+  const World::Lock lock = device_.world().Acquire();
+  listener_ = std::move(listener);
+}
+
+std::uint64_t Network::datagrams_lost() const {
+  const World::Lock lock = device_.world().Acquire();
+  return host_sockets_.loss.lost();
+}
+
 void Network::CleanUp() {
   if (--started_ > 0) return;
   while (!sockets_.empty()) Close(sockets_.begin()->first);
@@ -66,10 +80,10 @@ int Network::Open(SocketKind kind, SOCKET& number) {
   if (device_.world().is_virtual()) {
     transport = device_.world().Shared<Fabric>().NewTransport(kind, own_);
   } else {
-    const int error = MakePosixTransport(kind, own_, transport);
+    const int error = MakePosixTransport(kind, host_sockets_, transport);
     if (error != 0) return error;
   }
-  number = Add(std::make_unique<Socket>(kind, std::move(transport), own_));
+  number = Add(std::make_unique<Socket>(kind, std::move(transport), own_, listener_));
   return 0;
 }
 

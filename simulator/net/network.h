@@ -12,6 +12,7 @@
 
 #include "ce/winsock.h"
 #include "net/endpoint.h"
+#include "net/posix/device_sockets.h"
 #include "net/socket.h"
 #include "world/world.h"
 
@@ -44,6 +45,11 @@ class Network {
   void FillSendBuffer(std::uint64_t calls);
   /// Sockets that the device has not closed.
   [[nodiscard]] std::size_t open_sockets() const;
+  /// Shows every datagram that the device's programs send and receive from now on; an empty
+  /// function ends it.
+  void ListenToDatagrams(DatagramListener listener);
+  /// Datagrams that were sent to the device and that its profile let be lost.
+  [[nodiscard]] std::uint64_t datagrams_lost() const;
   /// The device's own address, from its profile.
   [[nodiscard]] Address address() const { return own_; }
 
@@ -101,6 +107,8 @@ class Network {
   Device& device_;
   const Address own_;
   unsigned started_ = 0;
+  DeviceSockets host_sockets_;
+  DatagramListener listener_;
   SOCKET next_number_ = 0x100;
   std::map<SOCKET, std::unique_ptr<Socket>> sockets_;
   std::map<std::uint32_t, ThreadTexts> texts_;

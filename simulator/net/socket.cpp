@@ -29,8 +29,9 @@ struct Socket::NumberOption {
   std::optional<SocketKind> only;
 };
 
-Socket::Socket(SocketKind kind, std::unique_ptr<Transport> transport, Address own)
-    : kind_(kind), own_(own), transport_(std::move(transport)) {}
+Socket::Socket(SocketKind kind, std::unique_ptr<Transport> transport, Address own,
+               const DatagramListener& listener)
+    : kind_(kind), own_(own), transport_(std::move(transport)), listener_(listener) {}
 
 bool Socket::IsOwn(Address address) const {
   return address == kAnyAddress || address == own_ || address == kLocalHost;
@@ -109,7 +110,7 @@ int Socket::Accept(std::unique_ptr<Socket>& accepted, Endpoint& peer) {
   std::unique_ptr<Transport> transport;
   const int error = transport_->Accept(transport);
   if (error != 0) return error;
-  accepted = std::make_unique<Socket>(kind_, std::move(transport), own_);
+  accepted = std::make_unique<Socket>(kind_, std::move(transport), own_, listener_);
   accepted->bound_ = true;
   accepted->connected_ = true;
   accepted->nonblocking_ = nonblocking_;
@@ -146,17 +147,27 @@ int Socket::SendTo(const Endpoint& to, const char* bytes, std::size_t size, std:
   if (error == 0 && size > kLargestDatagram) error = WSAEMSGSIZE;
   if (error == 0) error = BindAny();
   if (error == 0) error = transport_->SendTo(to, bytes, size);
-  if (error == 0) sent = size;
+  if (error != 0) return error;
+  sent = size;
+  if (listener_) listener_({true, transport_->local(), to, {bytes, size}});
+  return 0;
+}
+
+int Socket::ReceiveDatagram(char* bytes, std::size_t size, bool peek, Received& result) {
+  if (!bound_) return WSAEINVAL;
+  if (receive_shut_) return WSAESHUTDOWN;
+  const int error = transport_->Receive(bytes, size, peek, result);
+  if (error == 0 && !peek && listener_) {
+    Endpoint to = transport_->local();
+    if (result.group != kAnyAddress) to.address = result.group;
+    listener_({false, result.from, to, {bytes, result.size}});
+  }
   return error;
 }
 
 int Socket::Receive(char* bytes, std::size_t size, bool peek, Received& result) {
   FollowConnect();
-  if (kind_ == SocketKind::kDatagram) {
-    if (!bound_) return WSAEINVAL;
-    if (receive_shut_) return WSAESHUTDOWN;
-    return transport_->Receive(bytes, size, peek, result);
-  }
+  if (kind_ == SocketKind::kDatagram) return ReceiveDatagram(bytes, size, peek, result);
   if (!connected_) return WSAENOTCONN;
   if (receive_shut_) return WSAESHUTDOWN;
   if (broken_ != 0) return broken_;

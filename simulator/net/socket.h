@@ -2,21 +2,36 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <set>
+#include <string_view>
 
 #include "net/endpoint.h"
 #include "net/transport.h"
 
 namespace sim {
 
+/// One datagram as a program of the device sends or receives it.
+struct SeenDatagram {
+  bool sent = false;
+  Endpoint from;
+  Endpoint to;  ///< of a received one: the group, where the transport knows it, else the device
+  std::string_view bytes;
+};
+
+/// Called with the world's lock held: it must be quick and call nothing of the device.
+using DatagramListener = std::function<void(const SeenDatagram&)>;
+
 /// The states, checks and error numbers of Winsock, the same in both worlds. Results are 0 or a
 /// Winsock error; WSAEWOULDBLOCK also on a blocking socket, whose caller then waits on queue() and
 /// tries again. World's lock held.
 class Socket {
  public:
-  /// @param own  the device's address; "any" means this one
-  Socket(SocketKind kind, std::unique_ptr<Transport> transport, Address own);
+  /// @param own       the device's address; "any" means this one
+  /// @param listener  may be empty; outlives the socket
+  Socket(SocketKind kind, std::unique_ptr<Transport> transport, Address own,
+         const DatagramListener& listener);
 
   [[nodiscard]] SocketKind kind() const { return kind_; }
   [[nodiscard]] bool nonblocking() const { return nonblocking_; }
@@ -49,6 +64,7 @@ class Socket {
  private:
   struct NumberOption;
 
+  int ReceiveDatagram(char* bytes, std::size_t size, bool peek, Received& result);
   void FollowConnect();
   int BindAny();
   int Broken(int error);
@@ -63,6 +79,7 @@ class Socket {
   const SocketKind kind_;
   const Address own_;
   std::unique_ptr<Transport> transport_;
+  const DatagramListener& listener_;
   bool nonblocking_ = false;
   bool bound_ = false;
   bool bound_to_any_ = false;

@@ -23,6 +23,7 @@ struct Received {
   std::size_t size = 0;  ///< bytes written to the caller's buffer
   bool cut = false;      ///< the datagram was longer than the buffer
   Endpoint from;
+  Address group = kAnyAddress;  ///< that it was sent to, where the transport knows it
 };
 
 /// Numbers a socket tells its transport.

@@ -41,6 +41,8 @@ struct Profile {
   // Network.
   std::string host_name = "handheld";
   std::string address = "127.0.0.1";
+  double datagram_loss_percent = 0;  ///< of datagrams from others; real world only
+  std::uint64_t datagram_loss_seed = 1;
 
   // Screen.
   int screen_width = 240;

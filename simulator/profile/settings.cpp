@@ -1,5 +1,6 @@
 #include "profile/settings.h"
 
+#include <array>
 #include <charconv>
 #include <cstdint>
 #include <limits>
@@ -47,6 +48,27 @@ Setting<Record> Number(std::string_view section, std::string_view key, Member Re
     return {};
   };
   const auto write = [member](const Record& record) { return std::to_string(record.*member); };
+  return {section, key, comment, read, write};
+}
+
+template <typename Record>
+Setting<Record> Percent(std::string_view section, std::string_view key, double Record::*member,
+                        std::string_view comment) {
+  const auto read = [member](Record& record, std::string_view text) -> Complaint {
+    double value = 0;
+    const char* const end = text.data() + text.size();
+    const auto [stop, error] = std::from_chars(text.data(), end, value, std::chars_format::fixed);
+    if (error != std::errc() || stop != end || !(value >= 0 && value <= 100)) {
+      return "is no number from 0 to 100; give one";
+    }
+    record.*member = value;
+    return {};
+  };
+  const auto write = [member](const Record& record) {
+    std::array<char, 32> text{};
+    const auto written = std::to_chars(text.data(), text.data() + text.size(), record.*member);
+    return std::string(text.data(), written.ptr);
+  };
   return {section, key, comment, read, write};
 }
 
@@ -131,6 +153,10 @@ std::vector<Setting<Profile>> MakeProfileSettings() {
 
       Text("network", "host_name", &P::host_name, "Name of the device in its network."),
       Text("network", "address", &P::address, "Its IPv4 address.", CheckAddress),
+      Percent("network", "datagram_loss_percent", &P::datagram_loss_percent,
+              "Percent of others' datagrams that it does not hear; not in a virtual world."),
+      Number("network", "datagram_loss_seed", &P::datagram_loss_seed, 0, kMost<std::uint64_t>,
+             "Which of them: the same number loses the same ones of a row."),
 
       Number("screen", "width", &P::screen_width, 1, 4096, "Pixels."),
       Number("screen", "height", &P::screen_height, 1, 4096, ""),

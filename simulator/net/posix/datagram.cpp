@@ -2,7 +2,11 @@
 
 #include <netinet/in.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <cstring>
+#include <ctime>
+#include <utility>
 
 #include "ce/winsock.h"
 #include "net/posix/address.h"
@@ -25,18 +29,52 @@ bool PeekFirst(const SocketFile& file, Received& first) {
   return true;
 }
 
+void DropFirst(const SocketFile& file) {
+  char byte = 0;
+  static_cast<void>(recv(file.get(), &byte, 1, 0));
+}
+
+/// When the first datagram in line came, by the host's clock.
+std::pair<std::time_t, long> FirstArrival(const SocketFile& file) {
+  char byte = 0;
+  alignas(cmsghdr) char room[CMSG_SPACE(sizeof(timespec))] = {};
+  iovec bytes{&byte, 1};
+  msghdr message{};
+  message.msg_iov = &bytes;
+  message.msg_iovlen = 1;
+  message.msg_control = room;
+  message.msg_controllen = sizeof room;
+  if (recvmsg(file.get(), &message, MSG_PEEK) < 0) return {};
+  const cmsghdr* const head = CMSG_FIRSTHDR(&message);
+  timespec when{};
+  if (head != nullptr && head->cmsg_type == SO_TIMESTAMPNS) {
+    std::memcpy(&when, CMSG_DATA(head), sizeof when);
+  }
+  return {when.tv_sec, when.tv_nsec};
+}
+
 }  // namespace
 
-PosixDatagram::PosixDatagram(SocketFile file, Address own) : file_(std::move(file)), own_(own) {}
+PosixDatagram::PosixDatagram(SocketFile file, DeviceSockets& device) : device_(device) {
+  own_box_.file = std::move(file);
+}
+
+PosixDatagram::~PosixDatagram() {
+  const auto port = device_.datagram_ports.find(port_);
+  if (bound_ && port != device_.datagram_ports.end()) device_.datagram_ports.erase(port);
+}
 
 int PosixDatagram::Bind(const Endpoint& local) {
-  const in_addr out{SwapOrder(own_)};
-  int error = file_.Set(IPPROTO_IP, IP_MULTICAST_IF, &out, sizeof out);
-  if (error == 0) error = file_.Bind({own_, local.port});
+  const in_addr out{SwapOrder(device_.own)};
+  int error = own_box_.file.Set(IPPROTO_IP, IP_MULTICAST_IF, &out, sizeof out);
+  if (error == 0) error = own_box_.file.Set(SOL_SOCKET, SO_TIMESTAMPNS, 1);
+  if (error == 0) error = own_box_.file.Bind({device_.own, local.port});
   if (error != 0) return error;
   bound_ = true;
-  for (auto& [group, file] : groups_) {
-    error = OpenGroup(group, file);
+  port_ = own_box_.file.Local().port;
+  device_.datagram_ports.insert(port_);
+  for (auto& [group, inbox] : groups_) {
+    error = OpenGroup(group, inbox.file);
     if (error != 0) return error;
   }
   return 0;
@@ -61,9 +99,10 @@ int PosixDatagram::Send(const char* bytes, std::size_t size, std::size_t& sent) 
 }
 
 int PosixDatagram::SendTo(const Endpoint& to, const char* bytes, std::size_t size) {
-  const HostAddress address(to);
+  const bool stays = to.address == kLocalHost && device_.datagram_ports.count(to.port) != 0;
+  const HostAddress address({stays ? device_.own : to.address, to.port});
   const ssize_t sent =
-      sendto(file_.get(), bytes, size, MSG_NOSIGNAL, address.get(), address.size());
+      sendto(own_box_.file.get(), bytes, size, MSG_NOSIGNAL, address.get(), address.size());
   if (sent >= 0) return 0;
   // The host's words for a target that cannot be reached from the device's address.
   return errno == EINVAL ? WSAENETUNREACH : ToWinsockError(errno);
@@ -71,51 +110,67 @@ int PosixDatagram::SendTo(const Endpoint& to, const char* bytes, std::size_t siz
 
 // ---- receiving ----
 
-void PosixDatagram::DropStrangers() {
+void PosixDatagram::DropStrangers(Inbox& inbox) {
   if (peer_.port == 0) return;
-  const auto drop = [&](const SocketFile& file) {
-    Received first;
-    while (PeekFirst(file, first) && first.from != peer_) {
-      char byte = 0;
-      static_cast<void>(recv(file.get(), &byte, 1, 0));
-    }
-  };
-  drop(file_);
-  for (const auto& [group, file] : groups_) {
-    if (file.open()) drop(file);
+  Received first;
+  while (PeekFirst(inbox.file, first) && first.from != peer_) DropFirst(inbox.file);
+}
+
+/// Each datagram is judged once, when it comes to the front of its line.
+void PosixDatagram::DropLost(Inbox& inbox) {
+  if (!device_.loss.any()) return;
+  Received first;
+  while (!inbox.heard && PeekFirst(inbox.file, first)) {
+    inbox.heard = first.from.address == device_.own || !device_.loss.Next();
+    if (!inbox.heard) DropFirst(inbox.file);
   }
 }
 
-SocketFile* PosixDatagram::FirstReadable() {
-  DropStrangers();
-  if ((file_.Poll(POLLIN) & POLLIN) != 0) return &file_;
-  for (auto& [group, file] : groups_) {
-    if (file.open() && (file.Poll(POLLIN) & POLLIN) != 0) return &file;
+bool PosixDatagram::Readable(Inbox& inbox) {
+  if (!inbox.file.open()) return false;
+  DropStrangers(inbox);
+  DropLost(inbox);
+  return (inbox.file.Poll(POLLIN) & POLLIN) != 0;
+}
+
+/// To the device it is one socket: of several files with something to read the one whose first
+/// datagram came first.
+PosixDatagram::Inbox* PosixDatagram::FirstReadable() {
+  std::vector<Inbox*> readable;
+  if (Readable(own_box_)) readable.push_back(&own_box_);
+  for (auto& [group, inbox] : groups_) {
+    if (Readable(inbox)) readable.push_back(&inbox);
   }
-  return nullptr;
+  if (readable.empty()) return nullptr;
+  if (readable.size() == 1) return readable.front();
+  return *std::min_element(readable.begin(), readable.end(), [](const Inbox* a, const Inbox* b) {
+    return FirstArrival(a->file) < FirstArrival(b->file);
+  });
 }
 
 int PosixDatagram::Receive(char* bytes, std::size_t size, bool peek, Received& result) {
-  const SocketFile* file = FirstReadable();
-  if (file == nullptr) return WSAEWOULDBLOCK;
+  Inbox* inbox = FirstReadable();
+  if (inbox == nullptr) return WSAEWOULDBLOCK;
   HostAddress from;
   const int flags = MSG_TRUNC | (peek ? MSG_PEEK : 0);
-  const ssize_t length = recvfrom(file->get(), bytes, size, flags, from.get(), from.room());
+  const ssize_t length = recvfrom(inbox->file.get(), bytes, size, flags, from.get(), from.room());
   if (length < 0) return ToWinsockError(errno);
+  if (!peek) inbox->heard = false;
   const auto whole = static_cast<std::size_t>(length);
-  result = {whole < size ? whole : size, whole > size, from.endpoint()};
+  result = {whole < size ? whole : size, whole > size, from.endpoint(), inbox->group};
   return 0;
 }
 
 int PosixDatagram::Pending(std::uint32_t& bytes) {
-  SocketFile* file = FirstReadable();
-  return file != nullptr ? file->Pending(bytes) : 0;
+  Inbox* inbox = FirstReadable();
+  return inbox != nullptr ? inbox->file.Pending(bytes) : 0;
 }
 
 unsigned PosixDatagram::Ready(unsigned interest) {
   unsigned ready = 0;
   if ((interest & kReadable) != 0 && FirstReadable() != nullptr) ready |= kReadable;
-  if ((interest & kWritable) != 0 && (file_.Poll(POLLOUT) & POLLOUT) != 0) ready |= kWritable;
+  if ((interest & kWritable) != 0 && (own_box_.file.Poll(POLLOUT) & POLLOUT) != 0)
+    ready |= kWritable;
   return ready;
 }
 
@@ -123,9 +178,11 @@ void PosixDatagram::Watch(unsigned interest, std::vector<pollfd>& files) const {
   short events = 0;
   if ((interest & kReadable) != 0) events |= POLLIN;
   if ((interest & kWritable) != 0) events |= POLLOUT;
-  files.push_back({file_.get(), events, 0});
-  for (const auto& [group, file] : groups_) {
-    if (file.open() && (interest & kReadable) != 0) files.push_back({file.get(), POLLIN, 0});
+  files.push_back({own_box_.file.get(), events, 0});
+  for (const auto& [group, inbox] : groups_) {
+    if (inbox.file.open() && (interest & kReadable) != 0) {
+      files.push_back({inbox.file.get(), POLLIN, 0});
+    }
   }
 }
 
@@ -136,11 +193,12 @@ int PosixDatagram::OpenGroup(Address group, SocketFile& file) {
   int error = SocketFile::Make(SOCK_DGRAM, opened);
   if (error == 0) error = opened.Set(SOL_SOCKET, SO_REUSEADDR, 1);
   if (error == 0) error = opened.Set(IPPROTO_IP, kMulticastAll, 0);
+  if (error == 0) error = opened.Set(SOL_SOCKET, SO_TIMESTAMPNS, 1);
   if (error == 0 && receive_buffer_ > 0) {
     error = opened.Set(SOL_SOCKET, SO_RCVBUF, receive_buffer_);
   }
-  if (error == 0) error = opened.Bind({group, file_.Local().port});
-  const ip_mreq request{{SwapOrder(group)}, {SwapOrder(own_)}};
+  if (error == 0) error = opened.Bind({group, port_});
+  const ip_mreq request{{SwapOrder(group)}, {SwapOrder(device_.own)}};
   if (error == 0) error = opened.Set(IPPROTO_IP, IP_ADD_MEMBERSHIP, &request, sizeof request);
   if (error == 0) file = std::move(opened);
   return error;
@@ -149,7 +207,7 @@ int PosixDatagram::OpenGroup(Address group, SocketFile& file) {
 int PosixDatagram::Join(Address group) {
   SocketFile file;
   const int error = bound_ ? OpenGroup(group, file) : 0;
-  if (error == 0) groups_[group] = std::move(file);
+  if (error == 0) groups_[group] = {std::move(file), group};
   return error;
 }
 
@@ -159,15 +217,16 @@ int PosixDatagram::Leave(Address group) {
 }
 
 int PosixDatagram::Tune(Tuning what, int value) {
+  SocketFile& file = own_box_.file;
   switch (what) {
-    case Tuning::kBroadcast: return file_.Set(SOL_SOCKET, SO_BROADCAST, value);
-    case Tuning::kReuseAddress: return file_.Set(SOL_SOCKET, SO_REUSEADDR, value);
-    case Tuning::kSendBuffer: return file_.Set(SOL_SOCKET, SO_SNDBUF, value);
+    case Tuning::kBroadcast: return file.Set(SOL_SOCKET, SO_BROADCAST, value);
+    case Tuning::kReuseAddress: return file.Set(SOL_SOCKET, SO_REUSEADDR, value);
+    case Tuning::kSendBuffer: return file.Set(SOL_SOCKET, SO_SNDBUF, value);
     case Tuning::kReceiveBuffer:
       receive_buffer_ = value;
-      return file_.Set(SOL_SOCKET, SO_RCVBUF, value);
-    case Tuning::kMulticastTtl: return file_.Set(IPPROTO_IP, IP_MULTICAST_TTL, value);
-    case Tuning::kMulticastLoop: return file_.Set(IPPROTO_IP, IP_MULTICAST_LOOP, value);
+      return file.Set(SOL_SOCKET, SO_RCVBUF, value);
+    case Tuning::kMulticastTtl: return file.Set(IPPROTO_IP, IP_MULTICAST_TTL, value);
+    case Tuning::kMulticastLoop: return file.Set(IPPROTO_IP, IP_MULTICAST_LOOP, value);
     case Tuning::kNoDelay:
     case Tuning::kKeepAlive: break;
   }

@@ -5,6 +5,7 @@
 #include <memory>
 #include <vector>
 
+#include "net/posix/device_sockets.h"
 #include "net/posix/file.h"
 #include "net/transport.h"
 
@@ -15,7 +16,8 @@ namespace sim {
 /// each let devices and servers on one host share a port without taking each other's datagrams.
 class PosixDatagram final : public Transport {
  public:
-  PosixDatagram(SocketFile file, Address own);
+  PosixDatagram(SocketFile file, DeviceSockets& device);
+  ~PosixDatagram() override;
 
   int Bind(const Endpoint& local) override;
   int Connect(const Endpoint& peer) override;
@@ -32,20 +34,29 @@ class PosixDatagram final : public Transport {
   int Tune(Tuning what, int value) override;
   unsigned Ready(unsigned interest) override;
   void Watch(unsigned interest, std::vector<pollfd>& files) const override;
-  [[nodiscard]] Endpoint local() const override { return file_.Local(); }
+  [[nodiscard]] Endpoint local() const override { return own_box_.file.Local(); }
   [[nodiscard]] Endpoint peer() const override { return peer_; }
   void Abort() override {}
 
  private:
-  int OpenGroup(Address group, SocketFile& file);
-  [[nodiscard]] SocketFile* FirstReadable();
-  void DropStrangers();
+  struct Inbox {
+    SocketFile file;
+    Address group = kAnyAddress;  ///< 0: the device's own address
+    bool heard = false;           ///< the first datagram in line is one that is not lost
+  };
 
-  SocketFile file_;
-  std::map<Address, SocketFile> groups_;  ///< closed files until the socket is bound
-  const Address own_;
+  int OpenGroup(Address group, SocketFile& file);
+  [[nodiscard]] Inbox* FirstReadable();
+  [[nodiscard]] bool Readable(Inbox& inbox);
+  void DropStrangers(Inbox& inbox);
+  void DropLost(Inbox& inbox);
+
+  Inbox own_box_;
+  std::map<Address, Inbox> groups_;  ///< closed files until the socket is bound
+  DeviceSockets& device_;
   bool bound_ = false;
-  Endpoint peer_;  ///< port 0: any sender is heard
+  std::uint16_t port_ = 0;  ///< once it is bound
+  Endpoint peer_;           ///< port 0: any sender is heard
   int receive_buffer_ = 0;
 };
 

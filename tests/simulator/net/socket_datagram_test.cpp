@@ -1,4 +1,7 @@
 // What a device's program sees of its datagrams, the same in both worlds.
+#include <string>
+#include <vector>
+
 #include "simulator/net/socket_fixture.h"
 
 namespace test {
@@ -83,6 +86,39 @@ TYPED_TEST(SocketDatagramTest, HearsItsGroupsUntilItLeavesThem) {
   SendTo(sender, {kDevice, port}, "direct");
   EXPECT_EQ(ReceiveText(member), "direct");
   EXPECT_EQ(Select(member, For::kRead, 0), 0);
+}
+
+TYPED_TEST(SocketDatagramTest, HearsItsGroupsAndItselfInTheOrderOfSending) {
+  const SOCKET member = Udp();
+  ASSERT_EQ(Bind(member, sim::kAnyAddress), 0);
+  const std::uint16_t port = LocalName(member).port;
+  ASSERT_EQ(Group(member, CE_IP_ADD_MEMBERSHIP, kGroup), 0);
+  ASSERT_EQ(Group(member, CE_IP_ADD_MEMBERSHIP, kOtherGroup), 0);
+  const SOCKET sender = Udp();
+  const sim::Address kTargets[] = {kOtherGroup, kDevice, kGroup, kDevice, kOtherGroup, kGroup};
+  for (int i = 0; i < 6; ++i) SendTo(sender, {kTargets[i], port}, std::to_string(i));
+
+  for (int i = 0; i < 6; ++i) EXPECT_EQ(ReceiveText(member), std::to_string(i));
+}
+
+TYPED_TEST(SocketDatagramTest, ShowsAListenerWhatIsSentAndReceived) {
+  const SOCKET member = Udp();
+  ASSERT_EQ(Bind(member, sim::kAnyAddress), 0);
+  const std::uint16_t port = LocalName(member).port;
+  ASSERT_EQ(Group(member, CE_IP_ADD_MEMBERSHIP, kGroup), 0);
+  std::vector<std::string> seen;
+  this->device().network().ListenToDatagrams([&seen](const sim::SeenDatagram& datagram) {
+    seen.push_back((datagram.sent ? "out " : "in ") + std::string(datagram.bytes) + " " +
+                   sim::ToText(datagram.from.address));
+  });
+
+  SendTo(member, {kGroup, port}, "all");
+  EXPECT_EQ(ReceiveText(member, 4096, CE_MSG_PEEK), "all") << "looking is not receiving";
+  EXPECT_EQ(ReceiveText(member), "all");
+  this->device().network().ListenToDatagrams({});
+  SendTo(member, {kGroup, port}, "unseen");
+
+  EXPECT_EQ(seen, (std::vector<std::string>{"out all 127.0.0.1", "in all 127.0.0.1"}));
 }
 
 TYPED_TEST(SocketDatagramTest, LetsTwoSocketsOfOnePortHearTheSameGroup) {

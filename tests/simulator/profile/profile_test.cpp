@@ -57,6 +57,8 @@ sim::Profile Unusual() {
   profile.os_minor = 20;
   profile.host_name = "# no comment";
   profile.address = "10.0.0.255";
+  profile.datagram_loss_percent = 2.5;
+  profile.datagram_loss_seed = 18446744073709551615U;
   profile.screen_height = 319;
   profile.page_size = 1024;
   profile.ram_used_pages = 0;
@@ -86,6 +88,7 @@ TEST_F(ProfileTest, ComesBackFromItsFile) {
     EXPECT_EQ(loaded.configuration, saved.configuration);
     EXPECT_EQ(loaded.os_major, saved.os_major);
     EXPECT_EQ(loaded.host_name, saved.host_name);
+    EXPECT_EQ(loaded.datagram_loss_percent, saved.datagram_loss_percent);
     EXPECT_EQ(loaded.volumes.size(), saved.volumes.size());
     EXPECT_EQ(loaded.programs.size(), saved.programs.size());
     EXPECT_EQ(loaded.message_library, saved.message_library);
@@ -166,6 +169,9 @@ TEST_F(ProfileTest, RefusesEverythingElseInOneLine) {
       {"[program a.exe]\n[program A.EXE]\n", "stands here twice"},
       {"[program a.exe]\nexit_code = 4294967296\n", "is no number"},
       {"[screen]\nwidth = 0\n", "is no number from 1"},
+      {"[network]\ndatagram_loss_percent = 100.5\n", "is no number from 0 to 100"},
+      {"[network]\ndatagram_loss_percent = nan\n", "is no number from 0 to 100"},
+      {"[network]\ndatagram_loss_percent = 2 %\n", "is no number from 0 to 100"},
       {"[screen]\nwidth = 240.5\n", "is no number"},
       {"[screen]\nwidth =\n", "is no number"},
       {"[memory]\nstore_pages = 99999999999999999999\n", "is no number"},
