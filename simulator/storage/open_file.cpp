@@ -17,6 +17,8 @@
 namespace sim {
 namespace {
 
+constexpr std::size_t kReadAhead = 65536;
+
 /// @return false with errno set; a part may have been written.
 bool WriteAt(int fd, const char* bytes, std::size_t size, std::uint64_t at) {
   while (size > 0) {
@@ -50,15 +52,39 @@ DWORD OpenFile::Read(void* bytes, DWORD size, DWORD& read) {
   const std::lock_guard<std::mutex> hold(node_->mutex);
   if (!node_->volume.present()) return ERROR_NOT_READY;
   while (read < size) {
-    const ssize_t got = ::pread(fd_.get(), static_cast<char*>(bytes) + read, size - read,
-                                static_cast<off_t>(position_));
+    const ssize_t got = ReadHere(static_cast<char*>(bytes) + read, size - read);
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return ErrorOfErrno(errno);
     if (got == 0) break;
     read += static_cast<DWORD>(got);
     position_ += static_cast<std::uint64_t>(got);
+    read_to_ = position_;
   }
   return ERROR_SUCCESS;
+}
+
+ssize_t OpenFile::ReadHere(char* bytes, std::size_t size) {
+  const auto host_read = [this](char* to, std::size_t most) {
+    return ::pread(fd_.get(), to, most, static_cast<off_t>(position_));
+  };
+  const bool ahead = ahead_.version == node_->version && position_ >= ahead_.at &&
+                     position_ < ahead_.at + ahead_.size;
+  if (!ahead) {
+    // The first piece comes alone: many a program looks at a file's head only.
+    if (size > kReadAhead / 4 || position_ == 0 || position_ != read_to_) {
+      return host_read(bytes, size);
+    }
+    if (!ahead_.bytes) ahead_.bytes = std::make_unique<char[]>(kReadAhead);
+    const ssize_t got = host_read(ahead_.bytes.get(), kReadAhead);
+    ahead_.size = got > 0 ? static_cast<std::size_t>(got) : 0;
+    ahead_.at = position_;
+    ahead_.version = node_->version;
+    if (got <= 0) return got;
+  }
+  const std::size_t from = position_ - ahead_.at;
+  const std::size_t taken = std::min(size, ahead_.size - from);
+  std::memcpy(bytes, ahead_.bytes.get() + from, taken);
+  return static_cast<ssize_t>(taken);
 }
 
 DWORD OpenFile::Write(const void* bytes, DWORD size, DWORD& written) {
@@ -73,6 +99,7 @@ DWORD OpenFile::Write(const void* bytes, DWORD size, DWORD& written) {
   const std::uint64_t growth = end > node_->size ? end - node_->size : 0;
   Space& space = node_->volume.space();
   if (growth != 0 && !space.Reserve(growth)) return ERROR_DISK_FULL;
+  ++node_->version;  // also for a write that fails half-way
   if (!WriteAt(fd_.get(), static_cast<const char*>(bytes), size, start)) {
     const DWORD error = ErrorOfErrno(errno);
     if (growth != 0) {
@@ -192,6 +219,7 @@ void OpenFile::NoteChange() {
   node_->record.written = SystemTicks(device_);
   node_->record.accessed = node_->record.written;
   node_->changed = true;
+  ++node_->version;
 }
 
 }  // namespace sim

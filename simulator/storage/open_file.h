@@ -1,6 +1,8 @@
 // An open file: what the handles of CreateFileW and the streams of fopen stand for.
 #pragma once
 
+#include <sys/types.h>
+
 #include <cstdint>
 #include <memory>
 #include <mutex>
@@ -32,7 +34,8 @@ struct FileNode {
   std::mutex mutex;  ///< of the size, the record and the content
   std::uint64_t size = 0;
   FileRecord record;
-  bool changed = false;  ///< the record differs from the one kept on the host
+  bool changed = false;       ///< the record differs from the one kept on the host
+  std::uint64_t version = 0;  ///< goes up with each change of the content
 
   // How it is shared; guarded by the storage's lock.
   unsigned opens = 0;
@@ -84,15 +87,29 @@ class OpenFile final : public KernelObject {
 
  private:
   friend class Storage;
+  /// Bytes behind the last one asked for, as a file system's cache holds them: whoever reads a file
+  /// from end to end in small pieces does not pay the host for each.
+  struct ReadAhead {
+    std::unique_ptr<char[]> bytes;
+    std::uint64_t at = 0;
+    std::size_t size = 0;
+    std::uint64_t version = 0;  ///< of the content
+  };
+
   void NoteChange();
   DWORD Resize(std::uint64_t size);
+  /// From the position on. @return how many, 0 at the end of the file, -1 with errno set.
+  ssize_t ReadHere(char* bytes, std::size_t size);
 
   Device& device_;
   Storage* storage_;  ///< null once the file is closed
   std::shared_ptr<FileNode> node_;
   UniqueFd fd_;
   const Mode mode_;
-  std::uint64_t position_ = 0;  ///< guarded by the node's mutex
+  // guarded by the node's mutex
+  std::uint64_t position_ = 0;
+  std::uint64_t read_to_ = 0;  ///< where the last read ended
+  ReadAhead ahead_;
 };
 
 }  // namespace sim
