@@ -10,6 +10,7 @@
 #include "kernel/kernel.h"
 #include "library/libraries.h"
 #include "library/management_queue.h"
+#include "locale/clock.h"
 #include "memory/memory.h"
 #include "net/network.h"
 #include "power/power.h"
@@ -27,6 +28,7 @@ Device::Device(World& world, Profile profile, std::filesystem::path folder)
     : world_(world),
       profile_(std::move(profile)),
       folder_(std::move(folder)),
+      start_ticks_(StartTicks(profile_)),
       faults_(std::make_unique<Faults>()),
       trace_(std::make_unique<Trace>()),
       handles_(std::make_unique<HandleTable>()),

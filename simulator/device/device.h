@@ -6,6 +6,7 @@
 //   HANDLE file = CreateFileW(TEXT("\\a.txt"), ...);
 #pragma once
 
+#include <cstdint>
 #include <filesystem>
 #include <memory>
 
@@ -43,6 +44,8 @@ class Device {
   [[nodiscard]] World& world() const { return world_; }
   [[nodiscard]] const Profile& profile() const { return profile_; }
   [[nodiscard]] const std::filesystem::path& folder() const { return folder_; }
+  /// The device's UTC time when a virtual world begins, in the unit of file times.
+  [[nodiscard]] std::uint64_t start_ticks() const { return start_ticks_; }
   [[nodiscard]] Faults& faults() const { return *faults_; }
   [[nodiscard]] Trace& trace() const { return *trace_; }
   [[nodiscard]] HandleTable& handles() const { return *handles_; }
@@ -65,6 +68,7 @@ class Device {
   World& world_;
   Profile profile_;
   std::filesystem::path folder_;
+  const std::uint64_t start_ticks_;
   std::unique_ptr<Faults> faults_;
   std::unique_ptr<Trace> trace_;
   std::unique_ptr<HandleTable> handles_;

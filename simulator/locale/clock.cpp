@@ -44,12 +44,15 @@ FileTicks SystemTicks(const Device& device) {
     const auto now = std::chrono::system_clock::now().time_since_epoch();
     return kUnixEpoch + static_cast<FileTicks>(duration_cast<Ticks>(now).count());
   }
+  const auto passed = duration_cast<Ticks>(device.world().now()).count();
+  return device.start_ticks() + static_cast<FileTicks>(passed);
+}
+
+FileTicks StartTicks(const Profile& profile) {
   // A profile that was not read from a file may hold any text here; the device then starts in 2006.
   constexpr std::string_view kFallback = "2006-03-01 00:00:00";
-  const std::optional<FileTicks> given = ParseTime(device.profile().start_time);
-  const FileTicks start = given ? *given : *ParseTime(kFallback);
-  const auto passed = duration_cast<Ticks>(device.world().now()).count();
-  return ToSystemTicks(device, start) + static_cast<FileTicks>(passed);
+  const std::optional<FileTicks> given = ParseTime(profile.start_time);
+  return (given ? *given : *ParseTime(kFallback)) - OffsetTicks(profile.utc_offset_minutes);
 }
 
 FileTicks ToLocalTicks(const Device& device, FileTicks utc) {

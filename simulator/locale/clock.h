@@ -10,6 +10,7 @@
 namespace sim {
 
 class Device;
+struct Profile;
 
 /// Hundreds of nanoseconds since 1601-01-01 00:00, the unit of file times.
 using FileTicks = std::uint64_t;
@@ -20,6 +21,9 @@ inline constexpr FileTicks kTicksPerDay = 86'400 * kTicksPerSecond;
 /// The UTC time of the device: in a virtual world the profile's start time and what has passed
 /// since, in the real world the host's clock.
 [[nodiscard]] FileTicks SystemTicks(const Device& device);
+
+/// The UTC time at which a virtual world begins for a device of this profile.
+[[nodiscard]] FileTicks StartTicks(const Profile& profile);
 
 /// UTC plus the profile's offset.
 [[nodiscard]] FileTicks ToLocalTicks(const Device& device, FileTicks utc);

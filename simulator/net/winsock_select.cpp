@@ -1,6 +1,6 @@
 // select: which sockets are ready, and the wait for one that is.
 #include <algorithm>
-#include <map>
+#include <array>
 #include <optional>
 #include <vector>
 
@@ -17,59 +17,77 @@ struct Selection {
   ce_fd_set* set;
   unsigned interest;
 };
+using Selections = std::array<Selection, 3>;
 
-/// One entry a socket, with all that is asked about it. @return 0 or a Winsock error.
-int Collect(const std::vector<Selection>& selections, std::vector<Network::Watched>& sockets) {
-  std::map<SOCKET, unsigned> interests;
+/// A socket with all that is asked about it, and what of that it is ready for.
+struct Asked {
+  Network::Watched watched;
+  unsigned ready = 0;
+};
+using AskedSockets = std::vector<Asked>;
+
+Asked* Find(AskedSockets& sockets, SOCKET number) {
+  const auto is_it = [&](const Asked& asked) { return asked.watched.number == number; };
+  const auto found = std::find_if(sockets.begin(), sockets.end(), is_it);
+  return found == sockets.end() ? nullptr : &*found;
+}
+
+/// One entry a socket. @return 0 or a Winsock error.
+int Collect(const Selections& selections, AskedSockets& sockets) {
   for (const Selection& selection : selections) {
     if (selection.set == nullptr) continue;
     if (selection.set->fd_count > static_cast<std::uint32_t>(CE_FD_SETSIZE)) return WSAEINVAL;
     for (std::uint32_t i = 0; i < selection.set->fd_count; ++i) {
-      interests[selection.set->fd_array[i]] |= selection.interest;
+      const SOCKET number = selection.set->fd_array[i];
+      Asked* const known = Find(sockets, number);
+      if (known != nullptr) {
+        known->watched.interest |= selection.interest;
+      } else {
+        sockets.push_back({{number, selection.interest}});
+      }
     }
   }
-  for (const auto& [number, interest] : interests) sockets.push_back({number, interest});
   return sockets.empty() ? WSAEINVAL : 0;
 }
 
-using ReadySockets = std::map<SOCKET, unsigned>;
+enum class Look : std::uint8_t { kNoneReady, kSomeReady, kNotOpen };
 
-/// @return false when one of the sockets is not open.
-bool FindReady(const Network& network, const std::vector<Network::Watched>& sockets,
-               ReadySockets& ready) {
-  for (const Network::Watched& watched : sockets) {
-    sim::Socket* socket = network.Find(watched.number);
-    if (socket == nullptr) return false;
-    const unsigned now = socket->Ready(watched.interest);
-    if (now != 0) ready[watched.number] = now;
+Look LookAt(const Network& network, AskedSockets& sockets) {
+  Look result = Look::kNoneReady;
+  for (Asked& asked : sockets) {
+    sim::Socket* const socket = network.Find(asked.watched.number);
+    if (socket == nullptr) return Look::kNotOpen;
+    asked.ready = socket->Ready(asked.watched.interest);
+    if (asked.ready != 0) result = Look::kSomeReady;
   }
-  return true;
+  return result;
 }
 
 /// Waits for the first socket that is ready. @return 0, also when the time is over, or an error.
-int WaitForReady(WinsockCall& call, const std::vector<Network::Watched>& sockets,
-                 std::optional<Micros> timeout, ReadySockets& ready) {
+int WaitForReady(WinsockCall& call, AskedSockets& sockets, std::optional<Micros> timeout) {
   sim::World& world = call.world();
   // In a virtual world a look at the sockets must cost time too, see LetTimePass.
   if (timeout && world.is_virtual()) timeout = std::max(*timeout, Micros(1));
   const std::optional<Micros> deadline = timeout ? std::optional(world.now() + *timeout) : timeout;
-  int missing = WSAENOTSOCK;
+  std::vector<Network::Watched> watched;
   for (;;) {
-    if (!FindReady(call.network(), sockets, ready)) return missing;
-    if (!ready.empty() || (deadline && world.now() >= *deadline)) return 0;
-    call.network().Wait(call.lock(), sockets, deadline);
-    missing = WSAEINTR;
+    const Look look = LookAt(call.network(), sockets);
+    if (look == Look::kNotOpen) return watched.empty() ? WSAENOTSOCK : WSAEINTR;
+    if (look == Look::kSomeReady || (deadline && world.now() >= *deadline)) return 0;
+    if (watched.empty()) {
+      for (const Asked& asked : sockets) watched.push_back(asked.watched);
+    }
+    call.network().Wait(call.lock(), watched, deadline);
   }
 }
 
 /// Leaves in each set what is ready. @return how many entries are left in all.
-int Reduce(const std::vector<Selection>& selections, const ReadySockets& ready) {
+int Reduce(const Selections& selections, AskedSockets& sockets) {
   std::uint32_t count = 0;
   for (const Selection& selection : selections) {
     if (selection.set == nullptr) continue;
     const auto is_idle = [&](SOCKET number) {
-      const auto found = ready.find(number);
-      return found == ready.end() || (found->second & selection.interest) == 0;
+      return (Find(sockets, number)->ready & selection.interest) == 0;
     };
     SOCKET* const begin = selection.set->fd_array;
     SOCKET* const end = std::remove_if(begin, begin + selection.set->fd_count, is_idle);
@@ -79,15 +97,14 @@ int Reduce(const std::vector<Selection>& selections, const ReadySockets& ready) 
   return static_cast<int>(count);
 }
 
-int Select(WinsockCall& call, const std::vector<Selection>& selections, const ce_timeval* timeout,
-           ReadySockets& ready) {
+int Select(WinsockCall& call, const Selections& selections, const ce_timeval* timeout,
+           AskedSockets& sockets) {
   if (const int error = call.Enter(); error != 0) return error;
-  std::vector<Network::Watched> sockets;
   if (const int error = Collect(selections, sockets); error != 0) return error;
-  if (timeout == nullptr) return WaitForReady(call, sockets, std::nullopt, ready);
+  if (timeout == nullptr) return WaitForReady(call, sockets, std::nullopt);
   if (timeout->tv_sec < 0 || timeout->tv_usec < 0) return WSAEINVAL;
   const Micros wait = std::chrono::seconds(timeout->tv_sec) + Micros(timeout->tv_usec);
-  return WaitForReady(call, sockets, wait, ready);
+  return WaitForReady(call, sockets, wait);
 }
 
 }  // namespace
@@ -98,9 +115,9 @@ extern "C" int ce_select(int /*ignored*/, ce_fd_set* read, ce_fd_set* write, ce_
   if (timeout != nullptr) {
     call.Note("seconds", timeout->tv_sec).Note("microseconds", timeout->tv_usec);
   }
-  const std::vector<Selection> selections = {
-      {read, sim::kReadable}, {write, sim::kWritable}, {except, sim::kExceptional}};
-  ReadySockets ready;
-  const int error = Select(call, selections, timeout, ready);
-  return call.Finish(error, error == 0 ? Reduce(selections, ready) : 0, CE_SOCKET_ERROR);
+  const Selections selections = {
+      {{read, sim::kReadable}, {write, sim::kWritable}, {except, sim::kExceptional}}};
+  AskedSockets sockets;
+  const int error = Select(call, selections, timeout, sockets);
+  return call.Finish(error, error == 0 ? Reduce(selections, sockets) : 0, CE_SOCKET_ERROR);
 }

@@ -66,6 +66,7 @@ DWORD Storage::Unlink(const Location& location) {
     return ErrorOfErrno(errno);
   }
   parked_.Forget(location.entry->device, location.entry->inode);
+  shared_parts_.erase({location.entry->device, location.entry->inode});
   location.volume->space().Release(location.entry->size);
   records_->Erase(location.path());
   return ERROR_SUCCESS;
@@ -179,6 +180,8 @@ DWORD Storage::CopyTo(const Location& from, Location& to) {
   if (!space.Exchange(replaced, from.entry->size)) return ERROR_DISK_FULL;
   const std::string name = to.entry ? to.entry->name : ToHostText(to.leaf);
   constexpr int kSafe = O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK;
+  PutSharedParts(from);
+  if (to.entry) shared_parts_.erase({to.entry->device, to.entry->inode});
   const UniqueFd in(::openat(from.folder, from.entry->name.c_str(), O_RDONLY | kSafe));
   const int how = to.entry ? O_WRONLY | O_TRUNC | kSafe : O_WRONLY | O_CREAT | O_EXCL | kSafe;
   const UniqueFd out(in ? ::openat(to.folder, name.c_str(), how, 0644) : -1);

@@ -117,6 +117,11 @@ std::shared_ptr<FileNode> Storage::EnterNode(const Location& location) {
   node->inode = location.entry->inode;
   node->size = location.entry->size;
   node->record = RecordOf(location);
+  if (shared_content_ != nullptr) {
+    std::shared_ptr<SharedParts>& parts = shared_parts_[{node->device, node->inode}];
+    if (parts == nullptr) parts = std::make_shared<SharedParts>(shared_content_);
+    node->shared = parts;
+  }
   nodes_[{node->device, node->inode}] = node;
   return node;
 }
@@ -126,6 +131,7 @@ DWORD Storage::MakeFresh(FileNode& node, int fd, const OpenRequest& request) {
   if (node.size != 0 && ::ftruncate(fd, 0) != 0) return ErrorOfErrno(errno);
   node.volume.space().Release(node.size);
   node.size = 0;
+  if (node.shared != nullptr) node.shared->Cut(0);
   const FileTicks now = SystemTicks(device_);
   if (request.disposition != TRUNCATE_EXISTING) {
     node.record.attributes = request.attributes & kSettableAttributes;

@@ -56,6 +56,10 @@ DWORD OpenFile::Read(void* bytes, DWORD size, DWORD& read) {
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return ErrorOfErrno(errno);
     if (got == 0) break;
+    if (node_->shared != nullptr) {
+      node_->shared->Fill(position_, static_cast<char*>(bytes) + read,
+                          static_cast<std::size_t>(got));
+    }
     read += static_cast<DWORD>(got);
     position_ += static_cast<std::uint64_t>(got);
     read_to_ = position_;
@@ -87,6 +91,15 @@ ssize_t OpenFile::ReadHere(char* bytes, std::size_t size) {
   return static_cast<ssize_t>(taken);
 }
 
+bool OpenFile::WriteContent(const char* bytes, std::size_t size, std::uint64_t at) {
+  if (node_->shared == nullptr || !node_->shared->Take(at, bytes, size)) {
+    return WriteAt(fd_.get(), bytes, size, at);
+  }
+  // On the host the part is a hole, which takes no room.
+  const std::uint64_t end = at + size;
+  return end <= node_->size || ::ftruncate(fd_.get(), static_cast<off_t>(end)) == 0;
+}
+
 DWORD OpenFile::Write(const void* bytes, DWORD size, DWORD& written) {
   written = 0;
   if (!can_write()) return ERROR_ACCESS_DENIED;
@@ -100,10 +113,11 @@ DWORD OpenFile::Write(const void* bytes, DWORD size, DWORD& written) {
   Space& space = node_->volume.space();
   if (growth != 0 && !space.Reserve(growth)) return ERROR_DISK_FULL;
   ++node_->version;  // also for a write that fails half-way
-  if (!WriteAt(fd_.get(), static_cast<const char*>(bytes), size, start)) {
+  if (!WriteContent(static_cast<const char*>(bytes), size, start)) {
     const DWORD error = ErrorOfErrno(errno);
     if (growth != 0) {
       static_cast<void>(::ftruncate(fd_.get(), static_cast<off_t>(node_->size)));
+      if (node_->shared != nullptr) node_->shared->Cut(node_->size);
       space.Release(growth);
     }
     return error;
@@ -152,6 +166,7 @@ DWORD OpenFile::Resize(std::uint64_t size) {
     return error;
   }
   node_->size = size;
+  if (node_->shared != nullptr) node_->shared->Cut(size);
   NoteChange();
   return ERROR_SUCCESS;
 }
@@ -173,6 +188,7 @@ DWORD OpenFile::Load(char* bytes, std::size_t size) {
     if (got == 0) break;  // somebody on the host has cut it; the rest reads as zeros
     have += static_cast<std::size_t>(got);
   }
+  if (node_->shared != nullptr) node_->shared->Fill(0, bytes, have);
   std::memset(bytes + have, 0, size - have);
   return ERROR_SUCCESS;
 }
@@ -181,7 +197,7 @@ DWORD OpenFile::Store(const char* bytes, std::size_t size) {
   if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
   const std::size_t kept = std::min<std::uint64_t>(size, node_->size);
-  if (!WriteAt(fd_.get(), bytes, kept, 0)) return ErrorOfErrno(errno);
+  if (!WriteContent(bytes, kept, 0)) return ErrorOfErrno(errno);
   NoteChange();
   return ERROR_SUCCESS;
 }

@@ -11,6 +11,7 @@
 #include "ce/files.h"
 #include "kernel/handle_table.h"
 #include "storage/file_records.h"
+#include "storage/shared_parts.h"
 #include "storage/unique_fd.h"
 
 namespace sim {
@@ -36,6 +37,7 @@ struct FileNode {
   FileRecord record;
   bool changed = false;       ///< the record differs from the one kept on the host
   std::uint64_t version = 0;  ///< goes up with each change of the content
+  std::shared_ptr<SharedParts> shared;  ///< of the content; null where nothing is shared
 
   // How it is shared; guarded by the storage's lock.
   unsigned opens = 0;
@@ -100,6 +102,8 @@ class OpenFile final : public KernelObject {
   DWORD Resize(std::uint64_t size);
   /// From the position on. @return how many, 0 at the end of the file, -1 with errno set.
   ssize_t ReadHere(char* bytes, std::size_t size);
+  /// Writes to the host what must be there. @return false with errno set.
+  bool WriteContent(const char* bytes, std::size_t size, std::uint64_t at);
 
   Device& device_;
   Storage* storage_;  ///< null once the file is closed

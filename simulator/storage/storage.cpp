@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/types.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
@@ -157,11 +158,37 @@ bool Storage::SetVolumePresent(const WCHAR* name, bool present) {
   return true;
 }
 
+void Storage::ShareContent(SharedContent content) {
+  const Hold hold(mutex_);
+  shared_content_ = std::move(content);
+}
+
+void Storage::PutSharedParts(const Location& location) {
+  const auto found = shared_parts_.find({location.entry->device, location.entry->inode});
+  if (found == shared_parts_.end()) return;
+  const std::shared_ptr<FileNode> node = FindNode(*location.entry);
+  std::unique_lock<std::mutex> quiet;
+  if (node != nullptr) quiet = std::unique_lock(node->mutex);
+  const UniqueFd file(::openat(location.folder, location.entry->name.c_str(),
+                               O_WRONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK));
+  bool written = static_cast<bool>(file);
+  found->second->ForEach([&](std::uint64_t at, const char* bytes, std::size_t size) {
+    written = written && ::pwrite(file.get(), bytes, size, static_cast<off_t>(at)) ==
+                             static_cast<ssize_t>(size);
+  });
+  if (!written) return;
+  found->second->Cut(0);
+  if (node != nullptr) ++node->version;
+}
+
 std::optional<std::filesystem::path> Storage::HostPath(const WCHAR* name) {
   const Hold hold(mutex_);
   Location location;
   if (Locate(name, location) != ERROR_SUCCESS || !location.volume->present()) return std::nullopt;
-  if (location.entry) return folder_ / location.path();
+  if (location.entry) {
+    PutSharedParts(location);
+    return folder_ / location.path();
+  }
   if (location.volume_root && location.volume->is_root()) return folder_;
   return std::nullopt;
 }

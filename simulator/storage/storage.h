@@ -28,6 +28,7 @@
 #include "storage/mapping.h"
 #include "storage/open_file.h"
 #include "storage/parked_files.h"
+#include "storage/shared_parts.h"
 #include "storage/streams.h"
 #include "storage/unique_fd.h"
 #include "storage/volume.h"
@@ -86,6 +87,10 @@ class Storage {
   bool SetVolumePresent(const WCHAR* name, bool present);
   /// Counts what every volume holds anew, after somebody else has changed `storage/`.
   void Recount();
+  /// Says what this device and others are about to receive: files made or written from now on that
+  /// have bytes of `content` at the same place take no room on the host for them. HostPath and Copy
+  /// put them there after all; the device's end does not.
+  void ShareContent(SharedContent content);
   /// The host's path of an existing file or folder.
   [[nodiscard]] std::optional<std::filesystem::path> HostPath(const WCHAR* name);
   [[nodiscard]] bool Exists(const WCHAR* name) { return HostPath(name).has_value(); }
@@ -153,6 +158,8 @@ class Storage {
   std::shared_ptr<FileNode> EnterNode(const Location& location);
   DWORD MakeFresh(FileNode& node, int fd, const OpenRequest& request);
   DWORD Unlink(const Location& location);
+  /// Writes what the entry has of the shared content to the host.
+  void PutSharedParts(const Location& location);
   [[nodiscard]] DWORD CheckMove(const Location& from, const Location& to) const;
   [[nodiscard]] DWORD CheckCopy(const Location& from, const Location& to,
                                 bool fail_if_exists) const;
@@ -166,7 +173,10 @@ class Storage {
   mutable std::mutex mutex_;
   FolderNames folder_names_;
   ParkedFiles parked_;
-  std::map<std::pair<std::uint64_t, std::uint64_t>, std::weak_ptr<FileNode>> nodes_;
+  using NodeKey = std::pair<std::uint64_t, std::uint64_t>;  ///< device and inode
+  std::map<NodeKey, std::weak_ptr<FileNode>> nodes_;
+  SharedContent shared_content_;  ///< null: none
+  std::map<NodeKey, std::shared_ptr<SharedParts>> shared_parts_;
   std::set<OpenFile*> open_files_;
   Streams streams_;
   Mappings mappings_;

@@ -175,7 +175,7 @@ class RealWorld final : public WorldCore {
         service_wake_.wait_until(lock, start_ + std::min(due, now() + kLongestWait));
         continue;
       }
-      const Timer timer = PopTimer();
+      const WorldTimer timer = PopTimer();
       timer.action();
     }
   }

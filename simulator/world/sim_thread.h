@@ -8,10 +8,14 @@
 #include <csetjmp>
 #include <cstdint>
 #include <functional>
+#include <map>
+#include <memory>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
+#include "world/fiber.h"
 #include "world/world.h"
 
 namespace sim {
@@ -40,6 +44,14 @@ class ThreadEndListener {
   virtual ~ThreadEndListener() = default;
   virtual void ThreadEnded(SimThread& thread) = 0;
 };
+
+/// What a world does at some time to come.
+struct WorldTimer {
+  SimThread* thread = nullptr;  ///< its wait ends; null: an action
+  std::function<void()> action;
+};
+/// By due time and, within it, by the order in which they were set.
+using WorldTimers = std::map<std::pair<Micros, std::uint64_t>, WorldTimer>;
 
 struct SimThread {
   enum class State : std::uint8_t { kSuspended, kReady, kRunning, kBlocked, kFinished };
@@ -74,10 +86,14 @@ struct SimThread {
   std::vector<WaitQueue*> waits_on;
   Micros timer_due{};
   std::uint64_t timer_number = 0;  ///< 0: no timer runs
+  WorldTimers::iterator timer;     ///< of the one that runs
+  WorldTimers::node_type spare_timer;
   std::jmp_buf way_out;            ///< to the thread's first frame, for termination
   void* first_frame = nullptr;
   std::function<std::uint32_t()> body;
-  std::thread host;
+  std::thread host;              ///< not of a light thread, nor of an attached one
+  std::unique_ptr<Fiber> fiber;  ///< of a light thread that has not ended
+  Fiber* runs_on = nullptr;      ///< null: a thread of the host
 };
 
 }  // namespace sim

@@ -4,7 +4,9 @@
 // by queues alone, never by the host, and so a run is a function of its seed.
 #include <atomic>
 #include <deque>
+#include <utility>
 
+#include "world/carrier.h"
 #include "world/world_core.h"
 
 namespace sim {
@@ -16,7 +18,8 @@ constexpr Micros kEndOfTime = std::chrono::hours(24 * 60);
 
 class VirtualWorld final : public WorldCore {
  public:
-  explicit VirtualWorld(std::uint64_t seed) : WorldCore(seed) {}
+  VirtualWorld(std::uint64_t seed, ThreadKind threads)
+      : WorldCore(seed), light_(threads == ThreadKind::kLight) {}
   ~VirtualWorld() override {
     EndAllThreads();
     EndShared();
@@ -40,8 +43,7 @@ class VirtualWorld final : public WorldCore {
     if (next != &self) {
       // The next thread is woken with the lock free: it needs it at once.
       lock.unlock();
-      if (next != nullptr) next->turn.Give();
-      self.turn.Await();
+      HandOver(self, next);
       lock.lock();
     }
     if (self.terminate) Leave(self);
@@ -89,9 +91,28 @@ class VirtualWorld final : public WorldCore {
     MakeReady(thread);
   }
 
-  void AwaitFirstTurn(SimThread& thread, Lock& lock) override { AwaitBaton(thread, lock); }
+  void Equip(SimThread& thread) override {
+    if (!light_) return WorldCore::Equip(thread);
+    thread.fiber = carrier_.Make([this, &thread] {
+      ThreadMain(thread);
+      carrier_.End(std::move(thread.fiber), std::exchange(after_end_, nullptr));
+    });
+    thread.runs_on = thread.fiber.get();
+  }
 
-  void Ended(SimThread& /*thread*/) override { GiveTurn(PassBaton()); }
+  void AwaitFirstTurn(SimThread& thread, Lock& lock) override {
+    // A light thread's first step is its first turn.
+    if (thread.runs_on == nullptr) AwaitBaton(thread, lock);
+  }
+
+  void Ended(SimThread& thread) override {
+    SimThread* const next = PassBaton();
+    if (thread.runs_on == nullptr) {
+      GiveTurn(next);
+    } else {
+      after_end_ = next;
+    }
+  }
 
   // The clock moves only when a thread gives up the baton.
   void ActionAdded() override {}
@@ -109,8 +130,24 @@ class VirtualWorld final : public WorldCore {
     lock.lock();
   }
 
-  static void GiveTurn(SimThread* thread) {
-    if (thread != nullptr) thread->turn.Give();
+  void GiveTurn(SimThread* thread) {
+    if (thread == nullptr) return;
+    if (thread->runs_on != nullptr) {
+      carrier_.Resume(*thread->runs_on);
+    } else {
+      thread->turn.Give();
+    }
+  }
+
+  /// Gives `next` its turn and waits for the caller's own.
+  void HandOver(SimThread& self, SimThread* next) {
+    if (self.runs_on == nullptr) {
+      GiveTurn(next);
+      self.turn.Await();
+    } else {
+      carrier_.PassOn(*self.runs_on, next);
+      SetCurrent(&self);
+    }
   }
 
   /// Decides who runs next, and moves the clock while nobody is ready.
@@ -136,7 +173,7 @@ class VirtualWorld final : public WorldCore {
     if (due > now()) now_us_.store(due.count(), std::memory_order_relaxed);
     if (due > kEndOfTime) Die("the simulated clock ran away");
     while (!timers().empty() && timers().begin()->first.first <= now()) {
-      const Timer timer = PopTimer();
+      const WorldTimer timer = PopTimer();
       if (timer.thread != nullptr) {
         timer.thread->timed_out = true;
         Wakeup(*timer.thread);
@@ -151,6 +188,9 @@ class VirtualWorld final : public WorldCore {
     if (AttachedThreads() > 0) Die("every simulated thread waits and nothing can wake one");
   }
 
+  const bool light_;
+  SimThread* after_end_ = nullptr;  ///< whose turn it is when a light thread has ended
+  Carrier carrier_;                 ///< of the light threads
   std::atomic<std::int64_t> now_us_{0};
   SimThread* running_ = nullptr;
   bool passing_ = false;
@@ -159,8 +199,8 @@ class VirtualWorld final : public WorldCore {
 
 }  // namespace
 
-std::unique_ptr<World> World::MakeVirtual(std::uint64_t seed) {
-  return std::make_unique<VirtualWorld>(seed);
+std::unique_ptr<World> World::MakeVirtual(std::uint64_t seed, ThreadKind threads) {
+  return std::make_unique<VirtualWorld>(seed, threads);
 }
 
 }  // namespace sim

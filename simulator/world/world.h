@@ -46,6 +46,12 @@ class WaitQueue {
 
 enum class Wake : std::uint8_t { kNotified, kTimeout };
 
+/// What the simulated threads of a virtual world consist of. Both give the same runs.
+enum class ThreadKind : std::uint8_t {
+  kHost,   ///< threads of the host: debuggers and other tools see them
+  kLight,  ///< stacks that take turns on one thread of the host: for thousands of threads
+};
+
 class World {
  public:
   using Lock = std::unique_lock<std::mutex>;
@@ -54,7 +60,8 @@ class World {
   /// A world on the host's clock, threads and sockets.
   static std::unique_ptr<World> MakeReal();
   /// A world whose time costs nothing. `seed` decides everything that is random in it.
-  static std::unique_ptr<World> MakeVirtual(std::uint64_t seed = 1);
+  static std::unique_ptr<World> MakeVirtual(std::uint64_t seed = 1,
+                                            ThreadKind threads = ThreadKind::kHost);
 
   /// Terminates the simulated threads that are left, at their next blocking call, and joins them.
   virtual ~World();

@@ -90,39 +90,47 @@ void WorldCore::LeaveQueues(SimThread& thread) {
 void WorldCore::Notify(WaitQueue& queue) {
   if (queue.waiting_.empty()) return;
   // Taken out at once, so that many waiters do not search the list for themselves one by one.
-  const std::vector<SimThread*> woken = std::exchange(queue.waiting_, {});
+  std::vector<SimThread*> woken = std::exchange(woken_, {});
+  woken.swap(queue.waiting_);
   for (SimThread* thread : woken) Wakeup(*thread);
+  woken.clear();
+  woken_ = std::move(woken);
 }
 
 // ---- timers ----
 
+// Waits of one length come due in the order of their beginnings: most timers belong at the end.
 void WorldCore::StartTimer(SimThread& thread, Micros due) {
   thread.timer_due = due;
   thread.timer_number = next_timer_++;
-  timers_.emplace(TimerKey{due, thread.timer_number}, Timer{&thread, nullptr});
+  if (thread.spare_timer.empty()) {
+    thread.timer = timers_.emplace_hint(timers_.end(), std::pair{due, thread.timer_number},
+                                        WorldTimer{&thread, nullptr});
+  } else {
+    thread.spare_timer.key() = {due, thread.timer_number};
+    thread.timer = timers_.insert(timers_.end(), std::move(thread.spare_timer));
+  }
 }
 
 void WorldCore::StopTimer(SimThread& thread) {
   if (thread.timer_number == 0) return;
-  timers_.erase(TimerKey{thread.timer_due, thread.timer_number});
+  thread.spare_timer = timers_.extract(thread.timer);
   thread.timer_number = 0;
 }
 
-WorldCore::Timer WorldCore::PopTimer() {
+WorldTimer WorldCore::PopTimer() {
   const auto first = timers_.begin();
-  Timer timer = std::move(first->second);
-  if (timer.thread != nullptr) {
-    timer.thread->timer_number = 0;
-  } else {
-    action_due_.erase(first->first.second);
+  if (SimThread* const thread = first->second.thread) {
+    StopTimer(*thread);
+    return {thread, nullptr};
   }
-  timers_.erase(first);
-  return timer;
+  action_due_.erase(first->first.second);
+  return std::move(timers_.extract(first).mapped());
 }
 
 std::uint64_t WorldCore::At(Micros when, std::function<void()> action) {
   const std::uint64_t number = next_timer_++;
-  timers_.emplace(TimerKey{when, number}, Timer{nullptr, std::move(action)});
+  timers_.emplace(std::pair{when, number}, WorldTimer{nullptr, std::move(action)});
   action_due_.emplace(number, when);
   ActionAdded();
   return number;
@@ -131,7 +139,7 @@ std::uint64_t WorldCore::At(Micros when, std::function<void()> action) {
 void WorldCore::Cancel(std::uint64_t action) {
   const auto found = action_due_.find(action);
   if (found == action_due_.end()) return;
-  timers_.erase(TimerKey{found->second, action});
+  timers_.erase({found->second, action});
   action_due_.erase(found);
 }
 
@@ -151,6 +159,9 @@ SimThread& WorldCore::NewAttached(Device& device, std::string name) {
   SimThread& thread = NewThread(device, std::move(name));
   thread.attached = true;
   thread.outer = current_thread;
+  if (thread.outer != nullptr && thread.outer->world == this) {
+    thread.runs_on = thread.outer->runs_on;
+  }
   current_thread = &thread;
   ++attached_;
   return thread;
@@ -163,13 +174,17 @@ SimThread& WorldCore::Spawn(Device& device, std::string name, std::function<std:
   thread.body = std::move(body);
   thread.state = SimThread::State::kSuspended;
   try {
-    thread.host = std::thread([this, &thread] { ThreadMain(thread); });
+    Equip(thread);
   } catch (...) {
     threads_.pop_back();
     throw;
   }
   if (!suspended) Resume(thread);
   return thread;
+}
+
+void WorldCore::Equip(SimThread& thread) {
+  thread.host = std::thread([this, &thread] { ThreadMain(thread); });
 }
 
 void WorldCore::Resume(SimThread& thread) {
@@ -230,7 +245,9 @@ void WorldCore::Finish(SimThread& thread, std::uint32_t exit_code) {
 
 // A thread on this list has given up the lock for the last time, so joining it under the lock ends.
 void WorldCore::JoinEnded() {
-  for (SimThread* thread : ended_) thread->host.join();
+  for (SimThread* thread : ended_) {
+    if (thread->host.joinable()) thread->host.join();
+  }
   ended_.clear();
 }
 

@@ -32,12 +32,18 @@ class WorldCore : public World {
 
   /// Makes a blocked or suspended thread run again. Lock held.
   virtual void Wakeup(SimThread& thread) = 0;
+  /// Gives a new thread what it runs on; ThreadMain is to be called there. Lock held.
+  /// @throws std::system_error when the host has none.
+  virtual void Equip(SimThread& thread);
   /// Returns when the new thread may take its first step, or was terminated before it. Lock held.
   virtual void AwaitFirstTurn(SimThread& thread, Lock& lock) = 0;
   /// The thread has ended and will not call again. Lock held.
   virtual void Ended(SimThread& thread) = 0;
   /// An action was put in. Lock held.
   virtual void ActionAdded() = 0;
+
+  /// A spawned thread's whole life.
+  void ThreadMain(SimThread& thread);
 
   /// To be called first in the derived destructor: ends all threads.
   void EndAllThreads();
@@ -59,30 +65,25 @@ class WorldCore : public World {
   [[noreturn]] void Die(const char* why) const;
 
   // Timers: threads with a deadline and actions, in the order in which they come due.
-  struct Timer {
-    SimThread* thread = nullptr;  ///< null: an action
-    std::function<void()> action;
-  };
-  using TimerKey = std::pair<Micros, std::uint64_t>;
   void StartTimer(SimThread& thread, Micros due);
   void StopTimer(SimThread& thread);
-  [[nodiscard]] const std::map<TimerKey, Timer>& timers() const { return timers_; }
+  [[nodiscard]] const WorldTimers& timers() const { return timers_; }
   /// Takes the earliest timer out. Lock held; there is one.
-  Timer PopTimer();
+  WorldTimer PopTimer();
 
  private:
-  void ThreadMain(SimThread& thread);
   /// Returns when the body does, or is left by Leave.
   static void RunBody(SimThread& thread);
   void EndThreadsWhere(const std::function<bool(const SimThread&)>& chosen);
   void JoinEnded();
 
   std::vector<std::unique_ptr<SimThread>> threads_;
-  std::vector<SimThread*> ended_;  ///< host threads that are to be joined
+  std::vector<SimThread*> woken_;  ///< kept by Notify because its memory is used again
+  std::vector<SimThread*> ended_;  ///< whose host threads are to be joined
   std::condition_variable thread_ended_;
   std::uint32_t next_thread_id_ = 0x100;
   std::size_t attached_ = 0;
-  std::map<TimerKey, Timer> timers_;
+  WorldTimers timers_;
   std::unordered_map<std::uint64_t, Micros> action_due_;
   std::uint64_t next_timer_ = 1;
 };

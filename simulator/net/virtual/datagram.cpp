@@ -31,7 +31,7 @@ int VirtualDatagramTransport::Connect(const Endpoint& peer) {
   const auto is_stranger = [&](const Datagram& datagram) { return datagram.from != peer_; };
   received_.erase(std::remove_if(received_.begin(), received_.end(), is_stranger), received_.end());
   used_ = 0;
-  for (const Datagram& datagram : received_) used_ += datagram.bytes.size() + kOverhead;
+  for (const Datagram& datagram : received_) used_ += datagram.bytes().size() + kOverhead;
   return 0;
 }
 
@@ -54,27 +54,27 @@ int VirtualDatagramTransport::SendTo(const Endpoint& to, const char* bytes, std:
   return 0;
 }
 
-void VirtualDatagramTransport::Arrived(const Endpoint& from, std::string_view bytes) {
+void VirtualDatagramTransport::Arrived(const Endpoint& from, const Payload& bytes) {
   if (peer_.port != 0 && from != peer_) return;
-  if (used_ + bytes.size() + kOverhead > room_) return;
-  used_ += bytes.size() + kOverhead;
-  received_.push_back({from, std::string(bytes)});
+  if (used_ + bytes->size() + kOverhead > room_) return;
+  used_ += bytes->size() + kOverhead;
+  received_.push_back({from, bytes});
   fabric_.world().Notify(queue);
 }
 
 int VirtualDatagramTransport::Receive(char* bytes, std::size_t size, bool peek, Received& result) {
   if (received_.empty()) return WSAEWOULDBLOCK;
   const Datagram& first = received_.front();
-  result = {std::min(size, first.bytes.size()), first.bytes.size() > size, first.from};
-  if (result.size > 0) std::memcpy(bytes, first.bytes.data(), result.size);
+  result = {std::min(size, first.bytes().size()), first.bytes().size() > size, first.from};
+  if (result.size > 0) std::memcpy(bytes, first.bytes().data(), result.size);
   if (peek) return 0;
-  used_ -= first.bytes.size() + kOverhead;
+  used_ -= first.bytes().size() + kOverhead;
   received_.pop_front();
   return 0;
 }
 
 int VirtualDatagramTransport::Pending(std::uint32_t& bytes) {
-  bytes = received_.empty() ? 0 : static_cast<std::uint32_t>(received_.front().bytes.size());
+  bytes = received_.empty() ? 0 : static_cast<std::uint32_t>(received_.front().bytes().size());
   return 0;
 }
 

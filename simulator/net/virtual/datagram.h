@@ -38,10 +38,11 @@ class VirtualDatagramTransport final : public Transport, private DatagramSink {
  private:
   struct Datagram {
     Endpoint from;
-    std::string bytes;
+    Payload payload;
+    [[nodiscard]] const std::string& bytes() const { return *payload; }
   };
 
-  void Arrived(const Endpoint& from, std::string_view bytes) override;
+  void Arrived(const Endpoint& from, const Payload& bytes) override;
 
   Fabric& fabric_;
   const Address own_;

@@ -13,6 +13,11 @@ namespace {
 
 thread_local bool inside_action = false;
 
+/// One direction between two hosts as one number.
+std::uint64_t Way(Address from, Address to) {
+  return (std::uint64_t{from} << 32U) | to;
+}
+
 std::string LowerCase(std::string_view text) {
   std::string lower(text);
   for (char& c : lower) {
@@ -67,9 +72,9 @@ Address Fabric::Route(Address from, Address to) const {
 // ---- links ----
 
 Link& Fabric::Between(Address from, Address to) {
-  std::unique_ptr<Link>& link = links_[{from, to}];
+  const std::uint64_t way = Way(from, to);
+  std::unique_ptr<Link>& link = links_[way];
   if (link == nullptr) {
-    const std::uint64_t way = (std::uint64_t{from} << 32U) | to;
     link = std::make_unique<Link>(world_.seed() * 0xD1342543DE82EF95U + way);
     if (from != to) link->set_profile(default_link_);
   }
@@ -79,13 +84,14 @@ Link& Fabric::Between(Address from, Address to) {
 void Fabric::SetDefaultLink(const LinkProfile& profile) {
   default_link_ = profile;
   for (auto& [way, link] : links_) {
-    const bool follows = way.first != way.second && special_links_.count(way) == 0;
+    const bool to_itself = way >> 32U == (way & 0xFFFFFFFFU);
+    const bool follows = !to_itself && special_links_.count(way) == 0;
     if (follows) link->set_profile(profile);
   }
 }
 
 void Fabric::SetLink(Address from, Address to, const LinkProfile& profile) {
-  special_links_.insert({from, to});
+  special_links_.insert(Way(from, to));
   Between(from, to).set_profile(profile);
 }
 
@@ -158,64 +164,98 @@ void Fabric::UnbindDatagram(const Endpoint& local, DatagramSink& sink) {
   sinks.erase(std::remove_if(sinks.begin(), sinks.end(), is_it), sinks.end());
 }
 
-Fabric::BoundSink* Fabric::FindSink(const Endpoint& local, const DatagramSink& sink) {
-  for (BoundSink& bound : hosts_[local.address].datagram_ports[local.port]) {
+Fabric::BoundSink* Fabric::FindSink(Host& host, std::uint16_t port, const DatagramSink& sink) {
+  const auto found = host.datagram_ports.find(port);
+  if (found == host.datagram_ports.end()) return nullptr;
+  for (BoundSink& bound : found->second) {
     if (bound.sink == &sink) return &bound;
   }
   return nullptr;
 }
 
 void Fabric::Join(const Endpoint& local, DatagramSink& sink, Address group) {
-  if (BoundSink* bound = FindSink(local, sink)) bound->groups.insert(group);
+  BoundSink* const bound = FindSink(hosts_[local.address], local.port, sink);
+  if (bound != nullptr) bound->groups.insert(group);
 }
 
 void Fabric::Leave(const Endpoint& local, DatagramSink& sink, Address group) {
-  if (BoundSink* bound = FindSink(local, sink)) bound->groups.erase(group);
+  BoundSink* const bound = FindSink(hosts_[local.address], local.port, sink);
+  if (bound != nullptr) bound->groups.erase(group);
 }
 
 /// The hosts that a datagram goes to. Whether a program there wants it is seen when it arrives.
-std::vector<Address> Fabric::Receivers(const Endpoint& from, const Endpoint& to,
-                                       const SendOptions& options) const {
-  if (!IsMulticast(to.address) && to.address != kBroadcastAddress) return {to.address};
-  std::vector<Address> receivers;
-  for (const auto& [address, host] : hosts_) {
-    const bool own = address == from.address;
-    if (own ? options.loop : options.ttl > 0) receivers.push_back(address);
+void Fabric::FindReceivers(const Endpoint& from, const Endpoint& to, const SendOptions& options) {
+  receivers_.clear();
+  if (!IsMulticast(to.address) && to.address != kBroadcastAddress) {
+    const auto host = hosts_.find(to.address);
+    receivers_.emplace_back(to.address, host == hosts_.end() ? nullptr : &host->second);
+    return;
   }
-  return receivers;
+  for (auto& [address, host] : hosts_) {
+    const bool own = address == from.address;
+    if (own ? options.loop : options.ttl > 0) receivers_.emplace_back(address, &host);
+  }
+}
+
+void Fabric::Forward(Frame& frame, Address receiver, Host& host) {
+  Link& link = Between(frame.from.address, receiver);
+  link.Datagram(frame.when, frame.bytes.size(), arrivals_);
+  if (host.state != HostState::kUp || link.stalled()) return;
+  if (filter_ && !filter_(frame, receiver)) return;
+  for (const Micros when : arrivals_) {
+    if (capturing_ || filter_) frame.arrivals.push_back({receiver, when});
+    copies_.push_back({when, &host});
+  }
+}
+
+/// Copies that arrive at one instant come by one action.
+void Fabric::Dispatch(const Frame& frame) {
+  const auto earlier = [](const Copy& a, const Copy& b) { return a.when < b.when; };
+  if (!std::is_sorted(copies_.begin(), copies_.end(), earlier)) {
+    std::stable_sort(copies_.begin(), copies_.end(), earlier);
+  }
+  const auto payload = std::make_shared<const std::string>(frame.bytes);
+  for (auto first = copies_.begin(); first != copies_.end();) {
+    const auto is_later = [&](const Copy& copy) { return copy.when > first->when; };
+    const auto last = std::find_if(first, copies_.end(), is_later);
+    At(first->when, [this, payload, from = frame.from, to = frame.to,
+                     receivers = std::vector<Copy>(first, last)] {
+      for (const Copy& copy : receivers) Deliver(*copy.receiver, from, to, payload);
+    });
+    first = last;
+  }
 }
 
 void Fabric::SendDatagram(const Endpoint& from, const Endpoint& to, std::string_view bytes,
                           const SendOptions& options) {
   Frame frame{FrameKind::kDatagram, world_.now(), from, to, std::string(bytes), {}};
-  for (const Address receiver : Receivers(from, to, options)) {
-    Link& link = Between(from.address, receiver);
-    const std::vector<Micros> arrivals = link.Datagram(frame.when, bytes.size());
-    if (State(receiver) != HostState::kUp || link.stalled()) continue;
-    if (filter_ && !filter_(frame, receiver)) continue;
-    for (const Micros when : arrivals) {
-      frame.arrivals.push_back({receiver, when});
-      At(when,
-         [this, receiver, from, to, sent = frame.bytes] { Deliver(receiver, from, to, sent); });
-    }
+  FindReceivers(from, to, options);
+  copies_.clear();
+  for (const auto& [receiver, host] : receivers_) {
+    if (host != nullptr) Forward(frame, receiver, *host);
   }
+  Dispatch(frame);
   if (capturing_) Record(std::move(frame));
 }
 
-void Fabric::Deliver(Address receiver, const Endpoint& from, const Endpoint& to,
-                     const std::string& bytes) {
-  Host& host = hosts_[receiver];
-  const auto found = host.datagram_ports.find(to.port);
-  if (found == host.datagram_ports.end() || host.state != HostState::kUp) return;
+void Fabric::Deliver(Host& receiver, const Endpoint& from, const Endpoint& to,
+                     const Payload& bytes) {
+  const auto found = receiver.datagram_ports.find(to.port);
+  if (found == receiver.datagram_ports.end() || receiver.state != HostState::kUp) return;
   const bool to_group = IsMulticast(to.address);
-  // A copy: a program may open and close ports while it is called.
-  for (const BoundSink& bound : std::vector<BoundSink>(found->second)) {
-    if (to_group && bound.groups.count(to.address) == 0) continue;
-    if (FindSink({receiver, to.port}, *bound.sink) == nullptr) continue;
-    bound.sink->Arrived(from, bytes);
-    // One program has the datagram for one host; everyone who asked has those for many.
-    if (!to_group && to.address != kBroadcastAddress) return;
+  // Noted first: a program may open and close ports while it is called.
+  std::vector<DatagramSink*> asked = std::exchange(asked_, {});
+  for (const BoundSink& bound : found->second) {
+    if (!to_group || bound.groups.count(to.address) != 0) asked.push_back(bound.sink);
   }
+  for (DatagramSink* const sink : asked) {
+    if (FindSink(receiver, to.port, *sink) == nullptr) continue;
+    sink->Arrived(from, bytes);
+    // One program has the datagram for one host; everyone who asked has those for many.
+    if (!to_group && to.address != kBroadcastAddress) break;
+  }
+  asked.clear();
+  asked_ = std::move(asked);
 }
 
 // ---- TCP ----

@@ -9,6 +9,8 @@
 #include <set>
 #include <string>
 #include <string_view>
+#include <unordered_map>
+#include <utility>
 #include <vector>
 
 #include "net/endpoint.h"
@@ -21,11 +23,14 @@ namespace sim {
 
 class TcpConnection;
 
+/// The bytes of a datagram, which all its receivers share.
+using Payload = std::shared_ptr<const std::string>;
+
 /// What has a UDP port open. Called from the world's actions, with its lock held.
 class DatagramSink {
  public:
   virtual ~DatagramSink() = default;
-  virtual void Arrived(const Endpoint& from, std::string_view bytes) = 0;
+  virtual void Arrived(const Endpoint& from, const Payload& bytes) = 0;
 };
 
 /// What waits for TCP connections.
@@ -140,25 +145,39 @@ class Fabric {
     std::uint16_t next_port = 1025;
   };
 
+  /// A copy of a datagram, for one host.
+  struct Copy {
+    Micros when;
+    Host* receiver;
+  };
+
   template <typename InUse>
   static bool ChoosePort(Host& host, std::uint16_t& port, InUse in_use);
-  BoundSink* FindSink(const Endpoint& local, const DatagramSink& sink);
-  [[nodiscard]] std::vector<Address> Receivers(const Endpoint& from, const Endpoint& to,
-                                               const SendOptions& options) const;
-  void Deliver(Address receiver, const Endpoint& from, const Endpoint& to,
-               const std::string& bytes);
+  static BoundSink* FindSink(Host& host, std::uint16_t port, const DatagramSink& sink);
+  void FindReceivers(const Endpoint& from, const Endpoint& to, const SendOptions& options);
+  /// Decides what becomes of a datagram on its way to one host.
+  void Forward(Frame& frame, Address receiver, Host& host);
+  /// Puts the copies on their way.
+  void Dispatch(const Frame& frame);
+  void Deliver(Host& receiver, const Endpoint& from, const Endpoint& to, const Payload& bytes);
 
   World& world_;
   std::map<Address, Host> hosts_;
   std::map<std::string, Address, std::less<>> names_;
   LinkProfile default_link_;
-  std::map<std::pair<Address, Address>, std::unique_ptr<Link>> links_;
-  std::set<std::pair<Address, Address>> special_links_;  ///< that keep the profile they were given
+  std::unordered_map<std::uint64_t, std::unique_ptr<Link>> links_;  ///< by Way()
+  std::set<std::uint64_t> special_links_;  ///< that keep the profile they were given
   std::vector<StreamFault> faults_;
   std::vector<std::weak_ptr<TcpConnection>> connections_;
   DatagramFilter filter_;
   bool capturing_ = false;
   std::vector<Frame> frames_;
+
+  // Of the datagram that is being sent or delivered; kept because their memory is used again.
+  std::vector<std::pair<Address, Host*>> receivers_;
+  std::vector<Copy> copies_;
+  std::vector<Micros> arrivals_;
+  std::vector<DatagramSink*> asked_;
 };
 
 }  // namespace sim

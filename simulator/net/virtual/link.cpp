@@ -51,23 +51,29 @@ Micros Link::Travel(Micros departure) {
 }
 
 std::vector<Micros> Link::Datagram(Micros now, std::size_t bytes) {
+  std::vector<Micros> arrivals;
+  Datagram(now, bytes, arrivals);
+  return arrivals;
+}
+
+void Link::Datagram(Micros now, std::size_t bytes, std::vector<Micros>& arrivals) {
+  arrivals.clear();
   bytes += kDatagramHeaders;
   if (profile_.queue_bytes > 0 && profile_.bytes_per_second > 0 && free_at_ > now) {
     const auto waiting =
         static_cast<std::uint64_t>((free_at_ - now).count()) * profile_.bytes_per_second / 1000000;
-    if (waiting + bytes > profile_.queue_bytes) return {};
+    if (waiting + bytes > profile_.queue_bytes) return;
   }
   const Micros departure = Depart(now, bytes);
-  if (Lost()) return {};
+  if (Lost()) return;
   Micros arrival = Travel(departure);
   if (Chance(profile_.reorder)) {
     arrival += profile_.reorder_delay;
   } else {
     arrival = last_arrival_ = std::max(arrival, last_arrival_);
   }
-  std::vector<Micros> arrivals = {arrival};
+  arrivals.push_back(arrival);
   if (Chance(profile_.duplicate)) arrivals.push_back(std::max(Travel(departure), arrival));
-  return arrivals;
 }
 
 Micros Link::Segment(Micros now, std::size_t bytes) {

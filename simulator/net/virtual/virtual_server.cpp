@@ -231,8 +231,8 @@ void VirtualPort::Leave(Address group) {
   network_.fabric().Leave(local_, *this, group);
 }
 
-void VirtualPort::Arrived(const Endpoint& from, std::string_view bytes) {
-  on_datagram_(*this, from, bytes);
+void VirtualPort::Arrived(const Endpoint& from, const Payload& bytes) {
+  on_datagram_(*this, from, *bytes);
 }
 
 }  // namespace sim

@@ -168,7 +168,7 @@ class VirtualPort : private DatagramSink {
   [[nodiscard]] VirtualNetwork& network() { return network_; }
 
  private:
-  void Arrived(const Endpoint& from, std::string_view bytes) override;
+  void Arrived(const Endpoint& from, const Payload& bytes) override;
 
   VirtualNetwork network_;
   Endpoint local_;

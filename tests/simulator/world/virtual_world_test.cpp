@@ -352,9 +352,10 @@ TEST_F(VirtualWorldTest, HundredsOfThreadsShareAWorld) {
 }
 
 /// Several threads that sleep, signal, wait, compete and end by chance, and what was traced.
-std::vector<std::string> RunByChance(std::uint64_t seed) {
+std::vector<std::string> RunByChance(std::uint64_t seed,
+                                     sim::ThreadKind kind = sim::ThreadKind::kHost) {
   const test::TemporaryFolder folder;
-  const auto chance_world = sim::World::MakeVirtual(seed);
+  const auto chance_world = sim::World::MakeVirtual(seed, kind);
   sim::Device machine(*chance_world, sim::Profile{}, folder.path());
   std::vector<std::string> lines;
   machine.trace().SetSink([&](std::string_view line) { lines.emplace_back(line); });
@@ -403,6 +404,12 @@ TEST(VirtualWorldSeeds, EqualSeedsGiveEqualRuns) {
   EXPECT_GT(first.size(), 100U);
   EXPECT_EQ(first, RunByChance(7));
   EXPECT_NE(first, RunByChance(8));
+}
+
+TEST(VirtualWorldSeeds, LightThreadsGiveTheSameRun) {
+  for (const std::uint64_t seed : {7U, 8U, 9U}) {
+    EXPECT_EQ(RunByChance(seed), RunByChance(seed, sim::ThreadKind::kLight)) << seed;
+  }
 }
 
 TEST(VirtualWorldSeeds, ChanceIsEven) {
