@@ -24,6 +24,9 @@ constexpr std::make_index_sequence<1> kOneBlock;
 
 enum class Direction : bool { kEncipher, kDecipher };
 
+/// Half a block, 32 bits, in a whole register: its bytes become table indices without more ado.
+using Half = std::size_t;
+
 std::uint32_t Load(const std::uint8_t* bytes) noexcept {
   return static_cast<std::uint32_t>(bytes[0]) | static_cast<std::uint32_t>(bytes[1]) << 8 |
          static_cast<std::uint32_t>(bytes[2]) << 16 | static_cast<std::uint32_t>(bytes[3]) << 24;
@@ -46,8 +49,8 @@ std::uint32_t Subkey(const Schedule& schedule, std::size_t at) noexcept {
 /// that stand beside each other do not wait for each other.
 template <std::size_t... kLane>
 [[gnu::always_inline]] inline void Round(const Schedule& schedule, std::uint32_t subkey,
-                                         std::uint32_t (&half)[sizeof...(kLane)],
-                                         std::uint32_t (&other)[sizeof...(kLane)],
+                                         Half (&half)[sizeof...(kLane)],
+                                         Half (&other)[sizeof...(kLane)],
                                          std::index_sequence<kLane...> /*lanes*/) noexcept {
   const auto& boxes = schedule.boxes;
   std::uint32_t mixed[sizeof...(kLane)];
@@ -55,7 +58,8 @@ template <std::size_t... kLane>
   ((mixed[kLane] = boxes[0][half[kLane] >> 24]), ...);
   ((mixed[kLane] += boxes[1][half[kLane] >> 16 & 0xFF]), ...);
   ((mixed[kLane] ^= boxes[2][half[kLane] >> 8 & 0xFF]), ...);
-  ((other[kLane] ^= mixed[kLane] + boxes[3][half[kLane] & 0xFF]), ...);
+  ((mixed[kLane] += boxes[3][half[kLane] & 0xFF]), ...);
+  ((other[kLane] ^= mixed[kLane]), ...);
 }
 
 /// Takes the blocks kLane... of `from` through the rounds side by side. All are read before the
@@ -63,16 +67,16 @@ template <std::size_t... kLane>
 template <Direction kDirection, std::size_t... kLane>
 void Transform(const Schedule& schedule, const std::uint8_t* from, std::uint8_t* to,
                std::index_sequence<kLane...> lanes) noexcept {
-  std::uint32_t left[] = {Load(from + kLane * kBlock)...};
-  std::uint32_t right[] = {Load(from + kLane * kBlock + 4)...};
+  Half left[] = {Load(from + kLane * kBlock)...};
+  Half right[] = {Load(from + kLane * kBlock + 4)...};
   for (std::size_t round = 0; round < kRounds; round += 2) {
     Round(schedule, Subkey<kDirection>(schedule, round), left, right, lanes);
     Round(schedule, Subkey<kDirection>(schedule, round + 1), right, left, lanes);
   }
-  const std::uint32_t last = Subkey<kDirection>(schedule, kRounds);
-  const std::uint32_t behind_last = Subkey<kDirection>(schedule, kRounds + 1);
-  (Store(to + kLane * kBlock, right[kLane] ^ behind_last), ...);
-  (Store(to + kLane * kBlock + 4, left[kLane] ^ last), ...);
+  const Half last = Subkey<kDirection>(schedule, kRounds);
+  const Half behind_last = Subkey<kDirection>(schedule, kRounds + 1);
+  (Store(to + kLane * kBlock, static_cast<std::uint32_t>(right[kLane] ^ behind_last)), ...);
+  (Store(to + kLane * kBlock + 4, static_cast<std::uint32_t>(left[kLane] ^ last)), ...);
 }
 
 /// Takes `blocks` blocks, kLanes at a time, and the rest with half as many lanes.
