@@ -106,9 +106,12 @@ bool File::WriteWithRebalance(const void* data, std::uint32_t length) noexcept {
 }
 
 bool File::Seek(std::uint32_t offset) noexcept {
+  // Alone the distance is signed; the upper half makes it a number of 64 bits.
+  LONG upper = 0;
+  const bool needs_upper = offset > INT32_MAX;
   SetLastError(0);  // the failure value is also a position: only the error tells them apart
-  const DWORD position =
-      SetFilePointer(file_.get(), static_cast<LONG>(offset), nullptr, FILE_BEGIN);
+  const DWORD position = SetFilePointer(file_.get(), static_cast<LONG>(offset),
+                                        needs_upper ? &upper : nullptr, FILE_BEGIN);
   return Note(position != INVALID_SET_FILE_POINTER || GetLastError() == 0);
 }
 

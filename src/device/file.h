@@ -20,7 +20,7 @@ enum class TimeKind : std::uint8_t { kCreation, kLastAccess, kLastWrite };
 /// Names are 8-bit texts of at most 259 characters; a longer one is refused, never cut. Nothing
 /// here logs: callers do. An object belongs to one thread at a time. It is about 1.5 KiB large,
 /// comes from the local heap when made with `new`, and closes what it holds when it is destroyed.
-/// Files are at most 2 GiB - 1 long.
+/// Files are at most 4 GiB - 1 long.
 ///
 /// A file of another kind (one kept in memory by a driver) derives from this class and replaces the
 /// operations on data.
@@ -53,7 +53,7 @@ class File : public OnLocalHeap {
   virtual bool Read(void* buffer, std::uint32_t length, std::uint32_t* read) noexcept;
   /// Writes all of `data`, making room in a full object store (see WriteWithRebalance).
   virtual bool Write(const void* data, std::uint32_t length) noexcept;
-  /// @param offset  from the beginning, below 2 GiB
+  /// @param offset  from the beginning; may lie behind the end
   virtual bool Seek(std::uint32_t offset) noexcept;
   virtual bool Flush() noexcept;
   /// @param size  receives the open file's length in bytes

@@ -20,4 +20,14 @@ enum class SocketWait : std::uint8_t {
 /// @param timeout_ms  0: without limit
 SocketWait WaitForSocket(SOCKET socket, SocketUse use, std::uint32_t timeout_ms) noexcept;
 
+/// Which of two sockets can be read.
+struct ReadySockets {
+  bool first = false;
+  bool second = false;
+};
+
+/// Waits until one of two sockets can be read. Neither after the time-out and on a failure.
+/// @param timeout_ms  0: without limit
+ReadySockets WaitForEither(SOCKET first, SOCKET second, std::uint32_t timeout_ms) noexcept;
+
 }  // namespace device

@@ -102,8 +102,8 @@ class FrameLink {
  private:
   bool Take(const Datagram& datagram, const FileInHand& file, Frame& frame) noexcept;
   bool IsForUs(const Datagram& datagram, const FileInHand& file, const Frame& frame) noexcept;
-  bool JoinOnOwnSocket(std::uint32_t address, std::uint16_t port) noexcept;
-  bool SendBytes() noexcept;
+  bool JoinOnOwnSocket() noexcept;
+  bool SendBuffer() noexcept;
 
   UdpNetwork network_;
   UdpEndpoint public_;

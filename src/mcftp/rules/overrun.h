@@ -41,7 +41,7 @@ class OverrunWatch {
  private:
   std::uint32_t grace_blocks_;
   float threshold_;
-  std::uint32_t window_start_;
+  std::uint64_t window_start_;
   std::uint16_t recorded_block_ = 0;
   bool short_ = false;
 };

@@ -3,27 +3,14 @@
 #include <cstring>
 #include <string_view>
 
+#include "device/deadline.h"
 #include "device/socket_wait.h"
 
 namespace mcftp {
 namespace {
 
-/// The largest UDP payload, with room for the zero behind it.
-constexpr std::uint32_t kBufferSize = 65536;
-constexpr int kMaxDropped = 1024;
-
-AddressText Dotted(std::uint32_t address) noexcept {
-  in_addr wrapped = {};
-  wrapped.s_addr = address;
-  AddressText text;
-  if (const char* dotted = inet_ntoa(wrapped)) text.Assign(dotted);
-  return text;
-}
-
-bool WaitUntilReadable(SOCKET socket, std::uint32_t timeout_ms) noexcept {
-  return device::WaitForSocket(socket, device::SocketUse::kRead, timeout_ms) ==
-         device::SocketWait::kReady;
-}
+/// More than the largest UDP payload.
+constexpr std::uint32_t kMaxDatagram = 65535;
 
 }  // namespace
 
@@ -31,6 +18,14 @@ std::uint32_t ParseAddress(const char* text) noexcept {
   // The device reads an empty text, and one blank, as 0.0.0.0.
   const std::string_view dots = base::View(text);
   return dots.empty() || dots == " " ? INADDR_NONE : inet_addr(text);
+}
+
+AddressText ToText(std::uint32_t address) noexcept {
+  in_addr wrapped = {};
+  wrapped.s_addr = address;
+  AddressText text;
+  if (const char* dotted = inet_ntoa(wrapped)) text.Assign(dotted);
+  return text;
 }
 
 bool SocketLibrary::Start() noexcept {
@@ -104,7 +99,7 @@ std::uint16_t UdpEndpoint::port() const noexcept {
   return ntohs(address_.sin_port);
 }
 AddressText UdpEndpoint::address_text() const noexcept {
-  return Dotted(address_.sin_addr.s_addr);
+  return ToText(address_.sin_addr.s_addr);
 }
 
 bool UdpEndpoint::SendTo(const UdpEndpoint& target, const void* bytes,
@@ -133,45 +128,72 @@ void UdpNetwork::LearnOwnIdentity() noexcept {
 }
 
 AddressText UdpNetwork::own_address_text() const noexcept {
-  return Dotted(own_address_);
+  return ToText(own_address_);
 }
 
-Datagram UdpNetwork::Receive(const UdpEndpoint& endpoint, std::uint32_t timeout_ms) noexcept {
-  if (!buffer_) buffer_ = device::LocalBlock<std::uint8_t>::Allocate(kBufferSize);
-  if (!buffer_ || !endpoint.is_open()) return {};
-  for (int dropped = 0; dropped < kMaxDropped; ++dropped) {
-    if (!WaitUntilReadable(endpoint.handle(), timeout_ms)) return {};
-    Datagram datagram;
-    const int length = TakeDatagram(endpoint, datagram.sender);
-    if (length < 0) return {};
-    const bool own = own_address_ != 0 && datagram.sender.sin_addr.s_addr == own_address_;
-    if (length == 0 || own) continue;
-    buffer_[static_cast<std::size_t>(length)] = 0;
-    datagram.bytes = buffer_.get();
-    datagram.length = static_cast<std::uint32_t>(length);
-    return datagram;
+Datagram UdpNetwork::Receive(const UdpEndpoint& endpoint, const UdpEndpoint* other,
+                             std::uint32_t timeout_ms) noexcept {
+  if (!buffer_) {
+    buffer_ = device::LocalBlock<std::uint8_t>::Allocate(kMaxDatagram + kSpareBytes);
   }
+  if (!buffer_ || !endpoint.is_open()) return {};
+  device::Deadline deadline(timeout_ms);
+  std::uint32_t left_ms = timeout_ms;
+  do {
+    const UdpEndpoint* const readable = AwaitReadable(endpoint, other, left_ms);
+    if (readable == nullptr) return {};
+    Datagram datagram;
+    const int length = TakeDatagram(*readable, datagram.sender);
+    if (length < 0) return {};
+    if (length > 0 && !IsOwn(datagram.sender)) {
+      std::memset(&buffer_[static_cast<std::size_t>(length)], 0, kSpareBytes);
+      datagram.bytes = buffer_.get();
+      datagram.length = static_cast<std::uint32_t>(length);
+      return datagram;
+    }
+    if (length > 0) deadline = device::Deadline(timeout_ms);
+  } while (deadline.HasLeft(left_ms));
   return {};
+}
+
+bool UdpNetwork::IsOwn(const sockaddr_in& sender) const noexcept {
+  return own_address_ != 0 && sender.sin_addr.s_addr == own_address_;
+}
+
+const UdpEndpoint* UdpNetwork::AwaitReadable(const UdpEndpoint& endpoint, const UdpEndpoint* other,
+                                             std::uint32_t timeout_ms) noexcept {
+  if (other == nullptr || !other->is_open()) {
+    const auto outcome =
+        device::WaitForSocket(endpoint.handle(), device::SocketUse::kRead, timeout_ms);
+    return outcome == device::SocketWait::kReady ? &endpoint : nullptr;
+  }
+  const device::ReadySockets ready =
+      device::WaitForEither(endpoint.handle(), other->handle(), timeout_ms);
+  const bool take_other = ready.second && (other_is_next_ || !ready.first);
+  if (!ready.first && !ready.second) return nullptr;
+  other_is_next_ = !take_other;
+  return take_other ? other : &endpoint;
 }
 
 int UdpNetwork::TakeDatagram(const UdpEndpoint& endpoint, sockaddr_in& sender) noexcept {
   ULONG pending = 0;
   if (ioctlsocket(endpoint.handle(), FIONREAD, &pending) != 0) return -1;
-  // Readable with nothing pending is an empty datagram, an error left behind by an earlier send, or
-  // nothing after all. Either of the first two has to be taken or the socket would stay readable
-  // for ever; the third must not block.
+  // Readable with nothing pending is an empty datagram, the answer that an earlier one found no
+  // receiver, or nothing after all. Either of the first two has to be taken or the socket would
+  // stay readable for ever; the third must not block.
   ULONG no_waiting = pending == 0 ? 1 : 0;
   if (no_waiting != 0) ioctlsocket(endpoint.handle(), static_cast<LONG>(FIONBIO), &no_waiting);
   int sender_size = sizeof sender;
   // The number pending may be that of several datagrams, but one call takes one.
   const int length = recvfrom(endpoint.handle(), reinterpret_cast<char*>(buffer_.get()),
-                              static_cast<int>(kBufferSize - 1), 0,
+                              static_cast<int>(kMaxDatagram), 0,
                               reinterpret_cast<sockaddr*>(&sender), &sender_size);
+  const auto error = length < 0 ? static_cast<int>(GetLastError()) : 0;
   if (no_waiting != 0) {
     ULONG waiting = 0;
     ioctlsocket(endpoint.handle(), static_cast<LONG>(FIONBIO), &waiting);
   }
-  return length;
+  return error == WSAECONNRESET || error == WSAEWOULDBLOCK ? 0 : length;
 }
 
 }  // namespace mcftp

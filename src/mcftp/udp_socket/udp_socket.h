@@ -18,6 +18,9 @@ using AddressText = base::FixedText<16>;
 /// address. "255.255.255.255" is not accepted either, because its number is INADDR_NONE.
 [[nodiscard]] std::uint32_t ParseAddress(const char* text) noexcept;
 
+/// Dotted text of an address in network order.
+[[nodiscard]] AddressText ToText(std::uint32_t address) noexcept;
+
 /// A reference to Windows Sockets 1.1: started for as long as somebody holds one.
 class SocketLibrary {
  public:
@@ -92,7 +95,7 @@ class UdpEndpoint {
 
 /// A received datagram: bytes in the network object's own buffer, valid until its next Receive.
 struct Datagram {
-  const std::uint8_t* bytes = nullptr;  ///< null: nothing was received
+  std::uint8_t* bytes = nullptr;  ///< null: nothing was received; a cipher may work in place
   std::uint32_t length = 0;
   sockaddr_in sender = {};
 
@@ -118,26 +121,42 @@ class UdpNetwork {
   [[nodiscard]] std::uint32_t own_address() const noexcept { return own_address_; }
   [[nodiscard]] AddressText own_address_text() const noexcept;
 
-  /// Waits for a datagram on `endpoint`'s socket. Empty datagrams, and those whose sender is the
-  /// host's own address, are dropped, and the wait begins anew: so a client never hears its own
-  /// multicast frames. After 1,024 dropped ones in a row nothing is returned.
+  /// Bytes behind the longest datagram that belong to the buffer, too: ciphers work in blocks.
+  static constexpr std::uint32_t kSpareBytes = 8;
+
+  /// Waits for a datagram on `endpoint`'s socket. Empty datagrams are dropped and use up the wait.
+  /// So is the report that an earlier datagram found no receiver. Datagrams from the host's own
+  /// address are dropped, and the wait begins anew: so a client never hears its own multicast
+  /// frames.
   ///
   /// @param timeout_ms  0 waits without limit
-  /// @return nothing after the time-out and on any failure. The datagram is followed by a zero in
-  ///   memory.
-  [[nodiscard]] Datagram Receive(const UdpEndpoint& endpoint, std::uint32_t timeout_ms) noexcept;
+  /// @return nothing after the time-out and on any failure. The datagram is followed by zeros in
+  ///   memory, kSpareBytes of them at most.
+  [[nodiscard]] Datagram Receive(const UdpEndpoint& endpoint, std::uint32_t timeout_ms) noexcept {
+    return Receive(endpoint, nullptr, timeout_ms);
+  }
+
+  /// The same on two sockets at once: when both have something to give, they take turns.
+  /// @param other  may be null or closed
+  [[nodiscard]] Datagram Receive(const UdpEndpoint& endpoint, const UdpEndpoint* other,
+                                 std::uint32_t timeout_ms) noexcept;
 
  private:
   void LearnOwnIdentity() noexcept;
-  /// Takes what made the socket readable. @return its length, 0 for an empty datagram, -1 when
-  ///   there is none.
+  /// @return the endpoint that can be read, null for neither.
+  const UdpEndpoint* AwaitReadable(const UdpEndpoint& endpoint, const UdpEndpoint* other,
+                                   std::uint32_t timeout_ms) noexcept;
+  /// Takes what made the socket readable. @return its length, 0 when there was nothing to it, -1
+  ///   for a failure.
   int TakeDatagram(const UdpEndpoint& endpoint, sockaddr_in& sender) noexcept;
+  [[nodiscard]] bool IsOwn(const sockaddr_in& sender) const noexcept;
 
   SocketLibrary library_;
   std::uint32_t own_address_ = 0;  ///< network order; 0 filters nothing
   base::FixedText<128> host_name_;
   base::FixedText<256> full_name_;
   device::LocalBlock<std::uint8_t> buffer_;  ///< made by the first Receive
+  bool other_is_next_ = false;               ///< of two sockets
 };
 
 }  // namespace mcftp

@@ -106,7 +106,15 @@ TEST_F(FileTest, SeeksFromTheBeginningAndKnowsItsSize) {
   std::uint32_t read = 0;
   EXPECT_TRUE(file_.Read(&letter, 1, &read));
   EXPECT_EQ(letter, 'f');
-  EXPECT_FALSE(file_.Seek(0x80000000U)) << "files end below 2 GiB";
+}
+
+TEST_F(FileTest, SeeksBeyondTwoGib) {
+  ASSERT_TRUE(file_.OpenForWriting("\\a.txt", false, 0));
+
+  EXPECT_TRUE(file_.Seek(0x7FFFFFFFU));
+  EXPECT_TRUE(file_.Seek(0x80000000U));
+  EXPECT_TRUE(file_.Seek(4294770690U));
+  EXPECT_EQ(file_.last_error(), 0U);
 }
 
 TEST_F(FileTest, FailsInEveryOperationOnAClosedFile) {

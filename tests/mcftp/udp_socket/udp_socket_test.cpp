@@ -224,13 +224,68 @@ TEST_F(UdpSocketTest, FiltersNothingWhileTheOwnAddressIsUnknown) {
   EXPECT_TRUE(unknowing.Receive(endpoint_, 1000));
 }
 
-TEST_F(UdpSocketTest, StopsAfterManyDroppedDatagramsInARow) {
+TEST_F(UdpSocketTest, AFloodOfEmptyDatagramsUsesUpTheWaitAndNoMore) {
   OpenOnPort();
-  for (int i = 0; i < 2000; ++i) SendAfter(milliseconds(1), "");
-  SendAfter(milliseconds(2), "hello");
-  Sleep(10);
+  for (int i = 0; i < 3000; ++i) SendAfter(milliseconds(i), "");
 
-  EXPECT_EQ(Receive(1000), "<nothing>") << "a flood does not hold the caller";
+  EXPECT_EQ(Receive(2000), "<nothing>") << "a flood does not hold the caller";
+  EXPECT_NEAR(static_cast<double>(Now().count()), 2000, 2);
+  EXPECT_EQ(Receive(2000), "<nothing>");
+  EXPECT_NEAR(static_cast<double>(Now().count()), 4000, 4);
+}
+
+TEST_F(UdpSocketTest, TheHostsOwnDatagramsRenewTheWait) {
+  OpenOnPort();
+  ASSERT_TRUE(endpoint_.JoinGroup("239.1.2.3"));
+  UdpEndpoint group;
+  group.SetAddress(mcftp::ParseAddress("239.1.2.3"));
+  group.SetPort(kPort);
+  sim::VirtualPort self(world(), {kDevice, 0}, nullptr);
+  network().At(milliseconds(900), [&] { self.Send({kGroup, kPort}, "own"); });
+  SendAfter(milliseconds(1800), "hello");
+
+  EXPECT_EQ(Receive(1000), "hello");
+}
+
+TEST_F(UdpSocketTest, GoesOnWaitingWhenAnEarlierDatagramFoundNoReceiver) {
+  OpenOnPort();
+  SendAfter(milliseconds(10), "one");
+  SendAfter(milliseconds(20), "two");
+  device().faults().Add({"recvfrom", 1, 1, WSAECONNRESET});
+
+  EXPECT_EQ(Receive(1000), "one");
+  EXPECT_EQ(Receive(1000), "two");
+}
+
+TEST_F(UdpSocketTest, ListensOnTwoSocketsAtOnce) {
+  OpenOnPort();
+  UdpEndpoint other;
+  ASSERT_TRUE(other.Create());
+  ASSERT_TRUE(other.Bind(kPort + 1));
+  const auto receive = [&](std::uint32_t timeout_ms) {
+    const Datagram datagram = network_.Receive(endpoint_, &other, timeout_ms);
+    if (!datagram) return std::string("<nothing>");
+    return std::string(reinterpret_cast<const char*>(datagram.bytes), datagram.length);
+  };
+  network().At(milliseconds(10), [&] { server_.Send({kDevice, kPort + 1}, "other"); });
+  SendAfter(milliseconds(20), "first");
+  EXPECT_EQ(receive(1000), "other");
+  EXPECT_EQ(receive(1000), "first");
+  EXPECT_EQ(receive(1000), "<nothing>");
+
+  for (int i = 0; i < 3; ++i) {
+    SendAfter(milliseconds(1), "first");
+    network().At(world().now() + milliseconds(1), [&] {
+      server_.Send({kDevice, kPort + 1}, "other");
+    });
+  }
+  Sleep(10);
+  std::string order;
+  for (int i = 0; i < 6; ++i) order += receive(1000)[0];
+  EXPECT_EQ(order, "ofofof") << "they take turns";
+  other.Close();
+  SendAfter(milliseconds(1), "first");
+  EXPECT_EQ(receive(1000), "first") << "one alone does as well";
 }
 
 TEST_F(UdpSocketTest, ReturnsNothingWhenACallFails) {
