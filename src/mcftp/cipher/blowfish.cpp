@@ -27,6 +27,8 @@ enum class Direction : bool { kEncipher, kDecipher };
 /// Half a block, 32 bits, in a whole register: its bytes become table indices without more ado.
 using Half = std::size_t;
 
+// KEPT ODDITY: the halves of a block are little-endian in memory, where the published cipher has
+// them big-endian. Clients and servers in the field have it so.
 std::uint32_t Load(const std::uint8_t* bytes) noexcept {
   return static_cast<std::uint32_t>(bytes[0]) | static_cast<std::uint32_t>(bytes[1]) << 8 |
          static_cast<std::uint32_t>(bytes[2]) << 16 | static_cast<std::uint32_t>(bytes[3]) << 24;

@@ -20,14 +20,15 @@ inline constexpr char kErrorTexts[9][64] = {
     "Transfer should be terminated due to option negotiation",
 };
 
-/// The message of an error code; "Undefined" for a code outside the table, which never indexes it.
+/// The message of an error code (kOverrunCode brings its own); "Undefined" for a code outside the
+/// table, which never indexes it.
 [[nodiscard]] constexpr const char* ErrorText(std::uint16_t code) noexcept {
   constexpr std::size_t kCodes = sizeof(kErrorTexts) / sizeof(kErrorTexts[0]);
   return kErrorTexts[code < kCodes ? code : 0];
 }
 
-/// Transfer modes, then names of options. The binary frames carry these values in fixed fields; the
-/// words stand here for whoever has to speak of them.
+/// KEPT ODDITY: transfer modes and names of options that no frame carries; the binary frames have
+/// fixed fields instead.
 inline constexpr char kVocabulary[9][16] = {
     "netascii", "octet",     "mail",      "blksize",    "tsize",
     "timeout",  "multicast", "timestamp", "attributes",
