@@ -91,7 +91,10 @@ struct MulticastOptions {
 
   /// Where the run's state is kept, so that a server started again goes on; empty: nowhere.
   std::filesystem::path session_file;
-  /// Decides the transfer identifiers; 0: taken from the system.
+  /// The transfer identifier of the first file, counted up from there; 0: chosen at random for
+  /// each, as it should be wherever frames of an earlier run may still be about.
+  std::uint32_t first_transfer_id = 0;
+  /// Decides what is random; 0: taken from the system.
   std::uint64_t seed = 0;
 };
 

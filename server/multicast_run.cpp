@@ -116,6 +116,9 @@ void MulticastRun::Body::Start(const Peer& own, Micros now) {
 }
 
 std::uint32_t MulticastRun::Body::NewTransferId() {
+  if (options_.first_transfer_id != 0) {
+    return options_.first_transfer_id + static_cast<std::uint32_t>(figures_.files.size());
+  }
   for (;;) {
     const auto id = static_cast<std::uint32_t>(random_());
     if (id != 0 && transfer_ids_.insert(id).second) return id;

@@ -169,10 +169,10 @@ void Closing::OnTime(Micros now) {
            device->closing == State::kUncertain ? "does not say whether it has the last block"
                                                 : "does not answer at the end of the file",
            now);
-    } else if (stage_ == Stage::kGuard && device->closing == State::kReady) {
-      guard_due = true;
     } else {
+      // Its role may have been taken back by a frame that was late.
       Ask(*device, now);
+      guard_due = guard_due || stage_ == Stage::kGuard;
     }
   }
   if (guard_due) to_send_ = log_.guard();

@@ -7,13 +7,14 @@ namespace {
 
 using mcftp::Role;
 
-constexpr Micros kLeastBound = std::chrono::milliseconds(2);
+constexpr Micros kLeastBound = std::chrono::milliseconds(4);
 /// So many gaps named one after the other are taken for the middle of a long gap.
 constexpr std::uint32_t kRun = 4;
 constexpr std::uint32_t kMostAhead = 16;
 /// A device that is the only one of its run holds nobody back.
 constexpr double kPatienceWithOne = 10;
 constexpr std::uint64_t kFreeRepairs = 64;
+constexpr std::uint32_t kQuickTries = 4;
 
 }  // namespace
 
@@ -99,10 +100,13 @@ void Repair::OnNak(Device& device, std::uint32_t block, Micros now) {
 }
 
 void Repair::Advance(Device& device, std::uint32_t block, Micros now) {
-  if (device.sends == 1) device.round_trip.Add(now - log_.sent_at(device.position));
+  // Only the block can have brought the answer, if it went out once and was not asked after.
+  if (device.sends == 1 && device.asked_at < log_.sent_at(device.position)) {
+    device.round_trip.Add(now - log_.sent_at(device.position));
+  }
   device.run = block == device.position + 1 ? device.run + 1 : 0;
   device.position = block;
-  device.sends = 0;
+  device.sends = block <= device.ahead ? 1 : 0;
 }
 
 // ---- blocks ----
@@ -110,7 +114,9 @@ void Repair::Advance(Device& device, std::uint32_t block, Micros now) {
 Micros Repair::Bound(const Device& device) const {
   const Micros most = desk_.options().nak_wait;
   if (!device.round_trip.known()) return most;
-  return std::clamp(device.round_trip.Bound(), kLeastBound, most);
+  // Twice the round trip: a queue on the way grows while we send.
+  const Micros bound = std::max(device.round_trip.Bound(), 2 * device.round_trip.smoothed());
+  return std::clamp(bound, kLeastBound, most);
 }
 
 /// Whether the block that the device has named is missing for certain, and not only under way.
@@ -201,7 +207,9 @@ Micros Repair::AskAt(const Device& device) const {
   if (IsLacking(device)) return Micros::max();  // it is our turn
   Micros since = std::max(device.asked_at, device.named_at);
   if (device.position > 0) since = std::max(since, log_.sent_at(device.position));
-  const unsigned doublings = std::min(device.tries, 8U);
+  // The first few questions follow each other quickly: it is more likely that one was lost than
+  // that the device is gone.
+  const unsigned doublings = std::clamp(device.tries, kQuickTries, kQuickTries + 8) - kQuickTries;
   return since + std::min(Bound(device) * (1U << doublings), desk_.options().nak_wait);
 }
 

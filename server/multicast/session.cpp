@@ -120,14 +120,28 @@ bool MulticastSession::AnnouncedEnough(Micros now) const {
     return true;
   }
   if (asked == 0 || asked < start.minimum) return false;
-  if (start.expected > 0 && asked >= start.expected) return true;
+  if (start.expected > 0 && asked >= start.expected) return now >= AnsweredAt();
   const bool quiet = last_join_ <= last_copy_;
   return (start.expected == 0 || plan_.begins_when_quiet) && minimal && quiet;
 }
 
+/// When every device that has asked must have its answer: who has not asks again. The first blocks
+/// would go past it. A single device says so itself when it is made master.
+Micros MulticastSession::AnsweredAt() const {
+  if (devices_.size() <= 1) return last_join_;
+  return last_request_ + options_.oack_wait + options_.oack_wait / 8;
+}
+
 std::optional<Micros> MulticastSession::AnnouncingEnds() const {
-  if (plan_.start.longest_wait.count() == 0) return copy_at_;
-  return std::min(copy_at_, figures_.began + plan_.start.longest_wait);
+  Micros ends = copy_at_;
+  if (plan_.start.longest_wait.count() > 0) {
+    ends = std::min(ends, figures_.began + plan_.start.longest_wait);
+  }
+  const std::size_t enough = std::max(plan_.start.expected, plan_.start.minimum);
+  if (block_count() > 0 && plan_.start.expected > 0 && devices_.size() >= enough) {
+    ends = std::min(ends, AnsweredAt());
+  }
+  return ends;
 }
 
 void MulticastSession::StartNow(Micros now) {
@@ -301,6 +315,7 @@ bool MulticastSession::OnRequest(const Peer& from, const mcftp::ReadRequest& req
     return true;
   }
   if (request.file_name != plan_.file->device_path) return false;
+  last_request_ = now;
   Device* known = Find(from);
   const bool open = figures_.phase == FilePhase::kAnnounced ||
                     (transfer_ != nullptr && transfer_->takes_devices());

@@ -73,6 +73,7 @@ class MulticastSession final : private TransferDesk {
 
   void Announce(Micros now);
   [[nodiscard]] bool AnnouncedEnough(Micros now) const;
+  [[nodiscard]] Micros AnsweredAt() const;
   [[nodiscard]] std::optional<Micros> AnnouncingEnds() const;
   void BeginTransfer(Micros now);
   void EndTransfer(Micros now);
@@ -107,6 +108,7 @@ class MulticastSession final : private TransferDesk {
   Micros copy_at_{0};    ///< when the next announcement is due
   Micros last_copy_{0};  ///< when the latest went out
   Micros last_join_{0};
+  Micros last_request_{0};  ///< also of a device that asks again
   bool start_now_ = false;
   Micros lingers_until_{0};
   bool farewell_ = false;   ///< the last block goes out once more
