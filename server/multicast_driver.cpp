@@ -69,6 +69,7 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
   Peer local_;
   MulticastSocketFigures figures_;
   std::function<void()> ended_;
+  std::function<void(const Peer&, const Peer&, std::string_view)> tap_;
   const Outgoing* kept_ = nullptr;  ///< what did not fit the socket's buffer
   bool full_ = false;               ///< waiting for room
   bool listening_ = false;          ///< waiting for a datagram
@@ -100,6 +101,7 @@ void MulticastDriver::Socket::Open(const MulticastSocketOptions& options) {
   socket_.set_option(asio::socket_base::receive_buffer_size(kReceiveBuffer), error);
   socket_.non_blocking(true);
   local_ = ToPeer(socket_.local_endpoint());
+  tap_ = options.tap;
 }
 
 /// @return false when the system has chosen the public port
@@ -146,7 +148,10 @@ bool MulticastDriver::Socket::Receive() {
     const std::size_t size = socket_.receive_from(asio::buffer(buffer_), from, 0, error);
     if (error == asio::error::would_block || error == asio::error::try_again) return false;
     // Anything else is a device's system that refused a datagram: its datagrams count, that not.
-    if (!error) run_.OnDatagram(ToPeer(from), {buffer_.data(), size}, NowMicros());
+    if (error) continue;
+    const std::string_view bytes(buffer_.data(), size);
+    if (tap_) tap_(ToPeer(from), local_, bytes);
+    run_.OnDatagram(ToPeer(from), bytes, NowMicros());
   }
   return true;
 }
@@ -164,6 +169,7 @@ MulticastDriver::Socket::Sending MulticastDriver::Socket::Send() {
       return Sending::kFull;
     }
     if (error) ++figures_.send_errors;
+    if (!error && tap_) tap_(local_, kept_->to, kept_->bytes);
     kept_ = nullptr;
   }
   return Sending::kMore;

@@ -5,6 +5,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <string_view>
 
 #include "server/multicast_run.h"
 #include "server/peer.h"
@@ -22,6 +23,8 @@ struct MulticastSocketOptions {
   std::uint16_t port = 0;  ///< 0: any free one but the public port
   int ttl = 1;             ///< networks that datagrams to a group may cross
   bool loop_back = false;  ///< this machine hears what it sends to a group: for tests on it
+  /// Sees every datagram that comes and goes, in that order; may be empty.
+  std::function<void(const Peer& from, const Peer& to, std::string_view bytes)> tap;
 };
 
 struct MulticastSocketFigures {

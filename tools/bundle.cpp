@@ -59,11 +59,30 @@ std::uint32_t AttributeNamed(const std::string& name) {
                 "use read-only, hidden, system, archive");
 }
 
+bool Matches(const std::string& pattern, const std::string& relative) {
+  return ::fnmatch(pattern.c_str(), relative.c_str(), 0) == 0;
+}
+
 std::uint32_t AttributesOf(const std::string& relative, const BundleOptions& options) {
   for (const auto& [pattern, names] : options.attributes) {
-    if (::fnmatch(pattern.c_str(), relative.c_str(), 0) == 0) return ParseAttributes(names);
+    if (Matches(pattern, relative)) return ParseAttributes(names);
   }
   return 0;
+}
+
+std::string MasksOf(const std::string& relative, const BundleOptions& options) {
+  for (const auto& [pattern, masks] : options.file_masks) {
+    if (Matches(pattern, relative)) return masks;
+  }
+  return options.masks;
+}
+
+/// An empty file is listed with a CRC that no check meets: HTTP brings it anyway.
+bool GoesByMulticast(const InputFile& from, std::uint64_t size, const BundleOptions& options) {
+  if (!options.multicast || size == 0) return false;
+  return std::none_of(
+      options.http_only.begin(), options.http_only.end(),
+      [&from](const std::string& pattern) { return Matches(pattern, from.relative); });
 }
 
 std::string OnDevice(const std::string& folder, std::string relative) {
@@ -112,13 +131,16 @@ Bundle Plan(const std::vector<InputFile>& input, const BundleOptions& options) {
   bundle.list.source = options.name + ".lst";
   bundle.list.destination = "\\Orvenix\\" + bundle.list.source;
   bundle.list.masks = options.masks;
+  bundle.list.by_multicast = options.multicast.has_value();
+  bundle.multicast = options.multicast;
   CheckBundleFile(bundle.list, "--name");
   for (const InputFile& from : input) {
     BundleFile file;
     file.source = options.name + "/" + from.relative;
     file.destination = OnDevice(options.destination, from.relative);
-    file.masks = options.masks;
+    file.masks = MasksOf(from.relative, options);
     file.size = fs::file_size(from.path);
+    file.by_multicast = GoesByMulticast(from, file.size, options);
     file.attributes = AttributesOf(from.relative, options);
     CheckBundleFile(file, from.path.string());
     bundle.total_size += file.size;
@@ -135,13 +157,35 @@ nlohmann::ordered_json ToJson(const BundleFile& file) {
                               {"crc32", file.crc32},
                               {"size", file.size}};
   if (file.attributes != 0) json["attributes"] = file.attributes;
+  if (file.by_multicast) json["multicast"] = true;
   return json;
+}
+
+nlohmann::ordered_json ToJson(const MulticastSetup& setup) {
+  return {{"group", setup.group},
+          {"port", setup.port},
+          {"private_group", setup.private_group},
+          {"block_size", setup.block_size},
+          {"device_text", setup.device_text},
+          {"encrypt", setup.encrypt}};
+}
+
+MulticastSetup SetupFromJson(const nlohmann::json& json) {
+  MulticastSetup setup;
+  json.at("group").get_to(setup.group);
+  json.at("port").get_to(setup.port);
+  json.at("private_group").get_to(setup.private_group);
+  json.at("block_size").get_to(setup.block_size);
+  setup.device_text = json.value("device_text", "");
+  setup.encrypt = json.value("encrypt", false);
+  return setup;
 }
 
 std::string FormatManifest(const Bundle& bundle) {
   nlohmann::ordered_json json{{"format", kFormatName},           {"name", bundle.name},
                               {"address", bundle.address},       {"port", bundle.port},
                               {"total_size", bundle.total_size}, {"list", ToJson(bundle.list)}};
+  if (bundle.multicast) json["multicast"] = ToJson(*bundle.multicast);
   json["files"] = nlohmann::ordered_json::array();
   for (const BundleFile& file : bundle.files) json["files"].push_back(ToJson(file));
   return json.dump(2) + "\n";
@@ -155,6 +199,7 @@ BundleFile FileFromJson(const nlohmann::json& json) {
   json.at("crc32").get_to(file.crc32);
   json.at("size").get_to(file.size);
   file.attributes = json.value("attributes", 0U);
+  file.by_multicast = json.value("multicast", false);
   return file;
 }
 
@@ -203,6 +248,15 @@ void Fill(const fs::path& beside, const std::vector<InputFile>& input, const Bun
   WriteWholeFile(beside / kBundleManifest, FormatManifest(bundle));
 }
 
+void AddMulticast(JobGroup& upgrade, const MulticastSetup& setup) {
+  JobGroup& transfer = upgrade.AddGroup("MultiCast");
+  transfer.AddField("MulticastIP", setup.group);
+  transfer.AddField("UDPPort", std::to_string(setup.port));
+  transfer.AddField("UDPBlockSize", std::to_string(setup.block_size));
+  // What counts: the fields above are only kept.
+  upgrade.AddGroup("MulticastClient").AddField("Parameters", ClientParameters(setup));
+}
+
 /// The volume that a path on the device lies on, as the space check names it.
 std::string VolumeOf(const std::string& destination) {
   for (const char* volume : {"\\Flash File Store", "\\SDMMC Disk", "\\Storage Card", "\\SD Card"}) {
@@ -241,6 +295,7 @@ std::string FormatBundleJob(const Bundle& bundle, const BundleOptions& options) 
   http.AddField("IPAddress", bundle.address);
   http.AddField("HTTPPort", std::to_string(bundle.port));
   http.AddField("BaseURL", "http://" + bundle.address);
+  if (bundle.multicast) AddMulticast(upgrade, *bundle.multicast);
   if (!options.begin_text.empty() || !options.end_text.empty()) {
     JobGroup& reason = upgrade.AddGroup("AlternateRTWReason");
     reason.AddField("BeginText", options.begin_text);
@@ -260,6 +315,21 @@ std::string FormatBundleJob(const Bundle& bundle, const BundleOptions& options) 
   list.AddField("CRC", std::to_string(bundle.list.crc32));
   list.AddField("MCTMask", bundle.list.masks);
   return FormatJob(job);
+}
+
+std::vector<BundleFile> AnnouncedFiles(const Bundle& bundle) {
+  std::vector<BundleFile> announced;
+  for (const BundleFile& file : bundle.files) {
+    if (file.by_multicast) announced.push_back(file);
+  }
+  const auto depth = [](const BundleFile& file) {
+    return std::count(file.destination.begin(), file.destination.end(), '\\');
+  };
+  std::stable_sort(
+      announced.begin(), announced.end(),
+      [&depth](const BundleFile& a, const BundleFile& b) { return depth(a) < depth(b); });
+  if (bundle.list.by_multicast) announced.insert(announced.begin(), bundle.list);
+  return announced;
 }
 
 std::uint32_t ParseAttributes(const std::string& names) {
@@ -309,6 +379,7 @@ Bundle ReadBundle(const fs::path& folder) {
     json.at("port").get_to(bundle.port);
     json.at("total_size").get_to(bundle.total_size);
     bundle.list = FileFromJson(json.at("list"));
+    if (json.contains("multicast")) bundle.multicast = SetupFromJson(json.at("multicast"));
     for (const auto& entry : json.at("files")) bundle.files.push_back(FileFromJson(entry));
     return bundle;
   } catch (const nlohmann::json::exception& error) {

@@ -3,9 +3,12 @@
 
 #include <cstdint>
 #include <filesystem>
+#include <optional>
 #include <string>
 #include <utility>
 #include <vector>
+
+#include "tools/multicast_setup.h"
 
 namespace tools {
 
@@ -26,6 +29,11 @@ struct BundleOptions {
   std::uint16_t syslog_port = 514;
   /// Attributes by file name pattern, for example {"*.ini", "hidden"}; the first that matches.
   std::vector<std::pair<std::string, std::string>> attributes;
+  /// Device patterns by file name pattern, instead of `masks`; the first that matches.
+  std::vector<std::pair<std::string, std::string>> file_masks;
+
+  std::optional<MulticastSetup> multicast;  ///< none: every file goes by HTTP
+  std::vector<std::string> http_only;       ///< name patterns of files that no group gets
 };
 
 /// One file of a bundle, as the list file, the server and the device know it.
@@ -36,6 +44,7 @@ struct BundleFile {
   std::uint32_t crc32 = 0;
   std::uint64_t size = 0;
   std::uint32_t attributes = 0;  ///< 0: the server's usual ones
+  bool by_multicast = false;     ///< announced to the group; HTTP repairs what is lost
 };
 
 struct Bundle {
@@ -45,6 +54,7 @@ struct Bundle {
   BundleFile list;  ///< the list file itself
   std::vector<BundleFile> files;
   std::uint64_t total_size = 0;  ///< of the files, without the list
+  std::optional<MulticastSetup> multicast;
 };
 
 /// The names inside a bundle's folder.
@@ -71,6 +81,10 @@ Bundle MakeBundle(const BundleOptions& options);
 /// a file whose CRC is 0, as that of every empty file is, gets 1 instead. No check can succeed then
 /// and the file is fetched in every run, where the server's own CRC decides.
 [[nodiscard]] std::uint32_t ListedCrc(const BundleFile& file);
+
+/// The files that go to the group, the list file first, folders before what lies in them: a device
+/// makes the last folder of a path, but none above it.
+[[nodiscard]] std::vector<BundleFile> AnnouncedFiles(const Bundle& bundle);
 
 /// The job that makes a device fetch and check the bundle.
 [[nodiscard]] std::string FormatBundleJob(const Bundle& bundle, const BundleOptions& options);

@@ -62,6 +62,27 @@ void CheckLength(const std::string& option, const std::string& text, std::size_t
   }
 }
 
+void CheckMasks(const std::string& option, const std::string& masks) {
+  if (masks.find_first_of(",\r\n") != std::string::npos ||
+      masks.find_first_not_of(" ;") == std::string::npos) {
+    throw Failure(ExitCode::kUsage, option, "\"" + masks + "\" is no list of patterns",
+                  "divide patterns with blanks or semicolons; '*' takes every device");
+  }
+  CheckLength(option, masks, kMaxMaskField);
+}
+
+void CheckMulticast(const BundleOptions& options) {
+  CheckMulticastSetup(*options.multicast);
+  const bool for_all =
+      options.masks == "*" && std::all_of(options.file_masks.begin(), options.file_masks.end(),
+                                          [](const auto& masks) { return masks.second == "*"; });
+  if (for_all || !options.multicast->device_text.empty()) return;
+  throw Failure(ExitCode::kUsage, "--device-text",
+                "is missing, and some files are for certain devices only",
+                "give the beginning of the devices' configuration text: without it they take every "
+                "file that is announced");
+}
+
 }  // namespace
 
 void CheckBundleOptions(const BundleOptions& options) {
@@ -90,20 +111,17 @@ void CheckBundleOptions(const BundleOptions& options) {
     usage("--dest", "\"" + options.destination + "\" is no folder on a device",
           "begin with a backslash, as in '\\Application'");
   }
-  if (options.masks.find_first_of(",\r\n") != std::string::npos ||
-      options.masks.find_first_not_of(" ;") == std::string::npos) {
-    usage("--masks", "\"" + options.masks + "\" is no list of patterns",
-          "divide patterns with blanks or semicolons; '*' takes every device");
-  }
+  CheckMasks("--masks", options.masks);
+  for (const auto& [pattern, masks] : options.file_masks) CheckMasks("--masks-for", masks);
   in_addr parsed{};
   if (!options.syslog_address.empty() &&
       ::inet_pton(AF_INET, options.syslog_address.c_str(), &parsed) != 1) {
     usage("--syslog", "\"" + options.syslog_address + "\" is no IPv4 address",
           "give it as 10.0.0.2:514");
   }
-  CheckLength("--masks", options.masks, kMaxMaskField);
   CheckLength("--begin-text", options.begin_text, kMaxMessage);
   CheckLength("--end-text", options.end_text, kMaxMessage);
+  if (options.multicast) CheckMulticast(options);
 }
 
 void CheckBundleFile(const BundleFile& file, const std::string& from) {

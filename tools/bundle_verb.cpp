@@ -1,6 +1,7 @@
 #include <iostream>
 #include <memory>
 #include <nlohmann/json.hpp>
+#include <optional>
 
 #include "base/number.h"
 #include "tools/bundle.h"
@@ -16,6 +17,10 @@ struct MakeCommand {
   bool no_window = false;
   std::string syslog;
   std::vector<std::string> attributes;
+  std::vector<std::string> masks_for;
+  std::string multicast;
+  std::optional<std::string> private_group;
+  MulticastSetup setup;
   bool json = false;
 };
 
@@ -43,6 +48,46 @@ void Complete(MakeCommand& command) {
     static_cast<void>(ParseAttributes(names));
     command.options.attributes.emplace_back(pattern, names);
   }
+  for (const std::string& rule : command.masks_for) {
+    command.options.file_masks.push_back(SplitAt(rule, '='));
+  }
+  if (!command.multicast.empty()) {
+    MulticastSetup setup = ParseMulticastSetup(command.multicast);
+    if (command.private_group) setup.private_group = *command.private_group;
+    setup.block_size = command.setup.block_size;
+    setup.device_text = command.setup.device_text;
+    setup.encrypt = command.setup.encrypt;
+    command.options.multicast = setup;
+  }
+}
+
+void AddMulticastOptions(CLI::App& make, MakeCommand& command) {
+  CLI::Option* multicast = make.add_option(
+      "--multicast", command.multicast,
+      "GROUP:PORT where files are announced, for example 239.1.1.1:7000; without it all files go "
+      "by HTTP");
+  make.add_option("--private-group", command.private_group,
+                  "where their blocks go (default: the address after GROUP)")
+      ->needs(multicast);
+  make.add_option("--device-text", command.setup.device_text,
+                  "what devices compare masks with while they receive: the beginning of their "
+                  "configuration text, without blanks, '-' and '/'")
+      ->needs(multicast);
+  make.add_option("--block-size", command.setup.block_size, "bytes of a file in one datagram")
+      ->capture_default_str()
+      ->needs(multicast);
+  make.add_flag("--encrypt", command.setup.encrypt, "encipher what goes to the groups")
+      ->needs(multicast);
+  make.add_option("--http-only", command.options.http_only,
+                  "PATTERN of files that go by HTTP only; may be repeated")
+      ->allow_extra_args(false)
+      ->needs(multicast);
+}
+
+std::string AnnouncedText(const Bundle& bundle) {
+  if (!bundle.multicast) return "";
+  return ", " + std::to_string(AnnouncedFiles(bundle).size()) + " with the list announced on " +
+         bundle.multicast->group + ":" + std::to_string(bundle.multicast->port);
 }
 
 ExitCode Make(MakeCommand& command) {
@@ -55,14 +100,15 @@ ExitCode Make(MakeCommand& command) {
                                       {"job", (out / kBundleJob).string()},
                                       {"files", bundle.files.size()},
                                       {"bytes", bundle.total_size},
-                                      {"list_crc32", bundle.list.crc32}};
+                                      {"list_crc32", bundle.list.crc32},
+                                      {"announced", AnnouncedFiles(bundle).size()}};
     std::cout << json.dump() << std::endl;
     return ExitCode::kOk;
   }
   std::cout << bundle.files.size() << " files, " << FormatBytes(bundle.total_size) << ", for "
-            << bundle.address << ":" << bundle.port << "\n  serve it:  orvenix serve "
-            << out.string() << "\n  run it:    orvenix run " << (out / kBundleJob).string()
-            << " --device DIR" << std::endl;
+            << bundle.address << ":" << bundle.port << AnnouncedText(bundle)
+            << "\n  serve it:  orvenix serve " << out.string() << "\n  run it:    orvenix run "
+            << (out / kBundleJob).string() << " --device DIR" << std::endl;
   return ExitCode::kOk;
 }
 
@@ -90,15 +136,21 @@ void AddBundleVerb(CLI::App& app, Action& action) {
                    "PATTERN=LIST: attributes of the files that match, from read-only, hidden, "
                    "system, archive; may be repeated, the first that matches counts")
       ->allow_extra_args(false);
+  make->add_option("--masks-for", command->masks_for,
+                   "PATTERN=MASKS: other devices for the files that match; may be repeated, the "
+                   "first that matches counts")
+      ->allow_extra_args(false);
   make->add_option("--begin-text", options.begin_text, "what the device reports at the beginning");
   make->add_option("--end-text", options.end_text,
                    "what it reports at the end; needs a --begin-text");
   make->add_option("--syslog", command->syslog, "ADDRESS:PORT that the device logs to");
   make->add_flag("--no-window", command->no_window, "show no progress window on the device");
+  AddMulticastOptions(*make, *command);
   AddJsonOption(*make, command->json, "print what was made as one JSON object");
   make->footer(
       "Example:\n  orvenix bundle make ./files ./bundle --address 127.0.0.2 --port 8080 \\\n"
-      "      --dest '\\Application' --attributes '*.ini=read-only,archive'");
+      "      --dest '\\Application' --attributes '*.ini=read-only,archive' \\\n"
+      "      --multicast 239.1.1.1:7000 --device-text TQ52 --http-only '*.ini'");
   make->callback([command, &action] { action = [command] { return Make(*command); }; });
 }
 

@@ -4,12 +4,16 @@
 
 #include <chrono>
 #include <memory>
+#include <optional>
+#include <stdexcept>
 #include <thread>
 
 #include "device/device.h"
 #include "kernel/kernel.h"
 #include "library/management_queue.h"
+#include "net/network.h"
 #include "process/processes.h"
+#include "server/capture.h"
 #include "storage/storage.h"
 #include "text/names.h"
 #include "tools/configlet_library.h"
@@ -21,6 +25,7 @@
 #include "tools/job_file.h"
 #include "tools/job_walk.h"
 #include "tools/lint/lint.h"
+#include "tools/multicast_watch.h"
 #include "tools/run_view.h"
 #include "window/screen.h"
 #include "world/world.h"
@@ -77,6 +82,8 @@ class UpgradeRun {
     Outcome outcome;
     outcome.ended = WaitForEnd();
     configlet_.uninitialize();
+    device_->network().ListenToDatagrams({});
+    ShowMulticast();
     ShowProcesses();
     outcome.seconds = Seconds();
     outcome.check = CheckFiles(device_->storage(), job_, profile_.configuration);
@@ -114,6 +121,11 @@ class UpgradeRun {
   }
 
   void Watch() {
+    if (!options_.pcap.empty()) OpenCapture();
+    device_->network().ListenToDatagrams([this](const sim::SeenDatagram& datagram) {
+      multicast_.See(datagram);
+      if (capture_) Capture(datagram);
+    });
     device_->messages().Listen([this](const sim::QueuedMessage& message) {
       const std::string at = message.master.empty() ? "" : "@" + message.master;
       view_.ShowMessage({message.destination + at, message.text});
@@ -127,6 +139,22 @@ class UpgradeRun {
       std::string ignored;  // a screen that cannot be kept spoils no upgrade
       static_cast<void>(screen.SavePng(options_.device / kDeviceScreen, ignored));
     });
+  }
+
+  void OpenCapture() {
+    try {
+      capture_.emplace(options_.pcap);
+    } catch (const std::runtime_error& error) {
+      throw Failure(ExitCode::kCannotWrite, options_.pcap.string(), error.what(),
+                    "is the folder there and writable?");
+    }
+  }
+
+  void Capture(const sim::SeenDatagram& datagram) {
+    const auto now = std::chrono::system_clock::now().time_since_epoch();
+    const auto peer = [](const sim::Endpoint& at) { return server::Peer{at.address, at.port}; };
+    capture_->Add(std::chrono::duration_cast<server::Micros>(now), peer(datagram.from),
+                  peer(datagram.to), datagram.bytes);
   }
 
   void Walk() {
@@ -167,11 +195,17 @@ class UpgradeRun {
     return true;
   }
 
-  [[nodiscard]] bool WaitForEnd() const {
+  void ShowMulticast() {
+    for (const ReceptionEvent& event : multicast_.TakeEvents()) view_.ShowMulticast(event);
+    view_.ShowBlocks(multicast_.reception());
+  }
+
+  [[nodiscard]] bool WaitForEnd() {
     const Clock::time_point limit = Clock::now() + std::chrono::seconds(options_.timeout_s);
     while (!Ended()) {
       if (Clock::now() >= limit) return false;
       std::this_thread::sleep_for(kPoll);
+      ShowMulticast();
     }
     return true;
   }
@@ -212,6 +246,10 @@ class UpgradeRun {
                                  {"seconds", outcome.seconds},
                                  {"list_found", outcome.check.list_found},
                                  {"paints", device_->screen().finished_paints()}};
+    const ReceptionTotals received = multicast_.totals();
+    event["multicast"] = {
+        {"files", received.files}, {"blocks", received.blocks}, {"twice", received.twice}};
+    event["datagrams_lost"] = device_->network().datagrams_lost();
     event["files"] = nlohmann::ordered_json::array();
     std::size_t right = 0;
     for (const CheckedFile& file : outcome.check.files) {
@@ -246,7 +284,9 @@ class UpgradeRun {
   const sim::Profile profile_;
   const ConfigletLibrary configlet_;
   IcfgCallbacks callbacks_{};
-  RunView view_;  // the device's threads use it to their end
+  RunView view_;  // the device's threads use these three to their end
+  MulticastWatch multicast_;
+  std::optional<server::CaptureFile> capture_;
   std::unique_ptr<sim::World> world_;
   std::unique_ptr<sim::Device> device_;
   const Clock::time_point start_ = Clock::now();

@@ -14,6 +14,7 @@ struct RunOptions {
   std::filesystem::path library;  ///< the configlet; empty: the one that belongs to this program
   std::filesystem::path screens;  ///< folder for a picture of every paint; empty: none
   std::filesystem::path events;   ///< file that gets every event; empty: none
+  std::filesystem::path pcap;     ///< capture of the device's datagrams; empty: none
   std::uint32_t timeout_s = 1800;
   bool force = false;     ///< also a job that has errors
   bool callbacks = true;  ///< the host takes statuses itself; false: they go to the message queue

@@ -13,6 +13,8 @@ void AddRunVerb(CLI::App& app, Action& action) {
       ->required();
   run->add_option("--screens", options->screens, "save a picture of every paint in this folder");
   run->add_option("--events", options->events, "also write what --json prints to this file");
+  run->add_option("--pcap", options->pcap,
+                  "keep the device's datagrams in this file, for a packet viewer");
   run->add_option("--timeout", options->timeout_s, "seconds to wait for the end of the upgrade")
       ->capture_default_str();
   run->add_flag("--callbacks,!--no-callbacks", options->callbacks,

@@ -84,7 +84,11 @@ void RunView::Line(const std::string& text) {
 void RunView::Bars(const sim::ProgressView& view) {
   if (!view.overall || style_ == Style::kJson) return;
   std::string bars = "overall " + FormatBar(*view.overall, kBarWidth);
-  if (view.file) bars += "   file " + FormatBar(*view.file, kBarWidth);
+  if (!blocks_.empty()) {
+    bars += "   " + blocks_;
+  } else if (view.file) {
+    bars += "   file " + FormatBar(*view.file, kBarWidth);
+  }
   if (style_ == Style::kTerminal) {
     std::cout << kClearLine << bars << std::flush;
     bars_shown_ = true;
@@ -121,6 +125,30 @@ void RunView::ShowMessage(const Message& message) {
   event.update(MessageMembers(message));
   event["text"] = message.document;
   Tell(event);
+}
+
+void RunView::ShowMulticast(const ReceptionEvent& event) {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  if (is_over_) return;
+  Tell(ToJson(event));
+  if (style_ != Style::kJson) Line(ToLine(event));
+}
+
+void RunView::ShowBlocks(const Reception& state) {
+  const std::lock_guard<std::mutex> hold(mutex_);
+  if (is_over_) return;
+  const std::string blocks = state.under_way ? FormatBlocks(state) : "";
+  if (blocks == blocks_) return;
+  blocks_ = blocks;
+  if (state.under_way) {
+    Tell({{"event", "blocks"},
+          {"file", state.file},
+          {"role", NameOf(state.role)},
+          {"held", state.held},
+          {"blocks", state.blocks},
+          {"map", state.map}});
+  }
+  if (last_ && style_ == Style::kTerminal) Bars(*last_);
 }
 
 void RunView::EndUpgrade() {

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "tools/message_view.h"
+#include "tools/multicast_watch.h"
 #include "window/progress_view.h"
 
 namespace tools {
@@ -41,6 +42,9 @@ class RunView {
 
   void ShowProgress(const sim::ProgressView& view);
   void ShowMessage(const Message& message);
+  void ShowMulticast(const ReceptionEvent& event);
+  /// The block map of a file that comes by multicast; shown when it has changed.
+  void ShowBlocks(const Reception& state);
   /// Progress and messages that come from now on are not shown: threads of an upgrade that has not
   /// ended in time go on, and the last word is the program's.
   void EndUpgrade();
@@ -62,6 +66,7 @@ class RunView {
   std::ofstream record_;
   mutable std::mutex mutex_;
   std::optional<sim::ProgressView> last_;
+  std::string blocks_;  ///< beside the upper bar; empty: the lower bar stands there
   bool bars_shown_ = false;
   bool is_over_ = false;
 };

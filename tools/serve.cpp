@@ -7,6 +7,8 @@
 #include <asio/steady_timer.hpp>
 #include <csignal>
 #include <iostream>
+#include <memory>
+#include <optional>
 #include <system_error>
 
 #include "server/http_server.h"
@@ -15,6 +17,9 @@
 #include "tools/failure.h"
 #include "tools/file_text.h"
 #include "tools/lint/lint.h"
+#include "tools/multicast_table.h"
+#include "tools/serve_control.h"
+#include "tools/serve_multicast.h"
 
 namespace tools {
 namespace {
@@ -22,6 +27,7 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr std::chrono::milliseconds kRedraw{250};
+constexpr std::chrono::milliseconds kProgress{1000};
 constexpr std::size_t kTableRows = 30;
 
 /// What is to be served, and what its bundle says about where.
@@ -30,7 +36,7 @@ struct Source {
   fs::path job;  ///< of a bundle that has one
   std::string address = "127.0.0.1";
   std::uint16_t port = 8080;
-  std::vector<BundleFile> files;  ///< with attributes of their own
+  std::optional<Bundle> bundle;  ///< none: any folder of files
 };
 
 Source FindSource(const fs::path& named) {
@@ -49,15 +55,22 @@ Source FindSource(const fs::path& named) {
   Source source;
   source.root = folder;
   if (!fs::exists(folder / kBundleManifest)) return source;
-  const Bundle bundle = ReadBundle(folder);
+  source.bundle = ReadBundle(folder);
   source.root = folder / kBundleTree;
   if (fs::exists(folder / kBundleJob)) source.job = folder / kBundleJob;
-  source.address = bundle.address;
-  source.port = bundle.port;
-  for (const BundleFile& file : bundle.files) {
-    if (file.attributes != 0) source.files.push_back(file);
-  }
+  source.address = source.bundle->address;
+  source.port = source.bundle->port;
   return source;
+}
+
+/// Options that mean nothing here would only mislead.
+void RefuseIdleOptions(const ServeMulticast& multicast) {
+  if (multicast.expected == 0 && multicast.minimum == 0 && !multicast.start_now &&
+      multicast.rounds == 1 && multicast.session.empty() && multicast.pcap.empty()) {
+    return;
+  }
+  throw Failure(ExitCode::kUsage, "multicast", "the bundle is not made for it",
+                "make it with 'orvenix bundle make ... --multicast 239.1.1.1:7000'");
 }
 
 class ServeRun {
@@ -68,16 +81,18 @@ class ServeRun {
         site_(source_.root),
         signals_(loop_, SIGINT, SIGTERM),
         redraw_(loop_),
+        progress_(loop_),
         table_(!options.json && ::isatty(STDOUT_FILENO) == 1) {}
 
   ExitCode Run() {
-    for (const BundleFile& file : source_.files) site_.SetAttributes(file.source, file.attributes);
+    if (source_.bundle) SetAttributes(*source_.bundle);
     inventory_ = site_.Warm();
     if (!options_.force && !source_.job.empty()) RefuseBadJob();
     server::RaiseDescriptorLimit();
     ledger_.SetListener([this](const server::Event& event) { OnEvent(event); });
     Listen();
     Announce();
+    if (!options_.multicast.off) StartMulticast();
     signals_.async_wait([this](const asio::error_code& error, int) {
       if (!error) Stop();
     });
@@ -89,6 +104,12 @@ class ServeRun {
   }
 
  private:
+  void SetAttributes(const Bundle& bundle) {
+    for (const BundleFile& file : bundle.files) {
+      if (file.attributes != 0) site_.SetAttributes(file.source, file.attributes);
+    }
+  }
+
   /// After Warm(), so that no file is read twice for its checksum.
   void RefuseBadJob() {
     const std::string name = source_.job.string();
@@ -127,6 +148,64 @@ class ServeRun {
     }
   }
 
+  void StartMulticast() {
+    if (!source_.bundle || !source_.bundle->multicast) {
+      RefuseIdleOptions(options_.multicast);
+      return;
+    }
+    multicast_ = std::make_unique<MulticastService>(loop_, *source_.bundle, source_.root, address_,
+                                                    options_.multicast);
+    if (options_.json) {
+      Print(multicast_->HeadlineJson());
+    } else {
+      std::cout << multicast_->Headline() << std::endl;
+    }
+    control_ = std::make_unique<ServeControl>(
+        loop_, [this](const ServeCommand& command) { Obey(command); },
+        [this](const std::string& line) { Remark("no command: " + line); });
+    multicast_->Start([this](const server::MulticastEvent& event) { OnMulticast(event); });
+    ReportProgress();
+  }
+
+  void Obey(const ServeCommand& command) {
+    switch (command.kind) {
+      case ServeCommand::Kind::kRate: multicast_->SetRate(command.rate); break;
+      case ServeCommand::Kind::kFaster: multicast_->ChangeRate(true); break;
+      case ServeCommand::Kind::kSlower: multicast_->ChangeRate(false); break;
+      case ServeCommand::Kind::kStart: multicast_->StartNow(); return;
+    }
+    Remark("rate " + FormatRate(multicast_->figures().rate));
+  }
+
+  /// A line of the server's own; a table has its own place for what it says.
+  void Remark(const std::string& text) const {
+    if (options_.json) {
+      Print({{"event", "remark"}, {"text", text}});
+    } else if (!table_) {
+      std::cout << text << std::endl;
+    }
+  }
+
+  void OnMulticast(const server::MulticastEvent& event) {
+    if (options_.json) {
+      Print(ToJson(event, start_));
+    } else if (!table_) {
+      std::cout << ToLine(event, start_) << std::endl;
+    }
+  }
+
+  /// Where no table is shown: how far the file is that blocks are sent of.
+  void ReportProgress() {
+    if (table_) return;
+    const nlohmann::ordered_json progress = multicast_->Progress();
+    if (!progress.is_null() && options_.json) Print(progress);
+    if (!progress.is_null() && !options_.json) std::cout << multicast_->ProgressLine() << std::endl;
+    progress_.expires_after(kProgress);
+    progress_.async_wait([this](const asio::error_code& error) {
+      if (!error) ReportProgress();
+    });
+  }
+
   static void Print(const nlohmann::ordered_json& json) {
     std::cout << json.dump(-1, ' ', false, nlohmann::json::error_handler_t::replace) << std::endl;
   }
@@ -152,8 +231,12 @@ class ServeRun {
     std::cout << "\x1b[H\x1b[J"
               << "serving " << inventory_.files << " files at http://" << address_ << ":"
               << server_->port() << ", " << server_->figures().connections
-              << " connections (Ctrl-C ends it)\n\n"
-              << FormatTable(ledger_, kTableRows) << std::flush;
+              << " connections (Ctrl-C ends it)\n\n";
+    if (multicast_ != nullptr) {
+      std::cout << multicast_->Headline() << "; keys: + faster, - slower, s start now\n"
+                << multicast_->Table(kTableRows) << "\n";
+    }
+    std::cout << FormatTable(ledger_, kTableRows) << std::flush;
     redraw_.expires_after(kRedraw);
     redraw_.async_wait([this](const asio::error_code& error) {
       if (!error) Redraw();
@@ -163,27 +246,33 @@ class ServeRun {
   void Stop() {
     signals_.cancel();
     redraw_.cancel();
+    progress_.cancel();
     server_->Stop();
+    if (control_ != nullptr) control_->Stop();
+    if (multicast_ != nullptr) multicast_->Stop();
   }
 
   void WriteReport() {
     nlohmann::ordered_json devices = nlohmann::ordered_json::array();
     for (const auto& [key, device] : ledger_.devices()) devices.push_back(ToJson(device));
     const server::HttpServerFigures& figures = server_->figures();
-    const nlohmann::ordered_json report{{"event", "ended"},
-                                        {"seconds", Seconds()},
-                                        {"files", inventory_.files},
-                                        {"bytes", inventory_.bytes},
-                                        {"connections", figures.accepted},
-                                        {"most_connections", figures.most_connections},
-                                        {"turned_away", figures.turned_away},
-                                        {"bad_requests", ledger_.bad_requests()},
-                                        {"devices", devices}};
+    nlohmann::ordered_json report{{"event", "ended"},
+                                  {"seconds", Seconds()},
+                                  {"files", inventory_.files},
+                                  {"bytes", inventory_.bytes},
+                                  {"connections", figures.accepted},
+                                  {"most_connections", figures.most_connections},
+                                  {"turned_away", figures.turned_away},
+                                  {"bad_requests", ledger_.bad_requests()},
+                                  {"devices", devices}};
+    if (multicast_ != nullptr) report["multicast"] = ToJson(multicast_->figures());
     if (!options_.report.empty()) WriteWholeFile(options_.report, report.dump(2) + "\n");
     if (options_.json) Print(report);
     if (!options_.json) {
       std::cout << "ended: " << devices.size() << " devices, " << reports_ << " reports, "
                 << figures.most_connections << " connections at once at most" << std::endl;
+      if (multicast_ != nullptr) std::cout << FormatMulticastReport(multicast_->figures());
+      std::cout << std::flush;
     }
   }
 
@@ -198,10 +287,13 @@ class ServeRun {
   asio::io_context loop_;
   asio::signal_set signals_;
   asio::steady_timer redraw_;
+  asio::steady_timer progress_;
   const bool table_;
   const server::Time start_ = server::Now();
   server::Site::Inventory inventory_;
   std::unique_ptr<server::HttpServer> server_;
+  std::unique_ptr<MulticastService> multicast_;
+  std::unique_ptr<ServeControl> control_;
   std::string address_;
   std::uint64_t reports_ = 0;
   bool ending_ = false;

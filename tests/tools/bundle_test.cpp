@@ -155,6 +155,107 @@ TEST_F(BundleTest, IsReadAgainAsItWasMade) {
   EXPECT_EQ(read.files[1].attributes, 0U);
 }
 
+TEST_F(BundleTest, TellsServerAndDevicesTheSameOfAMulticast) {
+  scratch_.Write("in/a.txt", "12345");
+  BundleOptions options = Options();
+  options.multicast = ParseMulticastSetup("239.1.1.255:7001");
+  options.multicast->device_text = "TQ52";
+  options.multicast->block_size = 512;
+  options.multicast->encrypt = true;
+  MakeBundle(options);
+
+  const Job job = ReadJob(options.out / "job.xml");
+  const Bundle read = ReadBundle(options.out);
+
+  EXPECT_EQ(FindField(job, "MulticastClient", "Parameters"), "-A=239.1.1.255 -P=7001 -HV=TQ52");
+  EXPECT_EQ(FindField(job, "MultiCast", "MulticastIP"), "239.1.1.255");
+  EXPECT_EQ(FindField(job, "MultiCast", "UDPPort"), "7001");
+  EXPECT_EQ(FindField(job, "MultiCast", "UDPBlockSize"), "512");
+  ASSERT_TRUE(read.multicast);
+  EXPECT_EQ(read.multicast->group, "239.1.1.255");
+  EXPECT_EQ(read.multicast->private_group, "239.1.2.0") << "the next address";
+  EXPECT_EQ(read.multicast->port, 7001);
+  EXPECT_EQ(read.multicast->block_size, 512U);
+  EXPECT_EQ(read.multicast->device_text, "TQ52");
+  EXPECT_TRUE(read.multicast->encrypt);
+}
+
+TEST_F(BundleTest, SaysNothingOfMulticastUnlessItIsWanted) {
+  scratch_.Write("in/a.txt", "12345");
+  MakeBundle(Options());
+
+  EXPECT_FALSE(ReadBundle(Options().out).multicast);
+  EXPECT_THAT(Read("out/job.xml"), Not(HasSubstr("ulti")));
+  EXPECT_THAT(Read("out/bundle.json"), Not(HasSubstr("multicast")));
+}
+
+TEST_F(BundleTest, AnnouncesTheListFirstAndFoldersBeforeWhatLiesInThem) {
+  scratch_.Write("in/a/b/deep", "1");
+  scratch_.Write("in/a/file", "2");
+  scratch_.Write("in/top", "3");
+  scratch_.Write("in/empty", "");
+  scratch_.Write("in/only/by/http.ini", "4");
+  BundleOptions options = Options();
+  options.multicast = MulticastSetup{};
+  options.http_only = {"*.ini"};
+  MakeBundle(options);
+
+  std::vector<std::string> announced;
+  for (const BundleFile& file : AnnouncedFiles(ReadBundle(options.out))) {
+    announced.push_back(file.destination);
+  }
+
+  EXPECT_THAT(announced,
+              ::testing::ElementsAre("\\Orvenix\\bundle.lst", "\\Application\\top",
+                                     "\\Application\\a\\file", "\\Application\\a\\b\\deep"));
+}
+
+TEST_F(BundleTest, GivesFilesMasksOfTheirOwn) {
+  scratch_.Write("in/all", "1");
+  scratch_.Write("in/other/some", "2");
+  BundleOptions options = Options();
+  options.file_masks = {{"other/*", "MV?? MR41"}, {"*", "TQ5*"}};
+  MakeBundle(options);
+
+  EXPECT_THAT(Read("out/tree/bundle.lst"), HasSubstr("bundle/all,\\Application\\all,TQ5*,"));
+  EXPECT_THAT(Read("out/tree/bundle.lst"), HasSubstr("\\some,MV?? MR41,"));
+}
+
+TEST_F(BundleTest, RefusesAMulticastThatDevicesCouldNotFollow) {
+  scratch_.Write("in/a", "a");
+  const auto complaint = [this](auto change) {
+    BundleOptions options = Options();
+    options.multicast = MulticastSetup{};
+    change(options);
+    return Complaint(options, ExitCode::kUsage);
+  };
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->group = "10.0.0.1"; }),
+              HasSubstr("\"10.0.0.1\" is no multicast address"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->private_group = "239.1.1"; }),
+              HasSubstr("--private-group"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->private_group = "239.1.1.1"; }),
+              HasSubstr("is the group of the announcements"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->block_size = 65001; }),
+              HasSubstr("--block-size"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->device_text = "TQ52-A1"; }),
+              HasSubstr("holds a '-'"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->device_text = "TQ 52"; }),
+              HasSubstr("holds a ' '"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.multicast->device_text = std::string(64, 'x'); }),
+              HasSubstr("devices keep 63"));
+  EXPECT_THAT(complaint([](BundleOptions& o) { o.masks = "TQ5*"; }),
+              HasSubstr("some files are for certain devices only"));
+  EXPECT_THAT(complaint([](BundleOptions& o) {
+                o.file_masks = {{"*", "A,B"}};
+              }),
+              HasSubstr("--masks-for"));
+  for (const char* port : {"0", "65536", "many", "-1", "700000"}) {
+    EXPECT_THROW(static_cast<void>(ParseMulticastSetup(std::string("239.1.1.1:") + port)), Failure)
+        << port;
+  }
+  EXPECT_EQ(ParseMulticastSetup("239.1.1.1").port, 7000);
+}
+
 struct NameCase {
   std::string name;
   const char* complaint;

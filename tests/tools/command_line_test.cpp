@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 
+#include <filesystem>
 #include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
@@ -92,6 +93,13 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
       {"explain ./nowhere.log", ExitCode::kBadInput, "./nowhere.log: there is no such file"},
       {"explain errors.txt", ExitCode::kBadInput, "errors.txt: holds no line of this system"},
       {"serve . --address elsewhere", ExitCode::kCannotListen, "elsewhere:8080: "},
+      {"serve . --expect 3 --address 127.0.0.2 --port 0", ExitCode::kUsage,
+       "multicast: the bundle is not made for it; make it with 'orvenix bundle make"},
+      {"bundle make . out --device-text TQ52", ExitCode::kUsage, "--device-text requires"},
+      {"bundle make . out --multicast 10.1.1.1:7000", ExitCode::kUsage,
+       "--multicast: \"10.1.1.1\" is no multicast address"},
+      {"bundle make . out --multicast 239.1.1.1:0", ExitCode::kUsage, "\"0\" is no port"},
+      {"run nowhere.xml --device d --pcap no/folder", ExitCode::kBadInput, "nowhere.xml"},
   };
   for (const MistakeCase& c : kCases) {
     const Ended ended = Run(c.words);
@@ -122,6 +130,24 @@ TEST_F(CommandLineTest, MakesABundle) {
   EXPECT_EQ(json.at("files"), 1);
   EXPECT_EQ(json.at("bytes"), 5);
   EXPECT_EQ(ReadWholeFile(scratch_.path() / "out/tree/bundle/with blank.txt"), "12345");
+}
+
+TEST_F(CommandLineTest, RefusesAMulticastThatCannotWorkFromHere) {
+  scratch_.Write("files/a.txt", "12345");
+  ASSERT_EQ(Run("bundle make files out --multicast 239.1.1.1:7000").code, 0);
+  const std::string serve = "serve out --address 127.0.0.2 --port 0 ";
+
+  const Ended interface = Run(serve + "--interface wlan17");
+  EXPECT_EQ(interface.code, static_cast<int>(ExitCode::kCannotListen));
+  EXPECT_THAT(interface.errors, HasSubstr("no interface \"wlan17\"; choose one of 127.0.0.1 (lo)"));
+  const Ended rate = Run(serve + "--rate fast");
+  EXPECT_EQ(rate.code, static_cast<int>(ExitCode::kUsage));
+  EXPECT_THAT(rate.errors, HasSubstr("\"fast\" is no rate; give bits per second as 800k"));
+  scratch_.Write("out/tree/bundle/a.txt", "");
+  std::filesystem::remove(scratch_.path() / "out/tree/bundle/a.txt");
+  const Ended gone = Run(serve + "--force");
+  EXPECT_EQ(gone.code, static_cast<int>(ExitCode::kBadInput));
+  EXPECT_THAT(gone.errors, HasSubstr("a.txt: No such file or directory; make the bundle anew"));
 }
 
 TEST_F(CommandLineTest, ChecksABundleBeforeItIsSent) {

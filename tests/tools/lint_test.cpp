@@ -166,6 +166,35 @@ std::vector<LintCase> CasesOfTheDevice() {
   };
 }
 
+std::string Multicast(const std::string& parameters, const std::string& fields = "") {
+  return With(Group("MultiCast", fields) +
+              Group("MulticastClient", Field("Parameters", parameters)));
+}
+
+std::vector<LintCase> CasesOfMulticast() {
+  const std::string good = "-A=239.1.1.1 -P=7000 -HV=TQ52";
+  return {
+      {"multicast-parameters", Multicast(good + "-BE"), "-HV=TQ52-BE"},
+      {"multicast-text", Multicast(good + "-BE"), "behind -HV=TQ52 stands \"-BE\""},
+      {"multicast-text", Multicast(good + "/A1")},
+      {"multicast-text", Multicast(good + std::string(60, 'x')), "has 64 characters"},
+      {"multicast-group", Multicast("-P=7000 -HV=TQ52"), "there is no -A"},
+      {"multicast-group", Multicast("-A=10.0.0.2 -P=7000 -HV=TQ52"), "-A is \"10.0.0.2\""},
+      {"multicast-group", Multicast(" "), "there is no -A"},
+      {"multicast-port", Multicast("-A=239.1.1.1 -HV=TQ52"), "there is no -P"},
+      {"multicast-port", Multicast("-A=239.1.1.1 -P=0 -HV=TQ52"), "-P is \"0\""},
+      {"multicast-port", Multicast("-A=239.1.1.1 -P=70000 -HV=TQ52")},
+      {"multicast-option", Multicast(good + " -PORT=1"), "\"PORT=1\""},
+      {"multicast-option", Multicast(good + " -A"), "\"A\""},
+      {"multicast-option", Multicast(good + " -UX=1")},
+      {"multicast-no-text", Multicast("-A=239.1.1.1 -P=7000")},
+      {"multicast-status", Multicast(good + " -UA=127.0.0.1 -UP=5655")},
+      {"multicast-differs", Multicast(good, Field("MulticastIP", "239.1.1.9")), "239.1.1.9"},
+      {"multicast-differs", Multicast(good, Field("UDPPort", "7001")), "UDPPort is \"7001\""},
+      {"cut-text", Multicast(good + std::string(240, ' ')), "the device keeps 259"},
+  };
+}
+
 std::vector<LintCase> CasesOfFilesAndCleanup() {
   return {
       {"nothing-to-fetch", Upgrade(kServer + kStore)},
@@ -222,14 +251,15 @@ TEST(LintTest, FindsNothingInAJobWithoutAFault) {
           Cleanup("Delete", "\\old.txt") + Group("StopProcess", Field("Process", "Scanner.exe")) +
           Group("StartProcess", Field("Process", "\\Windows\\wceload.exe") +
                                     Field("Parameters", "/noui \\a.cab") + Field("Wait", "false")) +
-          Group("MulticastClient", Field("Parameters", "-UA=127.0.0.1 -up=5001 /HV=MR41")) +
+          Group("MulticastClient", Field("Parameters", "-A=239.1.1.1 -p=7000 /HV=MR41")) +
           Download("folder/a", "\\a.rename", "MR* TQ*")))),
       IsEmpty());
 }
 
 TEST(LintTest, FindsWhatEachRuleIsAbout) {
   std::set<std::string> seen;
-  for (const auto& cases : {CasesOfTheWalk(), CasesOfTheDevice(), CasesOfFilesAndCleanup()}) {
+  for (const auto& cases :
+       {CasesOfTheWalk(), CasesOfTheDevice(), CasesOfMulticast(), CasesOfFilesAndCleanup()}) {
     for (const LintCase& c : cases) {
       const Findings findings = LintText(c.job);
       EXPECT_THAT(Ids(findings), Contains(c.id)) << c.job;
@@ -244,7 +274,7 @@ TEST(LintTest, FindsWhatEachRuleIsAbout) {
   // The rules about the server's files have tests of their own, below.
   for (const char* id : {"list-missing", "list-crc", "list-shift", "list-zero-byte",
                          "list-field-long", "size-number", "file-missing", "file-crc", "file-size",
-                         "size-short", "size-reserve", "file-unlisted"}) {
+                         "size-short", "size-reserve", "file-unlisted", "multicast-folder"}) {
     seen.insert(id);
   }
   for (std::size_t i = 0; i < static_cast<std::size_t>(Rule::kCount); ++i) {
@@ -301,12 +331,22 @@ class LintServedTest : public ::testing::Test {
     return LintText(
         Upgrade(kServer + kStore +
                 Group("FileList", Field("Source", "bundle.lst") + Field("Dest", "\\bundle.lst") +
-                                      Field("CRC", crc.empty() ? right : crc))),
+                                      Field("CRC", crc.empty() ? right : crc)) +
+                job_),
         &site, unlisted);
   }
 
+  std::string job_;  ///< what is in the job besides
   ScratchFolder scratch_;
 };
+
+TEST(LintTest, TakesWhatBundlesSayOfMulticast) {
+  const std::string fields = Field("MulticastIP", "239.1.1.1") + Field("UDPPort", "7000");
+
+  EXPECT_THAT(Ids(LintText(Multicast("-A=239.1.1.1 -P=7000 -HV=TQ52", fields))), IsEmpty());
+  EXPECT_THAT(Ids(LintText(Multicast("/a=239.1.1.1-p=7000-hv=TQ52 -DA=10.0.0.1 -DP=514"))),
+              IsEmpty());
+}
 
 constexpr const char* kHello = "a.txt,\\a.txt,*,909783072,6\r\n";  // "hello\n"
 
@@ -336,6 +376,30 @@ TEST_F(LintServedTest, ComparesTheListWithWhatIsServed) {
               ElementsAre("size-short"));
   EXPECT_THAT(Ids(LintList("../a.txt,\\a,*,909783072,6\r\n")),
               ElementsAre("path-leading", "file-missing"));
+}
+
+TEST_F(LintServedTest, FollowsTheFoldersThatAMulticastMakes) {
+  scratch_.Write("a.txt", "hello\n");
+  job_ = Group("MulticastClient", Field("Parameters", "-A=239.1.1.1 -P=7000 -HV=TQ52"));
+  const auto line = [](const std::string& destination) {
+    return "a.txt," + destination + ",*,909783072,6\r\n";
+  };
+
+  EXPECT_THAT(Ids(LintList(line("\\New\\a") + line("\\Temp\\New\\a"))), ElementsAre("size-short"));
+  EXPECT_THAT(Ids(LintList(line("\\New\\sub\\a") + line("\\new\\a"))), ElementsAre("size-short"))
+      << "short paths come first";
+  const Findings deep = LintList(line("\\New\\sub\\a"));
+  EXPECT_THAT(Ids(deep), ElementsAre("multicast-folder"));
+  EXPECT_EQ(deep.all()[0].found, "\"\\New\\sub\\a\"");
+}
+
+TEST_F(LintServedTest, MissesTheTextOnlyWhereFilesAreForSomeDevices) {
+  scratch_.Write("a.txt", "hello\n");
+  job_ = Group("MulticastClient", Field("Parameters", "-A=239.1.1.1 -P=7000"));
+
+  EXPECT_THAT(Ids(LintList(kHello)), IsEmpty());
+  EXPECT_THAT(Ids(LintList("a.txt,\\a.txt,TQ5*,909783072,6\r\n")),
+              ElementsAre("multicast-no-text"));
 }
 
 TEST_F(LintServedTest, ReadsTheListAsTheDeviceDoes) {

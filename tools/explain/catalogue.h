@@ -81,5 +81,7 @@ struct TextRows {
 };
 /// Every text. Formats that are nothing but a text from elsewhere come last.
 [[nodiscard]] TextRows Texts();
+/// Texts of the multicast client, up to where they are made of numbers.
+[[nodiscard]] TextRows ClientTexts();
 
 }  // namespace tools

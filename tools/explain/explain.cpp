@@ -60,6 +60,9 @@ void ExplainText(const ExplainOptions& options) {
   TextMatch match = TextMatcher().Find(SplitStamp(options.what).message);
   if (match.row == nullptr) match = TextMatcher(true).Find(options.what);
   if (match.row == nullptr) {
+    match = TextMatcher(false, ClientTexts()).Find(SplitStamp(options.what).message);
+  }
+  if (match.row == nullptr) {
     throw Failure(ExitCode::kBadInput, options.what,
                   "is no file, no number and no text of the system",
                   "name a log file, a code, or a whole line of a log");

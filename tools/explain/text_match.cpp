@@ -56,8 +56,8 @@ bool HasShape(std::string_view text, std::string_view shape) {
 
 }  // namespace
 
-TextMatcher::TextMatcher(bool on_screen) {
-  for (const TextRow& row : Texts()) {
+TextMatcher::TextMatcher(bool on_screen, TextRows rows) {
+  for (const TextRow& row : rows) {
     if (row.on_screen != on_screen) continue;
     Pattern pattern = Compile(row);
     // What is nothing but a text from elsewhere matches every line and so tells nothing.

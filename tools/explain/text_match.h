@@ -23,7 +23,7 @@ struct TextMatch {
 /// text that begins like it, whatever the bytes.
 class TextMatcher {
  public:
-  explicit TextMatcher(bool on_screen = false);
+  explicit TextMatcher(bool on_screen = false, TextRows rows = Texts());
 
   /// @param line  without its line end
   [[nodiscard]] TextMatch Find(std::string_view line) const;

@@ -9,6 +9,7 @@
 #include "base/text.h"
 #include "server/site.h"
 #include "tools/lint/checks.h"
+#include "tools/lint/multicast_line.h"
 
 namespace tools {
 namespace {
@@ -77,6 +78,7 @@ class FilesCheck {
   void Downloads();
   void List();
   void Unlisted();
+  void Multicast();
 
  private:
   void Add(Rule rule, const std::string& where, std::string found) {
@@ -93,6 +95,7 @@ class FilesCheck {
   void ServedList(const std::string& text);
   bool Record(std::string_view line, const std::string& where);
   void Sizes();
+  void Folders();
 
   const JobCheck& check_;
   server::Site* const site_;
@@ -100,6 +103,7 @@ class FilesCheck {
   std::map<std::string, std::pair<std::string, std::string>> destinations_;
   std::set<std::string> asked_;  ///< paths on the server
   std::set<std::string> masks_;
+  std::vector<std::string> listed_;  ///< destinations of the list
   std::uint64_t listed_bytes_ = 0;
   bool sizes_known_ = true;
   bool has_ram_ = false;  ///< a requirement gives the RAM buffer its size
@@ -261,6 +265,7 @@ bool FilesCheck::Record(std::string_view line, const std::string& where) {
   }
   listed_bytes_ += base::LeadingNumber(file.size);
   masks_.insert(std::string(file.masks));
+  listed_.emplace_back(file.destination);
   Served(file);
   return true;
 }
@@ -324,6 +329,55 @@ void FilesCheck::List() {
   ServedList(ReadAll(*served));
 }
 
+/// Follows a device that makes folders as files are announced, those with the shortest paths first.
+void FilesCheck::Folders() {
+  const auto depth = [](const std::string& path) {
+    return std::count(path.begin(), path.end(), '\\');
+  };
+  std::stable_sort(listed_.begin(), listed_.end(),
+                   [&depth](const auto& a, const auto& b) { return depth(a) < depth(b); });
+  std::set<std::string> there = {"",
+                                 "\\windows",
+                                 "\\temp",
+                                 "\\program files",
+                                 "\\my documents",
+                                 "\\flash file store",
+                                 "\\sdmmc disk",
+                                 "\\storage card",
+                                 "\\sd card"};
+  const auto above = [](const std::string& path) {
+    return path.substr(0, std::min(path.rfind('\\'), path.size()));
+  };
+  std::string first;
+  std::size_t count = 0;
+  for (const std::string& file : listed_) {
+    const std::string folder = above(PathKey(file));
+    if (there.count(folder) == 0 && there.count(above(folder)) == 0) {
+      if (++count == 1) first = file;
+      continue;
+    }
+    there.insert(folder);
+  }
+  if (count == 0) return;
+  check_.Add(Rule::kMulticastFolder, check_.job.multicast_parameters.line,
+             Quoted(first) + (count == 1 ? "" : " and " + std::to_string(count - 1) + " more"));
+}
+
+void FilesCheck::Multicast() {
+  const Setting& parameters = check_.job.multicast_parameters;
+  if (parameters.text.empty()) return;
+  const MulticastLine line = ReadMulticastLine(parameters.text);
+  if (line.refused) return;
+  const bool for_some =
+      site_ == nullptr || std::any_of(masks_.begin(), masks_.end(),
+                                      [](const std::string& masks) { return masks != "*"; });
+  if (for_some && line.text.value_or("").empty()) {
+    check_.Add(Rule::kMulticastNoText, parameters.line,
+               "Parameters are " + Quoted(parameters.text));
+  }
+  Folders();
+}
+
 void FilesCheck::Unlisted() {
   constexpr std::size_t kNamed = 3;
   std::string names;
@@ -347,6 +401,7 @@ void CheckFiles(const JobCheck& check, server::Site* site, bool unlisted) {
   FilesCheck files(check, site);
   files.Downloads();
   files.List();
+  files.Multicast();
   if (site != nullptr && unlisted) files.Unlisted();
 }
 

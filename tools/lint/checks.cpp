@@ -253,17 +253,6 @@ void CheckStop(const JobCheck& check, const Setting& stop) {
   if (IsOneOf(PathKey(stop.text), kSystem)) check.Add(Rule::kStopSystem, stop.line, found);
 }
 
-/// Each option begins with one of five letters; anything else spoils the whole line.
-bool IsMulticastLine(std::string_view line) {
-  constexpr std::string_view kDividers = " /-";
-  for (std::size_t at = line.find_first_not_of(kDividers); at != std::string_view::npos;) {
-    if (!Contains("APUDHapudh", line.substr(at, 1))) return false;
-    at = line.find_first_of(kDividers, at);
-    if (at != std::string_view::npos) at = line.find_first_not_of(kDividers, at);
-  }
-  return true;
-}
-
 }  // namespace
 
 void CheckProcesses(const JobCheck& check) {
@@ -280,10 +269,6 @@ void CheckProcesses(const JobCheck& check) {
     }
   } else if (Contains(PathKey(job.program.text), "wceload.exe")) {
     check.Add(Rule::kInstallerCase, job.program.line, "Process is " + Quoted(job.program.text));
-  }
-  if (!IsMulticastLine(job.multicast_parameters.text)) {
-    check.Add(Rule::kMulticastParameters, job.multicast_parameters.line,
-              "Parameters are " + Quoted(job.multicast_parameters.text));
   }
 }
 

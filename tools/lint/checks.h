@@ -31,6 +31,7 @@ void CheckMessages(const JobCheck& check);
 void CheckServer(const JobCheck& check);
 void CheckCleanup(const JobCheck& check);
 void CheckProcesses(const JobCheck& check);
+void CheckMulticast(const JobCheck& check);
 
 /// The files that the job names itself, and those of its list file where the server is at hand.
 /// @param site      the served folder, or null

@@ -107,6 +107,14 @@ enum class Rule : std::uint8_t {
   kInstallerBlank,
   kInstallerCase,
   kMulticastParameters,
+  kMulticastGroup,
+  kMulticastPort,
+  kMulticastOption,
+  kMulticastText,
+  kMulticastNoText,
+  kMulticastStatus,
+  kMulticastDiffers,
+  kMulticastFolder,
   kCount,
 };
 

@@ -83,6 +83,7 @@ Findings LintJob(const Job& job, const std::string& name, server::Site* site, bo
     CheckFiles(check, site, unlisted);
     CheckCleanup(check);
     CheckProcesses(check);
+    CheckMulticast(check);
   }
   findings.Sort();
   return findings;

@@ -237,6 +237,31 @@ constexpr RuleRow kRules[] = {
     {Rule::kMulticastParameters, "multicast-parameters", kWarning,
      "refuses the whole line, runs no multicast and fetches everything by HTTP",
      "begin every option with A, P, U, D or H; blanks, / and - divide options"},
+    {Rule::kMulticastGroup, "multicast-group", kError,
+     "cannot join such a group, runs no multicast and fetches everything by HTTP",
+     "give -A= a multicast address, for example 239.1.1.1"},
+    {Rule::kMulticastPort, "multicast-port", kError,
+     "listens where nothing is announced, and goes on by HTTP after 300 s",
+     "give -P= the port of the group, from 1 to 65535"},
+    {Rule::kMulticastOption, "multicast-option", kWarning, "passes the option over",
+     "use -A=, -P=, -HV=, and -DA= with -DP= for a log by syslog"},
+    {Rule::kMulticastText, "multicast-text", kWarning,
+     "ends the text of -HV at a - or /, keeps 63 characters of it, and takes the rest for an "
+     "option",
+     "give the part of the configuration text in front of it"},
+    {Rule::kMulticastNoText, "multicast-no-text", kWarning,
+     "takes every file that is announced, those for other devices too",
+     "add -HV= with the beginning of the devices' configuration text"},
+    {Rule::kMulticastStatus, "multicast-status", kNote,
+     "adds -UA= and -UP= of its own behind them, which count", "leave -UA= and -UP= out"},
+    {Rule::kMulticastDiffers, "multicast-differs", kNote,
+     "uses the Parameters of \"MulticastClient\" alone; the fields of \"MultiCast\" are only "
+     "kept",
+     "make the two agree, or leave the fields out"},
+    {Rule::kMulticastFolder, "multicast-folder", kNote,
+     "makes the last folder of a path while it receives, but none above it; where that one is "
+     "missing the file comes by HTTP",
+     "none is needed; a small file in each folder on the way makes it"},
 };
 
 static_assert(std::size(kRules) == static_cast<std::size_t>(Rule::kCount));
