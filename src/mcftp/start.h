@@ -15,7 +15,7 @@ namespace mcftp {
 ///
 /// @param command_line  options as "-A=239.1.1.1 -P=7000 -UA=127.0.0.1 -UP=5655 -HV=TQ52": public
 ///   group and port, local user interface, remote debug (DA, DP), the device's MCT. Blanks, "/" and
-///   "-" separate them..
+///   "-" separate them.
 /// @param owner  who wants to know more; null for nobody. Its `stopped` is called before this
 ///   returns, if the client's thread ever ran.
 /// @return 0 when a client ran and stopped; -1 when the command line is null, empty or malformed,

@@ -2,7 +2,6 @@
 
 #include <netinet/in.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <ctime>
@@ -82,6 +81,7 @@ int PosixDatagram::Bind(const Endpoint& local) {
 
 int PosixDatagram::Connect(const Endpoint& peer) {
   peer_ = peer;
+  first_ = nullptr;
   return 0;
 }
 
@@ -126,31 +126,41 @@ void PosixDatagram::DropLost(Inbox& inbox) {
   }
 }
 
-bool PosixDatagram::Readable(Inbox& inbox) {
-  if (!inbox.file.open()) return false;
-  DropStrangers(inbox);
-  DropLost(inbox);
-  return (inbox.file.Poll(POLLIN) & POLLIN) != 0;
+/// A program looks, asks for the size and takes: that is one look at the files, not three.
+PosixDatagram::Inbox* PosixDatagram::FirstReadable() {
+  if (first_ == nullptr) first_ = FindFirstReadable();
+  return first_;
 }
 
 /// To the device it is one socket: of several files with something to read the one whose first
 /// datagram came first.
-PosixDatagram::Inbox* PosixDatagram::FirstReadable() {
-  std::vector<Inbox*> readable;
-  if (Readable(own_box_)) readable.push_back(&own_box_);
-  for (auto& [group, inbox] : groups_) {
-    if (Readable(inbox)) readable.push_back(&inbox);
+PosixDatagram::Inbox* PosixDatagram::FindFirstReadable() {
+  polled_.clear();
+  inboxes_.clear();
+  const auto add = [&](Inbox& inbox) {
+    if (!inbox.file.open()) return;
+    DropStrangers(inbox);
+    DropLost(inbox);
+    polled_.push_back({inbox.file.get(), POLLIN, 0});
+    inboxes_.push_back(&inbox);
+  };
+  add(own_box_);
+  for (auto& [group, inbox] : groups_) add(inbox);
+  const int readable = poll(polled_.data(), polled_.size(), 0);
+  Inbox* first = nullptr;
+  for (std::size_t i = 0; readable > 0 && i < polled_.size(); ++i) {
+    if ((polled_[i].revents & POLLIN) == 0) continue;
+    const bool earlier =
+        first == nullptr || FirstArrival(inboxes_[i]->file) < FirstArrival(first->file);
+    if (earlier) first = inboxes_[i];
   }
-  if (readable.empty()) return nullptr;
-  if (readable.size() == 1) return readable.front();
-  return *std::min_element(readable.begin(), readable.end(), [](const Inbox* a, const Inbox* b) {
-    return FirstArrival(a->file) < FirstArrival(b->file);
-  });
+  return first;
 }
 
 int PosixDatagram::Receive(char* bytes, std::size_t size, bool peek, Received& result) {
   Inbox* inbox = FirstReadable();
   if (inbox == nullptr) return WSAEWOULDBLOCK;
+  if (!peek) first_ = nullptr;
   HostAddress from;
   const int flags = MSG_TRUNC | (peek ? MSG_PEEK : 0);
   const ssize_t length = recvfrom(inbox->file.get(), bytes, size, flags, from.get(), from.room());
@@ -213,6 +223,7 @@ int PosixDatagram::Join(Address group) {
 
 int PosixDatagram::Leave(Address group) {
   groups_.erase(group);
+  first_ = nullptr;
   return 0;
 }
 

@@ -47,12 +47,15 @@ class PosixDatagram final : public Transport {
 
   int OpenGroup(Address group, SocketFile& file);
   [[nodiscard]] Inbox* FirstReadable();
-  [[nodiscard]] bool Readable(Inbox& inbox);
+  [[nodiscard]] Inbox* FindFirstReadable();
   void DropStrangers(Inbox& inbox);
   void DropLost(Inbox& inbox);
 
   Inbox own_box_;
   std::map<Address, Inbox> groups_;  ///< closed files until the socket is bound
+  Inbox* first_ = nullptr;           ///< known to have something to read
+  std::vector<pollfd> polled_;       ///< the inboxes' open files, for one call
+  std::vector<Inbox*> inboxes_;      ///< whose files they are
   DeviceSockets& device_;
   bool bound_ = false;
   std::uint16_t port_ = 0;  ///< once it is bound
