@@ -6,14 +6,13 @@
 // SOURCE may hold a %d, which is replaced by 1 to COUNT. With "skip" the pauses of the product are
 // noted but not made: after each of them a processor that has been idle starts from cold caches.
 
-#include <sys/resource.h>
+#include "process_figures.h"
 // The platform's names come after the host's.
 #include <coredll.h>
 
 #include <chrono>
 #include <cstdint>
 #include <filesystem>
-#include <fstream>
 #include <string>
 
 #include "device/device.h"
@@ -23,21 +22,6 @@
 #include "world/world.h"
 
 namespace {
-
-/// Of either of a process's two times.
-template <typename Time>
-double Seconds(const Time& time) {
-  return static_cast<double>(time.tv_sec) + static_cast<double>(time.tv_usec) / 1e6;
-}
-
-/// The most memory this program has held, in KiB. The figure of getrusage begins with the parent's.
-long PeakKib() {
-  std::ifstream status("/proc/self/status");
-  for (std::string line; std::getline(status, line);) {
-    if (line.rfind("VmHWM:", 0) == 0) return std::atol(line.c_str() + 6);
-  }
-  return 0;
-}
 
 /// @return false when the file did not arrive whole and checked.
 bool Fetch(http::CHTTPClient& client, const std::string& url, const std::string& destination) {
@@ -90,12 +74,9 @@ int main(int count, char** arguments) {
 
   double slept = 0;
   for (const sim::SleepRecord& sleep : device.kernel().Sleeps()) slept += sleep.length_ms / 1000.0;
-  rusage usage{};
-  getrusage(RUSAGE_SELF, &usage);
   std::printf(
       "{\"files\": %d, \"good\": %d, \"wall_s\": %.6f, \"pauses_s\": %.3f, \"cpu_s\": %.6f, "
       "\"peak_kib\": %ld}\n",
-      files, good, wall.count(), slept, Seconds(usage.ru_utime) + Seconds(usage.ru_stime),
-      PeakKib());
+      files, good, wall.count(), slept, bench::ProcessorSeconds(), bench::PeakKib());
   return good == files ? 0 : 1;
 }

@@ -1,0 +1,332 @@
+"""The multicast sender and its clients beside two others, in network namespaces of their own.
+
+Every host is a namespace; the switch between them is the kernel's bridge, or, for links with a
+rate, a delay and a loss, a program in user space (bench_wire). Each receiver's file is compared
+with what was sent: what a tool says of itself is printed, but not believed.
+"""
+
+import contextlib
+import hashlib
+import json
+import os
+import pathlib
+import random
+import resource
+import shutil
+import subprocess
+import sys
+import tempfile
+import time
+
+BIN = pathlib.Path(__file__).resolve().parent.parent / "build/release/bin"
+SERVER = "10.77.0.1"
+LIMIT = 300  # seconds for one transfer
+
+
+def address(receiver):
+    return f"10.77.0.{10 + receiver}"
+
+
+def run(*command):
+    subprocess.run(command, check=True, stdout=subprocess.DEVNULL)
+
+
+class Hosts:
+    """A server and some receivers on one network, until the context ends."""
+
+    def __init__(self, receivers, link=None):
+        self.receivers = range(receivers)
+        self.link = link  # (Mbit/s, microseconds, percent, seed), or none for the kernel's bridge
+        self.names = ["s", *[str(i) for i in self.receivers]]
+        self.tag = f"orvb{os.getpid()}-"
+        self.wire = None
+
+    def __enter__(self):
+        try:
+            self.make()
+        except BaseException:
+            self.__exit__()
+            raise
+        return self
+
+    def make(self):
+        run("ip", "netns", "add", self.tag + "w")
+        ports = []
+        for index, name in enumerate(self.names):
+            space, port = self.tag + name, f"p{index}"
+            run("ip", "netns", "add", space)
+            run("ip", "-n", self.tag + "w", "link", "add", port, "type", "veth", "peer", "name",
+                "e", "netns", space)
+            own = SERVER if index == 0 else address(index - 1)
+            for command in (f"link set lo up", f"addr add {own}/24 brd + dev e", "link set e up",
+                            "route add 224.0.0.0/4 dev e"):
+                run("ip", "-n", space, *command.split())
+            run("ip", "-n", self.tag + "w", "link", "set", port, "up")
+            ports.append(port)
+        if self.link:
+            self.wire = subprocess.Popen(
+                self.inside("w", BIN / "bench_wire", *map(str, self.link), *ports),
+                stdin=subprocess.PIPE, stdout=subprocess.PIPE, text=True)
+            self.wire.stdout.readline()
+        else:
+            run("ip", "-n", self.tag + "w", "link", "add", "sw", "type", "bridge",
+                "mcast_snooping", "0")
+            run("ip", "-n", self.tag + "w", "link", "set", "sw", "up")
+            for port in ports:
+                run("ip", "-n", self.tag + "w", "link", "set", port, "master", "sw")
+        time.sleep(0.3)
+
+    def __exit__(self, *_):
+        if self.wire:
+            self.wire.stdin.close()
+            self.wire.wait(10)
+        for name in [*self.names, "w"]:
+            subprocess.run(["ip", "netns", "del", self.tag + name], stderr=subprocess.DEVNULL,
+                           check=False)
+
+    def inside(self, name, *command):
+        return ["ip", "netns", "exec", self.tag + name, *command]
+
+
+SAMPLER = """
+import sys, time
+with open('/sys/class/net/e/statistics/tx_bytes') as counter:
+    print('ready', flush=True)
+    last = None
+    while True:
+        counter.seek(0)
+        now = counter.read().strip()
+        if now != last:
+            print(time.monotonic(), now, flush=True)
+            last = now
+        time.sleep(0.004)
+"""
+EDGE = 64 << 10  # bytes at the beginning and the end that greetings and farewells may take
+
+
+class Meter:
+    """When how much has left the server, as its interface counts."""
+
+    def __init__(self, hosts):
+        self.process = subprocess.Popen(hosts.inside("s", sys.executable, "-c", SAMPLER),
+                                        stdout=subprocess.PIPE, text=True)
+        self.process.stdout.readline()
+
+    def stop(self):
+        self.process.terminate()
+        rows = [line.split() for line in self.process.stdout.read().splitlines()]
+        self.process.wait()
+        samples = [(float(when), int(sent)) for when, sent in (row for row in rows if len(row) == 2)]
+        first, last = samples[0][1], samples[-1][1]
+        if last - first < 2 * EDGE:
+            return last - first, float("inf")
+        begin = next(when for when, sent in samples if sent > first + EDGE)
+        end = next(when for when, sent in samples if sent > last - EDGE)
+        return last - first, max(end - begin, 1e-3)
+
+
+def cpu_of(process):
+    """Waits, and says what processor time the process took."""
+    _, status, usage = os.wait4(process.pid, 0)
+    process.returncode = os.waitstatus_to_exitcode(status)
+    return usage.ru_utime + usage.ru_stime
+
+
+class Orvenix:
+    name = "orvenix"
+
+    def __init__(self, block=1400, window=0, rate=0):
+        self.block, self.window, self.rate = block, window, rate
+
+    def receiver(self, hosts, index, folder):
+        return hosts.inside(str(index), BIN / "bench_multicast_client", folder, address(index),
+                            "-A=239.1.1.1 -P=7000")
+
+    def sender(self, hosts, file):
+        return hosts.inside("s", BIN / "bench_multicast_server", file, "\\file.bin", SERVER,
+                            str(len(hosts.receivers)), str(self.block), str(self.rate),
+                            str(self.window))
+
+    @staticmethod
+    def received(folder):
+        return folder / "storage" / "file.bin"
+
+    @staticmethod
+    def proven(text, _receivers):
+        return json.loads(text)["proven"] if text.startswith("{") else 0
+
+
+class Udpcast:
+    name = "udpcast"
+
+    def __init__(self, rate=0):
+        self.rate = rate
+
+    def receiver(self, hosts, index, folder):
+        return hosts.inside(str(index), "udp-receiver", "--file", folder / "file.bin",
+                            "--interface", "e", "--nokbd", "--no-progress")
+
+    def sender(self, hosts, file):
+        limit = ["--max-bitrate", f"{self.rate}m"] if self.rate else []
+        return hosts.inside("s", "udp-sender", "--file", file, "--interface", "e", "--nokbd",
+                            "--no-progress", "--min-receivers", str(len(hosts.receivers)),
+                            "--full-duplex", *limit)
+
+    @staticmethod
+    def received(folder):
+        return folder / "file.bin"
+
+    @staticmethod
+    def proven(_text, _receivers):
+        return None
+
+
+class Uftp:
+    name = "uftp"
+
+    def __init__(self, rate=0):
+        self.rate = rate
+
+    def receiver(self, hosts, index, folder):
+        return hosts.inside(str(index), "uftpd", "-d", "-I", "e", "-D", folder, "-T",
+                            folder / "part", "-x", "0")
+
+    def sender(self, hosts, file):
+        everyone = ",".join(address(i) for i in hosts.receivers)
+        return hosts.inside("s", "uftp", "-I", "e", "-R",
+                            str(self.rate * 1000) if self.rate else "-1", "-H", everyone, file)
+
+    @staticmethod
+    def received(folder):
+        return folder / "file.bin"
+
+    @staticmethod
+    def proven(_text, _receivers):
+        return None
+
+
+def transfer(tool, hosts, file, digest, work):
+    """One file to all receivers. The seconds are those in which its bytes left the server; wall time
+    is the sender's from its start to its end, with its waits for receivers."""
+    folders = [work / f"{tool.name}-{i}" for i in hosts.receivers]
+    for folder in folders:
+        (folder / "part").mkdir(parents=True)
+    clients = [subprocess.Popen(tool.receiver(hosts, i, folder), stdout=subprocess.DEVNULL,
+                                stderr=subprocess.DEVNULL, stdin=subprocess.DEVNULL)
+               for i, folder in enumerate(folders)]
+    time.sleep(1)
+    meter = Meter(hosts)
+    start = time.monotonic()
+    server = subprocess.Popen(tool.sender(hosts, file), stdout=subprocess.PIPE,
+                              stderr=subprocess.STDOUT, stdin=subprocess.DEVNULL, text=True)
+    with expiry(server):
+        text = server.stdout.read()
+        server_cpu = cpu_of(server)
+    wall = time.monotonic() - start
+    wire, seconds = meter.stop()
+    good = sum(matches(tool.received(folder), digest) for folder in folders)
+    client_cpu = [stop(client) for client in clients]
+    for folder in folders:
+        shutil.rmtree(folder)
+    return {"wall": wall, "seconds": seconds, "wire": wire, "good": good, "server_cpu": server_cpu,
+            "client_cpu": max(client_cpu), "proven": tool.proven(text, len(folders)),
+            "said": text}
+
+
+@contextlib.contextmanager
+def expiry(process):
+    guard = subprocess.Popen([sys.executable, "-c",
+                              f"import os, time\ntime.sleep({LIMIT})\nos.kill({process.pid}, 9)"])
+    try:
+        yield
+    finally:
+        guard.kill()
+        guard.wait()
+
+
+def stop(client):
+    """A client has done its work when the sender has ended; only the time of that counts."""
+    client.terminate()
+    return cpu_of(client)
+
+
+def matches(path, digest):
+    if not path.is_file():
+        return False
+    with open(path, "rb") as file:
+        return hashlib.file_digest(file, "sha256").hexdigest() == digest
+
+
+def memory_folder():
+    folder = pathlib.Path("/dev/shm")
+    return folder if folder.is_dir() and shutil.disk_usage(folder).free > 4 << 30 else None
+
+
+def row(tool, figures, size, receivers):
+    proven = "" if figures["proven"] is None else f", {figures['proven']} proven"
+    print(f"    {tool.name:<9}{size / figures['seconds'] / 1e6:>8.1f} MB/s{figures['wall']:>7.2f} s wall"
+          f"{figures['wire'] / size:>8.3f} wire{figures['server_cpu']:>8.2f} s server"
+          f"{figures['client_cpu']:>8.2f} s client   {figures['good']} of {receivers} right{proven}",
+          flush=True)
+
+
+def compare(title, tools, receivers, size, work, link=None):
+    file = work / "file.bin"
+    content = random.Random(7).randbytes(1 << 20) * (size >> 20)
+    file.write_bytes(content)
+    digest = hashlib.sha256(content).hexdigest()
+    print(f"  {title}", flush=True)
+    results = {}
+    for tool in tools:
+        with Hosts(receivers, link) as hosts:
+            results[tool.name] = transfer(tool, hosts, file, digest, work)
+        row(tool, results[tool.name], size, receivers)
+    peers = [r["seconds"] for name, r in results.items()
+             if name != "orvenix" and r["good"] == receivers]
+    if peers:
+        print(f"    {min(peers) / results['orvenix']['seconds']:.2f} times the better peer", flush=True)
+    return results
+
+
+def ideal(loss, receivers):
+    """Times a block must be sent on average until all have it."""
+    share = loss / 100
+    return sum(1 - (1 - share**k) ** receivers for k in range(60))
+
+
+def missing():
+    if os.geteuid() != 0:
+        return "network namespaces need root"
+    for program, package in (("uftp", "uftp"), ("udp-sender", "udpcast"), ("ip", "iproute2")):
+        if not shutil.which(program):
+            return f"{program} is not installed (apt-get install {package})"
+    return None
+
+
+def multicast():
+    """Files by multicast in network namespaces: speed, bytes on the wire, who has it."""
+    print("\nmulticast: 64 MiB, kernel bridge" )
+    reason = missing()
+    if reason:
+        print(f"  not measured: {reason}")
+        return
+    with tempfile.TemporaryDirectory(prefix="orvenix-multicast", dir=memory_folder()) as folder:
+        work = pathlib.Path(folder)
+        for receivers in (1, 4, 16, 32):
+            compare(f"{receivers} receivers", [Orvenix(block=8192), Udpcast(), Uftp()], receivers,
+                    64 << 20, work)
+        print("\nmulticast: 64 MiB, 100 Mbit/s, 1 ms round trip")
+        for receivers in (1, 4, 16):
+            compare(f"{receivers} receivers", [Orvenix(rate=100), Udpcast(95), Uftp(95)], receivers,
+                    64 << 20, work, (100, 500, 0, 1))
+        print("\nmulticast: 10 MiB to 8 receivers, 10 Mbit/s, 1 ms round trip")
+        for loss in (0, 1, 5, 10):
+            best = ideal(loss, 8) * (1400 + 52) / 1400
+            results = compare(f"{loss} % loss (ideal {best:.3f} on the wire, with headers)",
+                              [Orvenix(rate=10), Udpcast(9), Uftp(9)], 8, 10 << 20, work,
+                              (10, 500, loss, 1))
+            print(f"    {results['orvenix']['wire'] / (10 << 20) / best:.3f} times the ideal")
+
+
+if __name__ == "__main__":
+    multicast()
