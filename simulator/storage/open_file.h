@@ -35,8 +35,8 @@ struct FileNode {
   std::mutex mutex;  ///< of the size, the record and the content
   std::uint64_t size = 0;
   FileRecord record;
-  bool changed = false;       ///< the record differs from the one kept on the host
-  std::uint64_t version = 0;  ///< goes up with each change of the content
+  bool changed = false;                 ///< the record differs from the one kept on the host
+  std::uint64_t version = 0;            ///< goes up with each change of the content
   std::shared_ptr<SharedParts> shared;  ///< of the content; null where nothing is shared
 
   // How it is shared; guarded by the storage's lock.

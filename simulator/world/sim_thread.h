@@ -88,7 +88,7 @@ struct SimThread {
   std::uint64_t timer_number = 0;  ///< 0: no timer runs
   WorldTimers::iterator timer;     ///< of the one that runs
   WorldTimers::node_type spare_timer;
-  std::jmp_buf way_out;            ///< to the thread's first frame, for termination
+  std::jmp_buf way_out;  ///< to the thread's first frame, for termination
   void* first_frame = nullptr;
   std::function<std::uint32_t()> body;
   std::thread host;              ///< not of a light thread, nor of an attached one
