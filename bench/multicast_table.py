@@ -91,7 +91,6 @@ class Hosts:
 SAMPLER = """
 import sys, time
 with open('/sys/class/net/e/statistics/tx_bytes') as counter:
-    print('ready', flush=True)
     last = None
     while True:
         counter.seek(0)
@@ -108,14 +107,17 @@ class Meter:
     """When how much has left the server, as its interface counts."""
 
     def __init__(self, hosts):
+        self.samples = tempfile.TemporaryFile("w+")  # a pipe would be full before long
         self.process = subprocess.Popen(hosts.inside("s", sys.executable, "-c", SAMPLER),
-                                        stdout=subprocess.PIPE, text=True)
-        self.process.stdout.readline()
+                                        stdout=self.samples)
+        time.sleep(0.3)
 
     def stop(self):
         self.process.terminate()
-        rows = [line.split() for line in self.process.stdout.read().splitlines()]
         self.process.wait()
+        self.samples.seek(0)
+        rows = [line.split() for line in self.samples.read().splitlines()]
+        self.samples.close()
         samples = [(float(when), int(sent)) for when, sent in (row for row in rows if len(row) == 2)]
         first, last = samples[0][1], samples[-1][1]
         if last - first < 2 * EDGE:
