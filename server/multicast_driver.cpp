@@ -55,6 +55,7 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
  private:
   enum class Sending : std::uint8_t { kIdle, kFull, kMore };
 
+  bool CanHave(const asio::ip::address_v4& address, std::uint16_t port);
   bool Bind(const asio::ip::address_v4& address, std::uint16_t port);
   bool Receive();
   Sending Send();
@@ -87,7 +88,7 @@ void MulticastDriver::Socket::Open(const MulticastSocketOptions& options) {
     throw std::invalid_argument("port " + std::to_string(public_port) +
                                 " is where clients listen; the server needs another one");
   }
-  bool bound = false;
+  bool bound = options.port == 0 && run_.former_port() != 0 && CanHave(address, run_.former_port());
   for (int attempt = 0; !bound && attempt < kAttempts; ++attempt) {
     bound = Bind(address, options.port);
   }
@@ -102,6 +103,14 @@ void MulticastDriver::Socket::Open(const MulticastSocketOptions& options) {
   socket_.non_blocking(true);
   local_ = ToPeer(socket_.local_endpoint());
   tap_ = options.tap;
+}
+
+bool MulticastDriver::Socket::CanHave(const asio::ip::address_v4& address, std::uint16_t port) {
+  try {
+    return Bind(address, port);
+  } catch (const std::system_error&) {
+    return false;  // somebody else has it by now
+  }
 }
 
 /// @return false when the system has chosen the public port

@@ -95,6 +95,7 @@ struct MulticastFigures {
   std::uint64_t garbage = 0;      ///< received datagrams that are no frame for a server
   std::uint64_t strangers = 0;    ///< frames of nobody who has asked for the file
   std::uint64_t turned_away = 0;  ///< requests beyond the limit of devices
+  std::uint64_t not_stored = 0;   ///< times the session file could not be written
   std::uint64_t rate = 0;         ///< bits per second allowed; 0: no limit
 };
 

@@ -14,12 +14,16 @@
 #include "server/multicast/outbox.h"
 #include "server/multicast/pace.h"
 #include "server/multicast/session.h"
+#include "server/multicast/session_store.h"
 
 namespace server {
 namespace {
 
 /// No frame for a server is longer.
 constexpr std::size_t kLongestReceived = 2048;
+/// What happens in between is lost with a server that dies: devices that are proven are asked
+/// again. Who joins is kept before it is answered.
+constexpr Micros kStoreInterval = std::chrono::milliseconds(250);
 
 void Require(bool holds, const std::string& what) {
   if (!holds) throw std::invalid_argument(what);
@@ -63,6 +67,10 @@ class MulticastRun::Body {
         pace_(options_.rate, LargestFrame(options_, files_)),
         random_(options_.seed != 0 ? options_.seed : std::random_device{}()) {
     figures_.rate = options_.rate;
+    remembers_ = !options_.session_file.empty();
+    memory_.fingerprint = Fingerprint(options_, files_);
+    if (remembers_) recalled_ = Recall(options_.session_file);
+    if (recalled_ && !Fits(*recalled_)) recalled_.reset();
   }
 
   void Start(const Peer& own, Micros now);
@@ -77,11 +85,16 @@ class MulticastRun::Body {
   [[nodiscard]] bool finished() const { return ended_ && outbox_.empty(); }
   [[nodiscard]] const MulticastFigures& figures() const { return figures_; }
   [[nodiscard]] const MulticastOptions& options() const { return options_; }
+  [[nodiscard]] std::uint16_t former_port() const { return recalled_ ? recalled_->port : 0; }
   void SetListener(MulticastListener listener) { listener_ = std::move(listener); }
 
  private:
   void NextFile(Micros now);
   void BeginSession(Micros now);
+  void MakeSession(std::uint32_t transfer_id);
+  [[nodiscard]] bool Fits(const RunMemory& recalled) const;
+  bool Resume(Micros now);
+  void Remember(Micros now);
   void EndSession();
   void EndRun(Micros now);
   void Advance(Micros now);
@@ -103,16 +116,65 @@ class MulticastRun::Body {
   std::set<Peer> known_;  ///< devices of this round that are not dead
   std::set<std::uint32_t> transfer_ids_;
   bool ended_ = false;
+
+  RunMemory memory_;  ///< its last file is the one under way
+  std::optional<RunMemory> recalled_;
+  bool remembers_ = false;
+  std::uint64_t stored_changes_ = 0;
+  std::size_t stored_devices_ = 0;
+  Micros stored_at_{-kStoreInterval};
   std::array<std::uint8_t, kLongestReceived + mcftp::Blowfish::kBlock> received_{};
 };
 
 void MulticastRun::Body::Start(const Peer& own, Micros now) {
   own_ = own;
+  memory_.port = own.port;
   if (files_.empty()) {
     EndRun(now);
-  } else {
+  } else if (!Resume(now)) {
     BeginSession(now);
   }
+}
+
+/// Whether the session file speaks of these files.
+bool MulticastRun::Body::Fits(const RunMemory& recalled) const {
+  return recalled.fingerprint == memory_.fingerprint && !recalled.files.empty() &&
+         std::all_of(recalled.files.begin(), recalled.files.end(),
+                     [this](const FileMemory& file) { return file.index < files_.size(); });
+}
+
+/// Goes on with what the session file says.
+bool MulticastRun::Body::Resume(Micros now) {
+  if (!recalled_) return false;
+  const RunMemory recalled = std::move(*recalled_);
+  recalled_.reset();
+  figures_.round = memory_.round = std::max(recalled.round, 1U);
+  for (const FileMemory& file : recalled.files) {
+    if (session_ != nullptr) EndSession();
+    index_ = file.index;
+    transfer_ids_.insert(file.transfer_id);
+    MakeSession(file.transfer_id);
+    FileMemory settled = file;
+    if (&file != &recalled.files.back()) settled.phase = FilePhase::kFinished;
+    session_->Resume(settled, now);
+    if (settled.phase == FilePhase::kFinished) session_->Stop(now);
+  }
+  Advance(now);
+  return true;
+}
+
+void MulticastRun::Body::Remember(Micros now) {
+  if (!remembers_ || session_ == nullptr || session_->changes() == stored_changes_) return;
+  const bool urgent = figures_.files.back().devices.size() != stored_devices_;
+  if (!urgent && now < stored_at_ + kStoreInterval) return;
+  stored_changes_ = session_->changes();
+  stored_devices_ = figures_.files.back().devices.size();
+  stored_at_ = now;
+  FileMemory file;
+  file.index = memory_.files.back().index;
+  session_->Remember(file);
+  memory_.files.back() = std::move(file);
+  if (!Store(options_.session_file, memory_)) ++figures_.not_stored;
 }
 
 std::uint32_t MulticastRun::Body::NewTransferId() {
@@ -133,11 +195,16 @@ StartPolicy MulticastRun::Body::PolicyForFile() const {
 }
 
 void MulticastRun::Body::BeginSession(Micros now) {
+  MakeSession(NewTransferId());
+  session_->Begin(now);
+}
+
+void MulticastRun::Body::MakeSession(std::uint32_t transfer_id) {
   const MulticastFile& file = files_[index_];
   SessionPlan plan;
   plan.file = &file;
   plan.blocks = ChooseBlocks(file.content->size(), options_.block_size);
-  plan.transfer_id = NewTransferId();
+  plan.transfer_id = transfer_id;
   plan.last_file = index_ + 1 == files_.size();
   plan.own = own_;
   plan.start = PolicyForFile();
@@ -154,7 +221,12 @@ void MulticastRun::Body::BeginSession(Micros now) {
   figures.last_file = plan.last_file;
   session_ =
       std::make_unique<MulticastSession>(options_, plan, figures_, figures, outbox_, listener_);
-  session_->Begin(now);
+  FileMemory memory;
+  memory.index = static_cast<std::uint32_t>(index_);
+  memory.transfer_id = transfer_id;
+  memory_.files.push_back(std::move(memory));
+  stored_changes_ = ~std::uint64_t{0};
+  stored_devices_ = ~std::size_t{0};
 }
 
 void MulticastRun::Body::EndSession() {
@@ -165,6 +237,9 @@ void MulticastRun::Body::EndSession() {
       known_.insert(device.peer);
     }
   }
+  FileMemory& memory = memory_.files.back();
+  memory.devices.clear();
+  session_->Remember(memory);
   session_.reset();
 }
 
@@ -177,11 +252,14 @@ void MulticastRun::Body::NextFile(Micros now) {
     BeginSession(now);
     return;
   }
-  if (figures_.round == options_.rounds || (figures_.round > 1 && known_.empty())) {
+  if (figures_.round >= options_.rounds || (figures_.round > 1 && known_.empty())) {
+    std::error_code ignored;
+    if (remembers_) std::filesystem::remove(options_.session_file, ignored);
     EndRun(now);
     return;
   }
   ++figures_.round;
+  memory_.round = figures_.round;
   index_ = 0;
   known_.clear();
   BeginSession(now);
@@ -198,6 +276,7 @@ void MulticastRun::Body::EndRun(Micros now) {
 
 void MulticastRun::Body::Advance(Micros now) {
   while (session_ != nullptr && session_->finished()) NextFile(now);
+  Remember(now);
 }
 
 void MulticastRun::Body::OnTime(Micros now) {
@@ -235,6 +314,7 @@ void MulticastRun::Body::Account(const Outgoing& outgoing, Micros now) {
 }
 
 const Outgoing* MulticastRun::Body::Next(Micros now) {
+  Remember(now);
   const Outgoing* next = outbox_.Next();
   if (next == nullptr && session_ != nullptr && pace_.Ready(now) && session_->HasBlock(now)) {
     next = session_->NextBlock(now);
@@ -247,6 +327,9 @@ const Outgoing* MulticastRun::Body::Next(Micros now) {
 std::optional<Micros> MulticastRun::Body::deadline(Micros now) {
   if (session_ == nullptr) return std::nullopt;
   std::optional<Micros> earliest = session_->deadline(now);
+  if (remembers_ && session_->changes() != stored_changes_) {
+    earliest = Earlier(earliest, stored_at_ + kStoreInterval);
+  }
   if (session_->HasBlock(now)) earliest = Earlier(earliest, pace_.ReadyAt(now));
   return earliest;
 }
@@ -263,6 +346,10 @@ void MulticastRun::Body::SetRate(std::uint64_t bits_per_second, Micros now) {
 void MulticastRun::Body::Stop(Micros now) {
   if (ended_) return;
   if (session_ != nullptr) {
+    // Whoever starts again goes on from here.
+    stored_at_ = now - kStoreInterval;
+    stored_changes_ = ~std::uint64_t{0};
+    Remember(now);
     session_->Stop(now);
     EndSession();
   }
@@ -320,6 +407,10 @@ void MulticastRun::SetRate(std::uint64_t bits_per_second, Micros now) {
 
 void MulticastRun::Stop(Micros now) {
   body_->Stop(now);
+}
+
+std::uint16_t MulticastRun::former_port() const {
+  return body_->former_port();
 }
 
 const MulticastFigures& MulticastRun::figures() const {

@@ -46,6 +46,10 @@ class MulticastRun {
   /// Told of everything that happens, with the figures up to date. Must not call the run.
   void SetListener(MulticastListener listener);
 
+  /// The port of the server whose session file this run has found, before Start; else 0. Devices
+  /// that have asked that one ask it again: a driver that can have its port is heard by them.
+  [[nodiscard]] std::uint16_t former_port() const;
+
   /// @param own  where the driver's socket is bound: written into announcements
   void Start(const Peer& own, Micros now);
   void OnDatagram(const Peer& from, std::string_view bytes, Micros now);

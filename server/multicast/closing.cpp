@@ -55,7 +55,8 @@ void Closing::OnNak(Device& device, Micros now) {
 void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
   if (std::find(group_.begin(), group_.end(), &device) == group_.end()) return;
   if (block == log_.count()) {
-    if (device.closing >= State::kHasGuard && log_.sent_at(block) != BlockLog::kNever) {
+    const bool has_all = device.closing >= State::kHasGuard || device.recalled;
+    if (has_all && log_.sent_at(block) != BlockLog::kNever) {
       desk_.SetProven(device, now);
       Go(now);
     } else if (device.closing == State::kAsked) {

@@ -30,11 +30,17 @@ FirstPass::FirstPass(TransferDesk& desk, BlockLog& log)
       end_(std::max<std::uint32_t>(log.guard(), 1)) {}
 
 void FirstPass::Begin(Micros now) {
-  if (end_ == 1) {
-    done_ = true;  // all blocks are held back
+  if (next_ >= end_) {
+    done_ = true;  // all blocks are held back, or have gone out
     return;
   }
   ElectAfter(nullptr, now);
+}
+
+void FirstPass::Resume(std::uint32_t next, Micros now) {
+  next_ = next;
+  from_start_ = false;
+  Begin(now);
 }
 
 // ---- the master ----

@@ -21,6 +21,8 @@ class FirstPass {
   FirstPass(TransferDesk& desk, BlockLog& log);
 
   void Begin(Micros now);
+  /// Goes on with this block.
+  void Resume(std::uint32_t next, Micros now);
   void OnAck(Device& device, const mcftp::AckFrame& ack, Micros now);
   void OnNak(Device& device, Micros now);
   void OnOverrun(Device& device, std::uint16_t percent_x100, Micros now);

@@ -11,6 +11,16 @@ void LockStep::Begin(Micros now) {
   ElectNext(now);
 }
 
+void LockStep::Resume(std::uint32_t first_unsent, bool last_sent, Micros now) {
+  first_unsent_ = first_unsent;
+  next_ = std::min(first_unsent, desk_.block_count());
+  if (last_sent) {
+    Drain(now);
+  } else {
+    Begin(now);
+  }
+}
+
 void LockStep::OnJoin(Device& /*device*/, Micros /*now*/) {
   // Found when its turn comes.
 }

@@ -8,6 +8,16 @@ void Pipeline::Begin(Micros now) {
   Go(now);
 }
 
+void Pipeline::Resume(std::uint32_t first_unsent, bool last_sent, Micros now) {
+  for (std::uint32_t block = 1; block < first_unsent && block <= log_.count(); ++block) {
+    log_.Sent(block, now);
+  }
+  if (last_sent) log_.Sent(log_.count(), now);
+  desk_.SetPhase(FilePhase::kStreaming, now);
+  first_pass_.Resume(first_unsent, now);
+  Go(now);
+}
+
 void Pipeline::Go(Micros now) {
   if (step_ == Step::kFirstPass && first_pass_.done()) {
     step_ = Step::kRepair;

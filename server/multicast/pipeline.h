@@ -24,6 +24,7 @@ class Pipeline final : public Transfer {
         closing_(desk, log_) {}
 
   void Begin(Micros now) override;
+  void Resume(std::uint32_t first_unsent, bool last_sent, Micros now) override;
   void OnJoin(Device& device, Micros now) override;
   void OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) override;
   void OnNak(Device& device, std::uint16_t block, Micros now) override;

@@ -17,6 +17,8 @@ constexpr std::uint16_t kAccessViolation = 2;
 constexpr std::uint16_t kDiskFull = 3;
 constexpr std::uint16_t kUnknownTransfer = 5;
 constexpr Micros kKeepAliveSweep = std::chrono::seconds(1);
+/// A server that is started again may send so many blocks once more.
+constexpr std::uint32_t kBlocksBetweenChanges = 256;
 
 std::uint32_t Milliseconds(Micros wait) {
   return static_cast<std::uint32_t>(
@@ -155,6 +157,13 @@ void MulticastSession::BeginTransfer(Micros now) {
     EndTransfer(now);
     return;
   }
+  MakeTransfer(now);
+  Tell(MulticastEventKind::kStarted, nullptr, std::to_string(devices_.size()) + " devices", now);
+  transfer_->Begin(now);
+  CheckProgress(now);
+}
+
+void MulticastSession::MakeTransfer(Micros now) {
   figures_.data_began = now;
   heard_by_all_ = now;
   TransferDesk& desk = *this;
@@ -163,9 +172,44 @@ void MulticastSession::BeginTransfer(Micros now) {
   } else {
     transfer_ = std::make_unique<Pipeline>(desk);
   }
-  Tell(MulticastEventKind::kStarted, nullptr, std::to_string(devices_.size()) + " devices", now);
-  transfer_->Begin(now);
-  CheckProgress(now);
+}
+
+void MulticastSession::Resume(const FileMemory& memory, Micros now) {
+  keepalive_at_ = now + kKeepAliveSweep;
+  figures_.began = now;
+  for (const DeviceMemory& known : memory.devices) {
+    if (Find(known.peer) != nullptr) continue;
+    Device& device = AddDevice(known.peer, Micros(0));
+    device.figures.state = known.state;
+    device.figures.late = memory.phase != FilePhase::kAnnounced;
+    device.whole = known.whole;
+    device.recalled = true;
+  }
+  first_unsent_ = std::min(memory.first_unsent, block_count() + 1);
+  std::fill_n(sent_.begin(), first_unsent_, true);
+  sent_[block_count()] = memory.last_sent;
+  if (memory.phase == FilePhase::kAnnounced) {
+    Begin(now);
+  } else if (memory.phase >= FilePhase::kLingering || devices_.empty() || block_count() == 0) {
+    EndTransfer(now);
+  } else {
+    MakeTransfer(now);
+    Tell(MulticastEventKind::kStarted, nullptr,
+         std::to_string(devices_.size()) + " devices, from block " + std::to_string(first_unsent_),
+         now);
+    transfer_->Resume(first_unsent_, memory.last_sent, now);
+    CheckProgress(now);
+  }
+}
+
+void MulticastSession::Remember(FileMemory& memory) const {
+  memory.transfer_id = plan_.transfer_id;
+  memory.phase = figures_.phase;
+  memory.first_unsent = first_unsent_;
+  memory.last_sent = sent_[block_count()] && block_count() > 0;
+  for (const Device& device : devices_) {
+    memory.devices.push_back({device.figures.peer, device.figures.state, device.whole});
+  }
 }
 
 void MulticastSession::EndTransfer(Micros now) {
@@ -265,6 +309,9 @@ const Outgoing* MulticastSession::NextBlock(Micros now) {
   heard_by_all_ = now;
   ++(sent_[block] ? figures_.repair_frames : figures_.first_pass_frames);
   sent_[block] = true;
+  while (first_unsent_ <= block_count() && sent_[first_unsent_]) {
+    if (++first_unsent_ % kBlocksBetweenChanges == 0) ++changes_;
+  }
   if (!goodbye) CheckProgress(now);
   return outbox_.MakeData(private_group(), static_cast<std::uint16_t>(block),
                           static_cast<std::uint16_t>(length));
@@ -333,15 +380,19 @@ bool MulticastSession::OnRequest(const Peer& from, const mcftp::ReadRequest& req
   return true;
 }
 
-void MulticastSession::Join(const Peer& from, Micros now) {
-  figures_.devices.emplace_back();
-  DeviceFigures& figures = figures_.devices.back();
-  figures.peer = from;
-  figures.late = transfer_ != nullptr;
-  figures.requests = 1;
+Device& MulticastSession::AddDevice(const Peer& peer, Micros now) {
+  DeviceFigures& figures = figures_.devices.emplace_back();
+  figures.peer = peer;
   Device& device = devices_.emplace_back(figures);
-  table_[from] = &device;
   device.joined_at = now;
+  table_[peer] = &device;
+  return device;
+}
+
+void MulticastSession::Join(const Peer& from, Micros now) {
+  Device& device = AddDevice(from, now);
+  device.figures.late = transfer_ != nullptr;
+  device.figures.requests = 1;
   last_join_ = now;
   ++changes_;
   Heard(device, "RRQ", now);
@@ -365,6 +416,7 @@ void MulticastSession::Rejoin(Device& device, Micros now) {
   device.position = 0;
   device.named_at = Micros(0);
   device.whole = false;
+  device.recalled = false;
   device.ahead = 0;
   device.run = 0;
   if (was_given_up) ++changes_;

@@ -12,6 +12,7 @@
 
 #include "mcftp/wire/frames.h"
 #include "server/multicast/outbox.h"
+#include "server/multicast/session_store.h"
 #include "server/multicast/transfer.h"
 #include "server/multicast_figures.h"
 #include "server/multicast_file.h"
@@ -40,6 +41,8 @@ class MulticastSession final : private TransferDesk {
   ~MulticastSession() override;
 
   void Begin(Micros now);
+  /// Goes on where another server has stopped.
+  void Resume(const FileMemory& memory, Micros now);
   /// @param frame  deciphered
   /// @return false for what no client of this file would send
   [[nodiscard]] bool OnFrame(const Peer& from, const mcftp::Header& header,
@@ -55,8 +58,10 @@ class MulticastSession final : private TransferDesk {
   [[nodiscard]] const Outgoing* NextBlock(Micros now);
   [[nodiscard]] std::optional<Micros> deadline(Micros now);
   [[nodiscard]] bool finished() const { return figures_.phase == FilePhase::kFinished; }
-  /// Changes with everything that a restarted server would want to know.
+  /// Changes with everything that a restarted server has to know.
   [[nodiscard]] std::uint64_t changes() const { return changes_; }
+  /// Fills in everything but the file's index.
+  void Remember(FileMemory& memory) const;
 
  private:
   [[nodiscard]] const MulticastOptions& options() const override { return options_; }
@@ -76,6 +81,8 @@ class MulticastSession final : private TransferDesk {
   [[nodiscard]] Micros AnsweredAt() const;
   [[nodiscard]] std::optional<Micros> AnnouncingEnds() const;
   void BeginTransfer(Micros now);
+  void MakeTransfer(Micros now);
+  Device& AddDevice(const Peer& peer, Micros now);
   void EndTransfer(Micros now);
   void CheckProgress(Micros now);
   void KeepAlive(Micros now);
@@ -104,6 +111,7 @@ class MulticastSession final : private TransferDesk {
   std::map<Peer, Device*> table_;
   std::unique_ptr<Transfer> transfer_;
   std::vector<bool> sent_;  ///< by block
+  std::uint32_t first_unsent_ = 1;
 
   Micros copy_at_{0};    ///< when the next announcement is due
   Micros last_copy_{0};  ///< when the latest went out

@@ -32,6 +32,8 @@ struct Device {
   std::uint32_t sends = 0;  ///< of that block, since it was named first
   /// It has every block but those that are held back for the end.
   bool whole = false;
+  /// Known from an earlier server only.
+  bool recalled = false;
 
   // The device is being asked something:
   Micros asked_at{0};
@@ -88,6 +90,9 @@ class Transfer {
   Transfer& operator=(const Transfer&) = delete;
 
   virtual void Begin(Micros now) = 0;
+  /// Goes on where another server has stopped: all blocks below `first_unsent` have gone out, with
+  /// `last_sent` the last one too. Devices that were whole are so still.
+  virtual void Resume(std::uint32_t first_unsent, bool last_sent, Micros now) = 0;
   /// A device has asked for the first time, or again after it was given up.
   virtual void OnJoin(Device& device, Micros now) = 0;
   virtual void OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) = 0;

@@ -291,7 +291,9 @@ void ModelClient::OnTime(Micros now) {
 ModelNetwork::ModelNetwork(server::MulticastOptions options,
                            std::vector<server::MulticastFile> files, std::size_t devices, Link link,
                            std::uint64_t seed)
-    : run_(std::move(options), std::move(files)), link_(link), random_(seed) {
+    : run_(std::make_unique<server::MulticastRun>(std::move(options), std::move(files))),
+      link_(link),
+      random_(seed) {
   for (std::size_t i = 0; i < devices; ++i) AddDevice();
 }
 
@@ -313,6 +315,15 @@ ModelClient& ModelNetwork::AddDevice() {
 bool ModelNetwork::Falls(double probability) {
   if (probability <= 0) return false;
   return static_cast<double>(random_() >> 11U) * 0x1.0p-53 < probability;
+}
+
+void ModelNetwork::RestartServer(server::MulticastOptions options,
+                                 std::vector<server::MulticastFile> files) {
+  run_ = std::make_unique<server::MulticastRun>(std::move(options), std::move(files));
+  server_timer_ = Micros(-1);
+  run_->Start({kServer.address, run_->former_port() != 0 ? run_->former_port() : kServer.port},
+              now_);
+  Pump();
 }
 
 void ModelNetwork::At(Micros when, std::function<void()> action) {
@@ -362,7 +373,7 @@ void ModelNetwork::SendUp(std::size_t index, const std::string& bytes) {
   const int copies = Falls(link_.repeat) ? 2 : 1;
   for (int copy = 0; copy < copies; ++copy) {
     Travel(index, false, [this, index, bytes] {
-      run_.OnDatagram(PeerOf(index), bytes, now_);
+      run_->OnDatagram(PeerOf(index), bytes, now_);
       Pump();
     });
   }
@@ -381,10 +392,10 @@ void ModelNetwork::SetClientTimer(std::size_t index) {
 }
 
 void ModelNetwork::Pump() {
-  run_.OnTime(now_);
-  while (const server::Outgoing* next = run_.Next(now_)) SendDown(*next);
-  const auto deadline = run_.deadline(now_);
-  if (!deadline || run_.finished()) return;
+  run_->OnTime(now_);
+  while (const server::Outgoing* next = run_->Next(now_)) SendDown(*next);
+  const auto deadline = run_->deadline(now_);
+  if (!deadline || run_->finished()) return;
   if (server_timer_ > now_ && server_timer_ <= *deadline) return;
   server_timer_ = std::max(*deadline, now_);
   At(server_timer_, [this, at = server_timer_] {
@@ -395,12 +406,12 @@ void ModelNetwork::Pump() {
 }
 
 void ModelNetwork::Run(Micros limit) {
-  if (run_.figures().files.empty()) {
+  if (run_->figures().files.empty()) {
     for (std::size_t i = 0; i < clients_.size(); ++i) SetClientTimer(i);
-    run_.Start(kServer, now_);
+    run_->Start(kServer, now_);
     Pump();
   }
-  while (!events_.empty() && !run_.finished() && now_ < limit) {
+  while (!events_.empty() && !run_->finished() && now_ < limit) {
     Event event = events_.top();
     events_.pop();
     now_ = event.when;

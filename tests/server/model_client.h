@@ -111,7 +111,10 @@ class ModelNetwork {
   /// Wakes the server after it was told something.
   void Pump();
 
-  [[nodiscard]] server::MulticastRun& run() { return run_; }
+  /// The server dies, and another one starts in its place.
+  void RestartServer(server::MulticastOptions options, std::vector<server::MulticastFile> files);
+
+  [[nodiscard]] server::MulticastRun& run() { return *run_; }
   [[nodiscard]] ModelClient& device(std::size_t index) { return *clients_[index]; }
   [[nodiscard]] std::size_t devices() const { return clients_.size(); }
   [[nodiscard]] server::Micros now() const { return now_; }
@@ -141,7 +144,7 @@ class ModelNetwork {
   void SetClientTimer(std::size_t index);
   [[nodiscard]] bool Falls(double probability);
 
-  server::MulticastRun run_;
+  std::unique_ptr<server::MulticastRun> run_;
   const Link link_;
   std::mt19937_64 random_;
   server::Micros now_{0};
