@@ -6,10 +6,10 @@
 namespace mcftp {
 namespace {
 
-/// Reads the record that the header's opcode names. Frames that only servers receive have none.
+/// Reads the record that the header's opcode names. Frames that only servers receive have none, and
+/// may be of any length.
 /// @return false for a frame that is to be dropped.
 bool DecodeBody(const Datagram& datagram, Frame& frame) noexcept {
-  if (datagram.length < MinimumLength(frame.header.opcode)) return false;
   if (frame.header.Is(Opcode::kAnnouncement)) {
     return DecodeAnnouncement(datagram.bytes, datagram.length, frame.announcement);
   }
