@@ -192,13 +192,15 @@ void FirstPass::OnTime(Micros now) {
     }
     return;
   }
+  // Blocks that are paced expire one by one, and each makes room for another: so silence is told by
+  // when the master was heard, not by an empty way.
   bool silent = false;
   while (!flight_.empty() && now >= flight_.front().sent_at + Patience()) {
-    silent = silent || master_->heard_at <= flight_.front().sent_at;
+    silent = master_->heard_at <= flight_.front().sent_at;
     Lost(flight_.front());
     flight_.pop_front();
   }
-  if (silent && flight_.empty()) {
+  if (silent) {
     window_.OnSilence();
     Elect(*master_, now);
   } else {
