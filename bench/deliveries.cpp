@@ -4,15 +4,16 @@
 //   bench_deliveries [DEVICES [FRAMES]]
 #include <sys/resource.h>
 
-#include <chrono>
 #include <cstdio>
 #include <cstdlib>
+#include <ctime>
 #include <filesystem>
 #include <memory>
 #include <string>
 #include <vector>
 
 #include "ce/files.h"
+#include "ce/kernel.h"
 #include "ce/winsock.h"
 #include "device/device.h"
 #include "net/virtual/virtual_server.h"
@@ -58,7 +59,8 @@ std::uint32_t Receive(int frames) {
     SetFilePointer(file, static_cast<LONG>(i * static_cast<LONG>(kFrame - kHeader)), nullptr,
                    FILE_BEGIN);
     DWORD written = 0;
-    WriteFile(file, buffer.data() + kHeader, static_cast<DWORD>(size) - kHeader, &written, nullptr);
+    WriteFile(file, buffer.data() + kHeader, static_cast<DWORD>(size) - DWORD{kHeader}, &written,
+              nullptr);
   }
   CloseHandle(file);
   ce_closesocket(socket);
@@ -66,7 +68,7 @@ std::uint32_t Receive(int frames) {
   return 0;
 }
 
-/// @return microseconds for each datagram that was delivered.
+/// @return microseconds of processor time for each datagram that was delivered.
 double Measure(sim::ThreadKind kind, int devices, int frames) {
   std::string pattern = (std::filesystem::temp_directory_path() / "orvenix-bench-XXXXXX").string();
   if (mkdtemp(pattern.data()) == nullptr) return 0;
@@ -74,7 +76,8 @@ double Measure(sim::ThreadKind kind, int devices, int frames) {
   {
     const auto world = sim::World::MakeVirtual(1, kind);
     const std::string frame(kFrame, 'x');
-    const auto content = std::make_shared<const std::string>(frames * kFrame, 'x');
+    const auto content =
+        std::make_shared<const std::string>(static_cast<std::size_t>(frames) * kFrame, 'x');
     std::vector<std::unique_ptr<sim::Device>> fleet;
     for (int i = 0; i < devices; ++i) {
       sim::Profile profile;
@@ -100,7 +103,7 @@ double Measure(sim::ThreadKind kind, int devices, int frames) {
     for (int i = 0; i < frames; ++i) {
       network.At(sim::Micros(1000000 + 120 * i), [&] { server.Send({kGroup, kPort}, frame); });
     }
-    const auto began = std::chrono::steady_clock::now();
+    const std::clock_t began = std::clock();
     auto lock = world->Acquire();
     for (sim::SimThread* thread : threads) {
       world->WaitUntil(lock, {&thread->finished}, std::nullopt,
@@ -123,7 +126,8 @@ int main(int argc, char** argv) {
   getrlimit(RLIMIT_NOFILE, &limit);
   limit.rlim_cur = limit.rlim_max;
   setrlimit(RLIMIT_NOFILE, &limit);
-  std::printf("%d devices, %d datagrams each, microseconds a datagram\n", devices, frames);
+  std::printf("%d devices, %d datagrams each, microseconds of processor a datagram\n", devices,
+              frames);
   std::printf("  threads of the host  %7.2f\n", Measure(sim::ThreadKind::kHost, devices, frames));
   std::printf("  light threads        %7.2f\n", Measure(sim::ThreadKind::kLight, devices, frames));
   return 0;
