@@ -131,6 +131,7 @@ DWORD Storage::MakeFresh(FileNode& node, int fd, const OpenRequest& request) {
   if (node.size != 0 && ::ftruncate(fd, 0) != 0) return ErrorOfErrno(errno);
   node.volume.space().Release(node.size);
   node.size = 0;
+  node.host_is_short = false;
   if (node.shared != nullptr) node.shared->Cut(0);
   const FileTicks now = SystemTicks(device_);
   if (request.disposition != TRUNCATE_EXISTING) {
@@ -171,6 +172,7 @@ void Storage::Close(OpenFile& file) {
   open_files_.erase(&file);
   CountSharing(*file.node_, file.mode_, -1);
   const std::lock_guard<std::mutex> quiet(file.node_->mutex);
+  if (file.can_write()) file.SettleSize();
   Keep(*file.node_);
   const FileNode& node = *file.node_;
   // Only those opened for writing: for them the host's way of opening is the same at every open.

@@ -52,9 +52,13 @@ DWORD OpenFile::Read(void* bytes, DWORD size, DWORD& read) {
   const std::lock_guard<std::mutex> hold(node_->mutex);
   if (!node_->volume.present()) return ERROR_NOT_READY;
   while (read < size) {
-    const ssize_t got = ReadHere(static_cast<char*>(bytes) + read, size - read);
+    ssize_t got = ReadHere(static_cast<char*>(bytes) + read, size - read);
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return ErrorOfErrno(errno);
+    if (got == 0 && node_->host_is_short && position_ < node_->size) {
+      got = static_cast<ssize_t>(std::min<std::uint64_t>(size - read, node_->size - position_));
+      std::memset(static_cast<char*>(bytes) + read, 0, static_cast<std::size_t>(got));
+    }
     if (got == 0) break;
     if (node_->shared != nullptr) {
       node_->shared->Fill(position_, static_cast<char*>(bytes) + read,
@@ -95,9 +99,13 @@ bool OpenFile::WriteContent(const char* bytes, std::size_t size, std::uint64_t a
   if (node_->shared == nullptr || !node_->shared->Take(at, bytes, size)) {
     return WriteAt(fd_.get(), bytes, size, at);
   }
-  // On the host the part is a hole, which takes no room.
-  const std::uint64_t end = at + size;
-  return end <= node_->size || ::ftruncate(fd_.get(), static_cast<off_t>(end)) == 0;
+  if (at + size > node_->size) node_->host_is_short = true;
+  return true;
+}
+
+void OpenFile::SettleSize() {
+  if (!std::exchange(node_->host_is_short, false)) return;
+  static_cast<void>(::ftruncate(fd_.get(), static_cast<off_t>(node_->size)));
 }
 
 DWORD OpenFile::Write(const void* bytes, DWORD size, DWORD& written) {
@@ -166,6 +174,7 @@ DWORD OpenFile::Resize(std::uint64_t size) {
     return error;
   }
   node_->size = size;
+  node_->host_is_short = false;
   if (node_->shared != nullptr) node_->shared->Cut(size);
   NoteChange();
   return ERROR_SUCCESS;
@@ -188,8 +197,8 @@ DWORD OpenFile::Load(char* bytes, std::size_t size) {
     if (got == 0) break;  // somebody on the host has cut it; the rest reads as zeros
     have += static_cast<std::size_t>(got);
   }
-  if (node_->shared != nullptr) node_->shared->Fill(0, bytes, have);
   std::memset(bytes + have, 0, size - have);
+  if (node_->shared != nullptr) node_->shared->Fill(0, bytes, size);
   return ERROR_SUCCESS;
 }
 

@@ -38,6 +38,7 @@ struct FileNode {
   bool changed = false;                 ///< the record differs from the one kept on the host
   std::uint64_t version = 0;            ///< goes up with each change of the content
   std::shared_ptr<SharedParts> shared;  ///< of the content; null where nothing is shared
+  bool host_is_short = false;           ///< shared parts lie behind the host file's end
 
   // How it is shared; guarded by the storage's lock.
   unsigned opens = 0;
@@ -104,6 +105,8 @@ class OpenFile final : public KernelObject {
   ssize_t ReadHere(char* bytes, std::size_t size);
   /// Writes to the host what must be there. @return false with errno set.
   bool WriteContent(const char* bytes, std::size_t size, std::uint64_t at);
+  /// Gives the host's file its length, with a hole for what is shared.
+  void SettleSize();
 
   Device& device_;
   Storage* storage_;  ///< null once the file is closed

@@ -178,7 +178,9 @@ void Storage::PutSharedParts(const Location& location) {
   });
   if (!written) return;
   found->second->Cut(0);
-  if (node != nullptr) ++node->version;
+  if (node == nullptr) return;
+  node->host_is_short = false;
+  ++node->version;
 }
 
 std::optional<std::filesystem::path> Storage::HostPath(const WCHAR* name) {
