@@ -2,6 +2,7 @@
 
 #include <atomic>
 
+#include "device/lock.h"
 #include "report/window/progress_window.h"
 
 namespace upgrade {
@@ -9,7 +10,10 @@ namespace {
 
 std::atomic<std::uint32_t> announced_bytes{0};
 std::atomic<std::uint32_t> expected_bytes{0};
-std::atomic<std::uint32_t> received_bytes{0};
+
+// Files of 4 GiB in all and more: no single word of the device holds this.
+device::Lock received_lock;
+std::uint64_t received_bytes = 0;  // under received_lock
 
 }  // namespace
 
@@ -23,12 +27,16 @@ std::uint32_t AnnouncedBytes() noexcept {
 
 void BeginReceiving(std::uint32_t expected) noexcept {
   expected_bytes.store(expected, std::memory_order_relaxed);
-  received_bytes.store(0, std::memory_order_relaxed);
+  const device::LockGuard guard(received_lock);
+  received_bytes = 0;
 }
 
 void AddReceivedBytes(std::uint32_t bytes) noexcept {
-  const std::uint32_t received = received_bytes.load(std::memory_order_relaxed) + bytes;
-  received_bytes.store(received, std::memory_order_relaxed);
+  std::uint64_t received = 0;
+  {
+    const device::LockGuard guard(received_lock);
+    received = received_bytes += bytes;
+  }
   report::SetOverallProgress(
       OverallPercent(received, expected_bytes.load(std::memory_order_relaxed)));
 }

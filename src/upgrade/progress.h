@@ -14,20 +14,21 @@ void SetExpectedBytes(std::uint32_t bytes) noexcept;
 /// host may announce the next job while this one runs. Upgrade thread.
 void BeginReceiving(std::uint32_t expected) noexcept;
 
-/// Counts a file that arrived and moves the overall bar. Upgrade thread.
+/// Counts a file that arrived and moves the overall bar. Upgrade thread, and the one that listens
+/// to the multicast client.
 void AddReceivedBytes(std::uint32_t bytes) noexcept;
 
 /// The overall bar's place: received of expected, at least 5 and at most 100 percent; 100 when the
 /// expected number is unknown.
-[[nodiscard]] constexpr int OverallPercent(std::uint32_t received,
+[[nodiscard]] constexpr int OverallPercent(std::uint64_t received,
                                            std::uint32_t expected) noexcept {
-  if (expected == 0) return 100;
-  const std::uint64_t percent = static_cast<std::uint64_t>(received) * 100U / expected;
-  if (percent < 5) return 5;
-  return percent > 100 ? 100 : static_cast<int>(percent);
+  if (received >= expected) return 100;
+  const auto percent = static_cast<int>(received * 100U / expected);
+  return percent < 5 ? 5 : percent;
 }
 static_assert(OverallPercent(1, 2) == 50 && OverallPercent(0, 1000) == 5);
 static_assert(OverallPercent(3, 2) == 100 && OverallPercent(1, 0) == 100);
 static_assert(OverallPercent(0xFFFFFFFFU, 0xFFFFFFFFU) == 100, "the product needs 39 bits");
+static_assert(OverallPercent(UINT64_MAX, 0xFFFFFFFFU) == 100, "files may be counted repeatedly");
 
 }  // namespace upgrade

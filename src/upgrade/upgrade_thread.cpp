@@ -16,6 +16,7 @@
 #include "upgrade/file_lists.h"
 #include "upgrade/keep_awake.h"
 #include "upgrade/memory_division.h"
+#include "upgrade/multicast_launch.h"
 #include "upgrade/pass_state.h"
 #include "upgrade/phases.h"
 #include "upgrade/progress.h"
@@ -72,11 +73,23 @@ void PauseForTheEye(const UpgradeConfig& job) noexcept {
   if (job.GetShowGUI() == 1) Sleep(kPauseMs);
 }
 
+/// First what a server sends to many devices at once. What does not arrive, or not whole, is left
+/// to the phases that follow.
+void ReceiveByMulticast(const UpgradeConfig& job) noexcept {
+  if (job.GetMCProcessParms()[0] == '\0') return;
+  ShowStatus("Starting FileXfer");
+  Log("Orvenix - UpgradeThread - StartMulticastClient\r\n");
+  RunMulticastTransfer(job);
+  Log("Multicast complete - main logic...");
+  report::SetFileProgress(0);
+}
+
 /// Everything by HTTP, for a caller from outside the configlet: nobody has looked at the device
 /// before. Files are counted before it is cleaned, for which the INF file is fetched once more.
 ///
 /// KEPT ODDITY: some lines have no end: the next one stands right behind "UpgradeClient Mode..."
-/// and "Processing OS files...", here as behind "Multicast Fallback Mode...".
+/// and "Processing OS files...", here as behind "Multicast complete - main logic..." and "Multicast
+/// Fallback Mode...".
 void RunAsUpgradeClient(Run& run) noexcept {
   Log("UpgradeClient Mode...");
   run.succeeded = PerformTests(run.job, run.error_text.data(), run.error_text.capacity());
@@ -165,6 +178,7 @@ void CarryOut(Run& run, std::int32_t mode) noexcept {
   run.pass = BeginPass(run.job);
   Log("Orvenix - UpgradeThread - InitRAM\r\n");
   InitRam(run.job);
+  ReceiveByMulticast(run.job);
   run.storage_card = ProbeStorageCards(run.job, run.pass);
   if (mode != 0) {
     RunAsUpgradeClient(run);

@@ -97,6 +97,11 @@ std::uint32_t WalkJob(const HostJob& job) {
   IcfgEndGroup("HTTPServer", 0, 0);
   WalkPreparation(job);
   WalkFiles(job);
+  if (!job.multicast.empty()) {
+    IcfgBeginGroup("MulticastClient", 0, 0);
+    Set("Parameters", job.multicast);
+    IcfgEndGroup("MulticastClient", 0, 0);
+  }
   IcfgBeginGroup("StorageRequirements", 0, 0);
   IcfgBeginGroup("Store", 0, 0);
   Set("Name", job.store);

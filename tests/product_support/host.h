@@ -34,6 +34,7 @@ struct HostJob {
   std::optional<HostFile> list;
   std::string store = "\\";
   std::string required_space = "1000";
+  std::string multicast;  ///< the multicast client's command line
   std::string syslog_port;
   std::string syslog_address;
   std::string begin_text;
