@@ -7,6 +7,7 @@
 // that a stranger sends it, the others how long the sender waits before it, in steps of 100 ms.
 #include <stdlib.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdint>
 #include <cstdlib>
@@ -59,7 +60,7 @@ std::vector<Datagram> Read(const std::uint8_t* data, std::size_t size) {
   std::vector<Datagram> datagrams;
   while (size >= 3 && datagrams.size() < 200) {
     const std::uint8_t how = data[0];
-    const std::size_t length = std::min<std::size_t>(data[1] | data[2] << 8, size - 3);
+    const std::size_t length = std::min<std::size_t>(data[1] + 256U * data[2], size - 3);
     datagrams.push_back({(how >> 3) * 100ms, kTargets[how & 3], (how & 4) != 0,
                          std::string(reinterpret_cast<const char*>(data) + 3, length)});
     data += 3 + length;

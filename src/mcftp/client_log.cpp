@@ -23,8 +23,9 @@ bool IsSet(const UdpEndpoint& endpoint) noexcept {
 }  // namespace
 
 void McftpClient::Log(const char* format, ...) noexcept {
-  const device::CriticalSectionGuard guard(lock_);
+  // Nobody to hear it, as in most runs: the thread was started after both were set.
   if (!IsSet(debug_) && owner_.log == nullptr) return;
+  const device::CriticalSectionGuard guard(lock_);
   va_list arguments;
   va_start(arguments, format);
   base::FormatV(line_, sizeof line_, format, arguments);

@@ -47,8 +47,9 @@ std::optional<OverrunReport> OverrunWatch::OnBlock(std::uint16_t block, std::uin
 OverrunTexts TextsOf(const OverrunReport& report) noexcept {
   OverrunTexts texts;
   // To the nearest hundredth, and exactly: a single has too few digits for the product not to fit.
-  const auto hundredths =
-      static_cast<std::uint64_t>(static_cast<double>(report.percent) * 100 + 0.5);
+  const double exact = static_cast<double>(report.percent) * 100;
+  auto hundredths = static_cast<std::uint64_t>(exact);
+  if (exact - static_cast<double>(hundredths) >= 0.5) ++hundredths;
   const auto whole = static_cast<std::uint32_t>(hundredths / 100);
   const auto rest = static_cast<std::uint32_t>(hundredths % 100);
   base::Format(texts.line, sizeof texts.line, "<< OVERRUN ERROR: %u.%02u at %u", whole, rest,
