@@ -82,15 +82,29 @@ bool AnnouncesTheFile(std::string bytes) {
          announcement.file_name == kName;
 }
 
+std::string Encode(const mcftp::Announcement& offer) {
+  std::uint8_t frame[128];
+  const std::size_t length = mcftp::EncodeAnnouncement(offer, frame, sizeof frame);
+  return {reinterpret_cast<const char*>(frame), length};
+}
+
 std::string Offer() {
   mcftp::Announcement offer;
   offer.block_size = kBlockSize;
   offer.file_size = kSize;
   offer.oack_wait_ms = 1000;
   offer.file_name = kName;
-  std::uint8_t frame[128];
-  const std::size_t length = mcftp::EncodeAnnouncement(offer, frame, sizeof frame);
-  return {reinterpret_cast<const char*>(frame), length};
+  return Encode(offer);
+}
+
+/// The last file of the run, and not for this device.
+std::string Farewell() {
+  mcftp::Announcement offer;
+  offer.last_file = true;
+  offer.block_size = kBlockSize;
+  offer.file_name = "\\Temp\\end.bin";
+  offer.masks = "MR*";
+  return Encode(offer);
 }
 
 void Ignore(sim::VirtualPort& /*port*/, const sim::Endpoint& /*from*/, std::string_view /*bytes*/) {
@@ -137,6 +151,10 @@ class Surroundings {
         (datagram.from_stranger ? stranger_ : server_).Send(datagram.to, datagram.bytes);
       });
     }
+    // An error ends whatever there is, and the next announcement is read.
+    network.At(when + 20ms,
+               [this] { server_.Send(kTargets[0], std::string("\0\x60\0\0\0\0", 6)); });
+    network.At(when + 30ms, [this] { server_.Send(kTargets[1], Farewell()); });
     Require(mcftp::StartMulticastClient("-A=239.1.1.1 -P=7000 -HV=TQ52 -DA=10.0.0.3 -DP=514") == 0);
     while (world_->now() < when) Sleep(1000);  // what is still on its way hits nobody
   }
