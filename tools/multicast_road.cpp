@@ -80,8 +80,8 @@ std::string RoadRemedy(int error, const NetworkInterface& from, const std::strin
   switch (error) {
     case ENETUNREACH:
     case EHOSTUNREACH:
-      return "add a route (ip route add 224.0.0.0/4 dev " + from.name +
-             ") or choose another --interface";
+      return "bring " + from.name + " up, add a route (ip route add 224.0.0.0/4 dev " + from.name +
+             "), or choose another --interface";
     case ENODEV:
     case EADDRNOTAVAIL: return "choose another --interface: " + from.name + " takes no groups";
     case ENOBUFS: return "this machine is in too many groups; raise net.ipv4.igmp_max_memberships";

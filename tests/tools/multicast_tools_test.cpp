@@ -63,7 +63,7 @@ TEST(ClientTextsTest, AreFoundInLinesOfTheClientsLog) {
   };
 
   EXPECT_EQ(meaning("NAKing block 81 of 200"), "it asks for the first block that it lacks");
-  EXPECT_EQ(meaning("Opening: \\Temp\\a.bin (1300)"), "the file is made");
+  EXPECT_EQ(meaning("Opening: \\Temp\\a.bin (1300)"), "the file is made, with its size");
   EXPECT_THAT(meaning("< 14>2006-03-01 14:05:09 << OVERRUN ERROR: 67.50 at 120"),
               HasSubstr("blocks come faster"));
   EXPECT_EQ(meaning("Last file flag set"), "the announced file is the last one of the run");

@@ -81,7 +81,7 @@ struct TextRows {
 };
 /// Every text. Formats that are nothing but a text from elsewhere come last.
 [[nodiscard]] TextRows Texts();
-/// Texts of the multicast client, up to where they are made of numbers.
+/// Every text of the multicast client, which has a log of its own.
 [[nodiscard]] TextRows ClientTexts();
 
 }  // namespace tools

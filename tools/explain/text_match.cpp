@@ -82,8 +82,8 @@ TextMatcher::Pattern TextMatcher::Compile(const TextRow& row) {
       pattern.segments.back() += format[i];
       continue;
     }
-    ++i;
-    if (format[i] == 's') {
+    i = std::min(format.find_first_not_of("0123456789.*", i + 1), format.size() - 1);
+    if (format[i] == 's' || format[i] == 'f') {
       pattern.segments.emplace_back();
     } else {
       pattern.segments.back() += format[i] == '%' ? '%' : kNumber;
