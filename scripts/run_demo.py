@@ -1,10 +1,12 @@
-"""Upgrades a simulated device by HTTP from a real server and proves the outcome.
+"""Upgrades simulated devices by multicast and HTTP from a real server and proves the outcome.
 
-Everything it makes lies in out/demo: files, bundle, device, screen pictures, and in evidence/ what
-the verdict was drawn from. Exit code 0 only if every line of the verdict holds.
+The devices do not hear a part of what the server sends, one file is announced that is not for them,
+some go by HTTP only, and one is damaged on each device once it has been received: validation must
+find it. Everything the demo makes lies in out/demo: files, bundle, devices, screen pictures, and in
+evidence/ what the verdict was drawn from. Exit code 0 only if every line of the verdict holds.
 
-A scenario prepares the device or the job so that the device refuses it, and proves that it ends as
-it must: result, messages, and what was touched before. Its files lie in out/demo-SCENARIO.
+A scenario goes another way and proves that it ends as it must: result, messages, and what was
+touched before. Its files lie in out/demo-SCENARIO.
 """
 
 import argparse
@@ -19,14 +21,21 @@ import signal
 import socket
 import subprocess
 import sys
+import threading
+import time
 import xml.etree.ElementTree as ElementTree
 
 ROOT = pathlib.Path(__file__).resolve().parent.parent
 BUILD = ROOT / "build/release"
 PROGRAM = BUILD / "bin/orvenix"
 NAME, SERVER, DESTINATION = "demo", "127.0.0.2", "\\Application"
-RIGHT, CORRUPT = "library/libcesim.so", "docs/architecture.md"
-RUN_LIMIT_S = 300
+RIGHT, CORRUPT = "library/libcesim.so", "docs/architecture.md"  # on the device before; HTTP only
+FOREIGN, FOREIGN_MASKS = "other/scanner.bin", "MV41*"  # announced, and not for these devices
+SPOILT = "image/maps.bin"  # damaged on the device after it has come
+EMPTY = "settings/empty.ini"  # no list can say its checksum: fetched by HTTP in every run
+WHY = {RIGHT: "already right", CORRUPT: "damaged", SPOILT: "damaged", EMPTY: "missing"}
+GROUP, DEVICE_TEXT = "239.1.1.1", "TQ52"
+RUN_LIMIT_S = 600
 
 BEGIN_TEXT, END_TEXT = "Demo upgrade", "Demo upgrade done"
 STOPPED = "scanner.exe"  # runs on the device, and the job stops it
@@ -49,6 +58,7 @@ class Scenario:
     statuses: tuple = ((4, BEGIN_TEXT), (1, END_TEXT))
     events: tuple = ((STARTED, ""), (COMPLETE, ""))
     cleaned: bool = True  # processes stopped, old files deleted
+    multicast: bool = True
 
     @property
     def folder(self):
@@ -57,6 +67,7 @@ class Scenario:
 
 SCENARIOS = {scenario.name: scenario for scenario in (
     Scenario(),
+    Scenario("http", multicast=False),
     Scenario("nopower", settings=("power.ac_line=0", "power.battery_flag=4"), exit_code=13,
              result=0xC4111003, outcome="refused", statuses=(),
              events=((FAILED, "Power requirement not met"),), cleaned=False),
@@ -96,10 +107,12 @@ def make_files(folder):
     (folder / "image").mkdir()
     (folder / "image/disk.bin").write_bytes(random.Random(2006).randbytes(36 * 1024 * 1024))
     (folder / "image/maps.bin").write_bytes(random.Random(1405).randbytes(6 * 1024 * 1024))
+    (folder / "other").mkdir()
+    (folder / FOREIGN).write_bytes(random.Random(41).randbytes(300 * 1024))
     (folder / "settings").mkdir()
     (folder / "settings/scanner.ini").write_text("[scanner]\nbeep=1\n")  # fits one segment
     (folder / "settings/network.ini.rename").write_text("[network]\nssid=warehouse\n")
-    (folder / "settings/empty.ini").write_bytes(b"")
+    (folder / EMPTY).write_bytes(b"")
 
 
 def on_device(device, name):
@@ -145,15 +158,22 @@ def extend(job_file, scenario):
     document.write(job_file, encoding="utf-8", xml_declaration=True)
 
 
+def damage(file):
+    """Changes one byte where it stands."""
+    with file.open("r+b") as content:
+        content.seek(file.stat().st_size // 2)
+        byte = content.read(1)[0]
+        content.seek(-1, os.SEEK_CUR)
+        content.write(bytes([byte ^ 0x55]))
+
+
 def spoil(files, device):
     """One file is already right; one is there, but damaged."""
     for name in (RIGHT, CORRUPT):
         target = on_device(device, name)
         target.parent.mkdir(parents=True, exist_ok=True)
         shutil.copyfile(files / name, target)
-    content = bytearray(on_device(device, CORRUPT).read_bytes())
-    content[len(content) // 2] ^= 0x55
-    on_device(device, CORRUPT).write_bytes(content)
+    damage(on_device(device, CORRUPT))
 
 
 def sha256(file):
@@ -174,21 +194,97 @@ def must(what, *arguments):
 class Server:
     """`orvenix serve` as a process of its own."""
 
-    def __init__(self, bundle, port, evidence):
+    def __init__(self, bundle, port, evidence, more):
         self.evidence = evidence
         self.process = subprocess.Popen(
             [str(PROGRAM), "serve", str(bundle), "--json", "--address", SERVER, "--port", str(port),
-             "--report", str(evidence / "server-report.json")],
-            stdout=subprocess.PIPE, text=True)
-        if not self.process.stdout.readline():  # its first line says that it listens
+             "--report", str(evidence / "server-report.json"), *more],
+            stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, text=True)
+        self.lines = []
+        first = self.process.stdout.readline()  # its first line says that it listens
+        if not first:
             sys.exit("demo: the server did not start")
+        self.lines.append(first)
+        self.reader = threading.Thread(target=self.read)
+        self.reader.start()
+
+    def read(self):
+        self.lines.extend(self.process.stdout)
 
     def stop(self):
-        """Ends the server and gives its live events back."""
+        """Ends the server and keeps its live events."""
         self.process.send_signal(signal.SIGINT)
-        events = self.process.communicate(timeout=30)[0].splitlines()
-        (self.evidence / "server-events.jsonl").write_text("\n".join(events) + "\n")
-        return [json.loads(line) for line in events if line]
+        self.process.wait(timeout=30)
+        self.reader.join()
+        (self.evidence / "server-events.jsonl").write_text("".join(self.lines))
+
+
+class Device:
+    """One simulated device, its run, and what is known of it afterwards."""
+
+    def __init__(self, out, number):
+        self.number = number
+        suffix = "" if number == 0 else f"-{number + 1}"
+        self.folder, self.evidence = out / f"device{suffix}", out / f"evidence{suffix}"
+        self.screen = out / f"screen{suffix}"
+        self.address = f"127.0.0.{1 if number == 0 else number + 2}"  # the server has 127.0.0.2
+        self.events_file = self.evidence / "run-events.jsonl"
+        self.process = None
+        self.seen = 0  # bytes of the events file
+        self.has_received = self.spoilt = False
+
+    def make(self, scenario, options):
+        settings = [*scenario.settings, f"network.address={self.address}",
+                    f"device.name=handheld{self.number + 1}",
+                    f"identity.serial=MR7{self.number:05}"]
+        if scenario.multicast:
+            settings += [f"network.datagram_loss_percent={options.loss}",
+                         f"network.datagram_loss_seed={options.seed + self.number}"]
+        must("orvenix device new", "device", "new", self.folder,
+             *(word for setting in settings for word in ("--set", setting)))
+        self.evidence.mkdir(exist_ok=True)
+
+    def start(self, job):
+        """The first device is watched, the others write into their evidence."""
+        shown = None if self.number == 0 else (self.evidence / "run.txt").open("w")
+        self.process = subprocess.Popen(
+            [str(PROGRAM), "run", str(job), "--device", str(self.folder), "--screens",
+             str(self.screen), "--timeout", str(RUN_LIMIT_S), "--events", str(self.events_file)],
+            stdin=subprocess.DEVNULL, stdout=shown, stderr=shown)
+
+    def arrived(self):
+        """The files of the bundle that are on it."""
+        folder = self.folder / "storage" / DESTINATION.lstrip("\\")
+        return {path: sha256(path) for path in folder.rglob("*") if path.is_file()}
+
+    def new_events(self):
+        """What the run has written since the last call."""
+        if not self.events_file.is_file():
+            return []
+        with self.events_file.open() as events:
+            events.seek(self.seen)
+            text = events.read()
+        whole = text[:text.rfind("\n") + 1]
+        self.seen += len(whole.encode())
+        return [json.loads(line) for line in whole.splitlines()]
+
+    def spoil_when_received(self):
+        """Damages one file once the device has closed it: when it has asked for the next one."""
+        wanted = DESTINATION + "\\" + SPOILT.replace("/", "\\")
+        for event in self.new_events():
+            if event["event"] != "multicast" or self.spoilt:
+                continue
+            received = event["step"] == "received" and event["file"] == wanted
+            self.has_received = self.has_received or received
+            if self.has_received and event["step"] == "requested" and event["file"] != wanted:
+                damage(on_device(self.folder, SPOILT))
+                self.spoilt = True
+
+
+def free_udp_port():
+    with socket.socket(type=socket.SOCK_DGRAM) as probe:
+        probe.bind((SERVER, 0))
+        return probe.getsockname()[1]
 
 
 def free_port():
@@ -213,32 +309,75 @@ def row(what, good, evidence):
     return {"what": what, "good": bool(good), "evidence": evidence}
 
 
-def judge_files(files, device, report, log, evidence):
-    """Every file of the bundle: whether it is right, why it was fetched, and that it was."""
+def judge_files(files, device, events, scenario, report, log):
+    """Every file of the bundle: whether it is right, why HTTP fetched it, and that it did."""
     fetched = {fetch["path"].removeprefix(NAME + "/") for entry in report.get("devices", [])
+               if entry["address"] == device.address
                for fetch in entry["files"] if fetch["completed"] > 0}
+    received = {event["file"] for event in events
+                if event["event"] == "multicast" and event["step"] == "received"}
     rows, sums = [], []
     for file in sorted(path for path in files.rglob("*") if path.is_file()):
         name = file.relative_to(files).as_posix()
-        expected, found = sha256(file), sha256(on_device(device, name))
-        why = reason_of(name, log)
-        wanted = "already right" if name == RIGHT else (
-            "damaged" if name == CORRUPT else "missing")
-        transferred = name in fetched
-        rows.append(row(name, expected == found and why == wanted and transferred == (name != RIGHT),
-                        f"{file.stat().st_size:,} bytes, {why}, "
-                        f"{'fetched' if transferred else 'not fetched'}, "
-                        f"{'equal' if expected == found else 'DIFFERENT'}"))
+        expected, found = sha256(file), sha256(on_device(device.folder, name))
+        why, transferred = reason_of(name, log), name in fetched
+        came = DESTINATION + "\\" + name.replace("/", "\\") in received
+        if name == FOREIGN:
+            good, what = found is None and not came and not transferred, "for others, not taken"
+        else:
+            wanted = "already right" if scenario.multicast else "missing"
+            if scenario.multicast or name != SPOILT:
+                wanted = WHY.get(name, wanted)
+            good = expected == found and why == wanted and transferred == (wanted != "already right")
+            good = good and came == (scenario.multicast and name not in (RIGHT, CORRUPT, EMPTY))
+            ways = [way for way, took in (("multicast", came), ("HTTP", transferred)) if took]
+            what = f"{why}, {' then '.join(ways) or 'not fetched'}"
+        same = {expected: "equal", None: "not there"}.get(found, "DIFFERENT")
+        rows.append(row(name, good, f"{file.stat().st_size:,} bytes, {what}, {same}"))
         sums.append(f"{expected}  {found}  {name}")
-    (evidence / "sha256.txt").write_text("bundle  device  name\n" + "\n".join(sums) + "\n")
+    (device.evidence / "sha256.txt").write_text("bundle  device  name\n" + "\n".join(sums) + "\n")
     return rows
+
+
+def judge_multicast(devices, report, options):
+    """What went to the group, what was lost, and that every device has proved its files."""
+    files = report.get("multicast", {}).get("files", [])
+    sent = sum(file["frames"] for file in files)
+    repairs = sum(file["repair_frames"] for file in files)
+    wire, size = (sum(file[key] for file in files if file["devices"])
+                  for key in ("wire_bytes", "size"))
+    joined, proven = (sum(file[key] for file in files) for key in ("joined", "proven"))
+    lost = sum(event.get("datagrams_lost", 0) for device in devices
+               for event in read_events(device.events_file) if event["event"] == "ended")
+    wanted = len(devices) * (len(files) - 1)
+    foreign = [file for file in files if file["path"].endswith(FOREIGN.replace("/", "\\"))]
+    return [row("multicast", joined == proven == wanted,
+                f"{len(files)} files announced, {proven} of {wanted} transfers proven"),
+            row("frames", sent > 0 and (options.loss == 0 or (lost > 0 and repairs > 0)),
+                f"{sent:,} sent, {lost:,} lost on the way, {repairs:,} repaired, "
+                f"{wire / max(size, 1):.3f} bytes on the wire a byte"),
+            row("announced for others", len(foreign) == 1 and not foreign[0]["devices"],
+                f"{FOREIGN} for {FOREIGN_MASKS}, asked for by nobody")]
+
+
+def judge_reception(device, events):
+    """The block map and the roles that the run has shown, and the damage that validation found."""
+    maps = [event["map"] for event in events if event["event"] == "blocks"]
+    roles = {event["role"] for event in events if event["event"] in ("blocks", "multicast")
+             and event.get("role")}
+    log_file = device.folder / "storage/mcast.log"
+    started = log_file.is_file() and "State machine thread created" in log_file.read_text()
+    if log_file.is_file():
+        shutil.copyfile(log_file, device.evidence / "mcast.log")
+    return [row("block map", len(maps) > 0, f"{len(maps)} times drawn, {', '.join(sorted(roles))}"),
+            row("spoilt", device.spoilt, f"{SPOILT} damaged after it had come"),
+            row("client log", started, "mcast.log")]
 
 
 def judge_refusal(before, device, report):
     """The device was not touched: no request came, and no file of the bundle arrived."""
     requests = sum(len(entry["files"]) for entry in report.get("devices", []))
-    arrived = device / "storage" / DESTINATION.lstrip("\\")
-    after = {path: sha256(path) for path in arrived.rglob("*") if path.is_file()}
+    after = device.arrived()
     return [row("nothing asked for", requests == 0, f"{requests} requests, server-report.json"),
             row("nothing brought", before == after,
                 f"{len(after)} files as before in {DESTINATION}")]
@@ -248,7 +387,7 @@ def judge_preparation(device, events, log, scenario):
     """Registry test, stopped program, deleted and saved files, each as the scenario has it."""
     processes = [event["names"] for event in events if event["event"] == "processes"]
     ran = [STOPPED in names for names in processes]
-    old = {name: (device / "storage" / OLD / name) for name in (*DELETED, SAVED)}
+    old = {name: (device.folder / "storage" / OLD / name) for name in (*DELETED, SAVED)}
     gone = [name for name in DELETED if not old[name].exists()]
     kept = sha256(old[SAVED]) == hashlib.sha256(f"{SAVED} of an earlier release\n".encode()).hexdigest()
     tested = "PerformTests - 1" in log
@@ -263,13 +402,13 @@ def judge_preparation(device, events, log, scenario):
             row("save list", kept, f"{SAVED} {'is kept' if kept else 'IS LOST'}")]
 
 
-def judge_messages(device, events, scenario, evidence):
+def judge_messages(device, events, scenario):
     """Statuses as the host got them, and events as they lie in the device's message queue."""
     statuses = [(event["state"], event["reason"]) for event in events
                 if event["event"] == "document" and event["kind"] == "status"]
     queued = []
-    for file in sorted((device / "messages").glob("*.xml")):
-        shutil.copyfile(file, evidence / file.name)
+    for file in sorted((device.folder / "messages").glob("*.xml")):
+        shutil.copyfile(file, device.evidence / file.name)
         fields = {field.get("Name"): field.text or "" for field in ElementTree.parse(file).iter("Field")}
         queued.append((int(fields.get("msgNum", 0)), fields.get("optArgArrayElement", "")))
     def shown(messages):
@@ -278,27 +417,53 @@ def judge_messages(device, events, scenario, evidence):
             row("device events", queued == list(scenario.events), shown(queued))]
 
 
-def judge_end(run_code, events, log, log_file, scenario, evidence):
+def judge_end(device, events, log, log_file, scenario):
     """Exit code, the configlet's result, and what the log tells by itself."""
     results = [event["result"] for event in events if event["event"] == "call"
                and event["function"] == "IcfgEndGroup" and event["name"] == "Upgrade"]
     explained = orvenix("explain", log_file, "--json", capture_output=True, text=True)
     story = json.loads(explained.stdout) if explained.returncode == 0 else {}
-    (evidence / "explained.json").write_text(json.dumps(story, indent=2) + "\n")
+    (device.evidence / "explained.json").write_text(json.dumps(story, indent=2) + "\n")
     result = f"0x{results[-1]:08X}" if results else "none"
     told = story.get("outcome") == scenario.outcome and story.get("result", 0) == scenario.result
-    return [row("exit code", run_code == scenario.exit_code, f"`orvenix run` exit code {run_code}"),
+    code = device.process.returncode
+    return [row("exit code", code == scenario.exit_code, f"`orvenix run` exit code {code}"),
             row("result", results == [scenario.result], result),
             row("log explained", told, f"{story.get('outcome')}: {story.get('text')}"),
             row("transfer log", scenario.result != 0 or
                 any("UpgradeThread - Exiting" in line for line in log), f"{len(log)} lines, FileXfer.log")]
 
 
-def judge_upgrade(report, pictures):
-    done = [entry["report"] for entry in report.get("devices", []) if entry.get("report")]
+def judge_upgrade(device, report):
+    done = [entry["report"] for entry in report.get("devices", [])
+            if entry["address"] == device.address and entry.get("report")]
+    pictures = sorted(device.screen.glob("*.png"))
     return [row("completion report", len(done) == 1 and done[0]["error"] == "",
                 f"{done[0]['bundle_rx']:,} bytes by HTTP" if done else "none received"),
-            row("progress window", len(pictures) >= 2, f"{len(pictures)} pictures in screen/")]
+            row("progress window", len(pictures) >= 2,
+                f"{len(pictures)} pictures in {device.screen.name}/")]
+
+
+def judge_device(device, files, before, scenario, report):
+    """All that one device has to show."""
+    events = read_events(device.events_file)
+    log_file = device.folder / "storage/FileXfer.log"
+    log = log_file.read_text(errors="replace").splitlines() if log_file.is_file() else []
+    if log:
+        shutil.copyfile(log_file, device.evidence / "FileXfer.log")
+    rows = judge_end(device, events, log, log_file, scenario)
+    rows += judge_preparation(device, events, log, scenario)
+    rows += judge_messages(device, events, scenario)
+    if scenario.result == 0:
+        rows += judge_reception(device, events) if scenario.multicast else []
+        rows += judge_files(files, device, events, scenario, report, log)
+        rows += judge_upgrade(device, report)
+    else:
+        rows += judge_refusal(before, device, report)
+    if device.number > 0:
+        for entry in rows:
+            entry["what"] = f"{device.number + 1}: {entry['what']}"
+    return rows
 
 
 def read_events(file):
@@ -315,52 +480,81 @@ def show(rows, out):
     return 0 if good else 1
 
 
-def main():
+def run_devices(devices, job, scenario):
+    """Runs all of them at once, and damages the file on each as soon as it may be."""
+    for device in devices:
+        device.start(job)
+    while any(device.process.poll() is None for device in devices):
+        for device in devices:
+            if scenario.multicast and not device.spoilt:
+                device.spoil_when_received()
+        time.sleep(0.05)
+
+
+def read_options():
     parser = argparse.ArgumentParser(prog="./demo", description=__doc__.splitlines()[0])
     parser.add_argument("--scenario", choices=sorted(filter(None, SCENARIOS)), default="",
-                        help="a job that the device must refuse")
-    scenario = SCENARIOS[parser.parse_args().scenario]
+                        help="a job that the device must refuse, or http: one without multicast")
+    parser.add_argument("--loss", type=float, default=2.0, metavar="P",
+                        help="percent of the server's datagrams that a device does not hear (2)")
+    parser.add_argument("--seed", type=int, default=1, metavar="N",
+                        help="which datagrams these are (1); device k has the seed N + k - 1")
+    parser.add_argument("--devices", type=int, default=1, metavar="N",
+                        help="devices that are upgraded at once (1)")
+    parser.add_argument("--encrypt", action="store_true", help="encipher what goes to the group")
+    options = parser.parse_args()
+    if not 0 <= options.loss <= 100 or not 1 <= options.devices <= 200 or options.seed < 0:
+        parser.error("--loss goes from 0 to 100, --devices from 1 to 200, --seed from 0")
+    return options
+
+
+def make_bundle(files, bundle, port, scenario, options):
+    multicast = ["--multicast", f"{GROUP}:{free_udp_port()}", "--device-text", DEVICE_TEXT]
+    for name in (RIGHT, CORRUPT):
+        multicast += ["--http-only", name]
+    multicast += ["--encrypt"] if options.encrypt else []
+    must("orvenix bundle make", "bundle", "make", files, bundle, "--address", SERVER, "--port", port,
+         "--dest", DESTINATION, "--name", NAME, "--begin-text", BEGIN_TEXT, "--end-text", END_TEXT,
+         "--masks-for", f"{FOREIGN}={FOREIGN_MASKS}", *(multicast if scenario.multicast else []))
+    extend(bundle / "job.xml", scenario)
+    must("orvenix job lint", "job", "lint", bundle)
+
+
+def main():
+    options = read_options()
+    scenario = SCENARIOS[options.scenario]
     print("building ...", flush=True)
     build()
     out = scenario.folder
     shutil.rmtree(out, ignore_errors=True)
-    files, bundle, device, evidence = out / "files", out / "bundle", out / "device", out / "evidence"
+    files, bundle, evidence = out / "files", out / "bundle", out / "evidence"
     evidence.mkdir(parents=True)
     make_files(files)
     port = free_port()
-    print("making a bundle and a device ...", flush=True)
-    must("orvenix bundle make", "bundle", "make", files, bundle, "--address", SERVER, "--port", port,
-         "--dest", DESTINATION, "--name", NAME, "--begin-text", BEGIN_TEXT, "--end-text", END_TEXT)
-    extend(bundle / "job.xml", scenario)
-    must("orvenix job lint", "job", "lint", bundle)
-    must("orvenix device new", "device", "new", device,
-         *(word for setting in scenario.settings for word in ("--set", setting)))
-    prepare(device, scenario)
-    spoil(files, device)
-    before = {path: sha256(path) for path in (device / "storage" / DESTINATION.lstrip("\\")).rglob("*")
-              if path.is_file()}
+    count = options.devices if scenario.result == 0 else 1
+    print(f"making a bundle and {'a device' if count == 1 else f'{count} devices'} ...", flush=True)
+    make_bundle(files, bundle, port, scenario, options)
+    devices = [Device(out, number) for number in range(count)]
+    for device in devices:
+        device.make(scenario, options)
+        prepare(device.folder, scenario)
+        spoil(files, device.folder)
+    before = devices[0].arrived()
 
-    server = Server(bundle, port, evidence)
+    # A file that nobody wants is given up after the wait.
+    multicast = ["--expect", str(count), "--wait", "8"] if scenario.multicast else []
+    server = Server(bundle, port, evidence, multicast)
     try:
-        run = orvenix("run", bundle / "job.xml", "--device", device, "--screens", out / "screen",
-                      "--timeout", RUN_LIMIT_S, "--events", evidence / "run-events.jsonl")
+        run_devices(devices, bundle / "job.xml", scenario)
     finally:
         server.stop()
     report_file = evidence / "server-report.json"
     report = json.loads(report_file.read_text()) if report_file.is_file() else {}
-    events = read_events(evidence / "run-events.jsonl")
-    log_file = device / "storage/FileXfer.log"
-    log = log_file.read_text(errors="replace").splitlines() if log_file.is_file() else []
-    if log:
-        shutil.copyfile(log_file, evidence / "FileXfer.log")
-    rows = judge_end(run.returncode, events, log, log_file, scenario, evidence)
-    rows += judge_preparation(device, events, log, scenario)
-    rows += judge_messages(device, events, scenario, evidence)
-    if scenario.result == 0:
-        rows += judge_files(files, device, report, log, evidence)
-        rows += judge_upgrade(report, sorted((out / "screen").glob("*.png")))
-    else:
-        rows += judge_refusal(before, device, report)
+    rows = []
+    for device in devices:
+        rows += judge_device(device, files, before, scenario, report)
+    if scenario.result == 0 and scenario.multicast:
+        rows += judge_multicast(devices, report, options)
     return show(rows, out)
 
 
