@@ -14,15 +14,20 @@ class Deadline {
  public:
   explicit Deadline(std::uint32_t wait_ms) noexcept : begin_(GetTickCount()), wait_ms_(wait_ms) {}
 
+  /// Begins the whole wait anew.
+  void Restart() noexcept {
+    begin_ = GetTickCount();
+    fresh_ = true;
+  }
+
+  /// The first time all is left, and the clock is not asked: most waits end with what they are for.
   /// @param left_ms  receives what is left: 0 only when there is no end
   /// @return false when nothing is left; `left_ms` is then unchanged.
-  [[nodiscard]] bool HasLeft(std::uint32_t& left_ms) const noexcept {
-    if (wait_ms_ == 0) {
-      left_ms = 0;
-      return true;
-    }
-    const auto gone = static_cast<std::uint32_t>(GetTickCount() - begin_);
-    if (gone >= wait_ms_) return false;
+  [[nodiscard]] bool HasLeft(std::uint32_t& left_ms) noexcept {
+    std::uint32_t gone = 0;
+    if (!fresh_ && wait_ms_ != 0) gone = static_cast<std::uint32_t>(GetTickCount() - begin_);
+    fresh_ = false;
+    if (wait_ms_ != 0 && gone >= wait_ms_) return false;
     left_ms = wait_ms_ - gone;
     return true;
   }
@@ -30,6 +35,7 @@ class Deadline {
  private:
   DWORD begin_;
   std::uint32_t wait_ms_;
+  bool fresh_ = true;
 };
 
 }  // namespace device

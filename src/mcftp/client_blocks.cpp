@@ -111,7 +111,7 @@ bool McftpClient::TakeBlock() noexcept {
   counters_.total_bytes += frame_.data.length;
   progress_.bytes += frame_.data.length;
   progress_.bytes_since_report += frame_.data.length;
-  LogAndStatus(StatusCode::kProgress);
+  ReportProgress();
   ++progress_.blocks;
   progress_.last_written = block;
   return true;

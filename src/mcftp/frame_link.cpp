@@ -101,14 +101,12 @@ bool FrameLink::SendBuffer() noexcept {
 // ---- receiving ----
 
 bool FrameLink::Receive(std::uint32_t timeout_ms, const FileInHand& file, Frame& frame) noexcept {
-  const device::Deadline deadline(timeout_ms);
-  std::uint32_t left_ms = timeout_ms;
-  do {
-    const Datagram datagram = network_.Receive(public_, &private_, left_ms);
+  device::Deadline deadline(timeout_ms);
+  while (true) {
+    const Datagram datagram = network_.Receive(public_, &private_, deadline);
     if (!datagram) return false;
     if (Take(datagram, file, frame)) return true;
-  } while (deadline.HasLeft(left_ms));
-  return false;
+  }
 }
 
 /// KEPT ODDITY: a frame that is dropped further down has already decided whether the next one goes

@@ -3,7 +3,6 @@
 #include <cstring>
 #include <string_view>
 
-#include "device/deadline.h"
 #include "device/socket_wait.h"
 
 namespace mcftp {
@@ -132,27 +131,28 @@ AddressText UdpNetwork::own_address_text() const noexcept {
 }
 
 Datagram UdpNetwork::Receive(const UdpEndpoint& endpoint, const UdpEndpoint* other,
-                             std::uint32_t timeout_ms) noexcept {
+                             device::Deadline& deadline) noexcept {
   if (!buffer_) {
     buffer_ = device::LocalBlock<std::uint8_t>::Allocate(kMaxDatagram + kSpareBytes);
   }
   if (!buffer_ || !endpoint.is_open()) return {};
-  device::Deadline deadline(timeout_ms);
-  std::uint32_t left_ms = timeout_ms;
-  do {
+  std::uint32_t left_ms = 0;
+  while (deadline.HasLeft(left_ms)) {
     const UdpEndpoint* const readable = AwaitReadable(endpoint, other, left_ms);
     if (readable == nullptr) return {};
     Datagram datagram;
     const int length = TakeDatagram(*readable, datagram.sender);
     if (length < 0) return {};
-    if (length > 0 && !IsOwn(datagram.sender)) {
-      std::memset(&buffer_[static_cast<std::size_t>(length)], 0, kSpareBytes);
-      datagram.bytes = buffer_.get();
-      datagram.length = static_cast<std::uint32_t>(length);
-      return datagram;
+    if (length == 0) continue;
+    if (IsOwn(datagram.sender)) {
+      deadline.Restart();
+      continue;
     }
-    if (length > 0) deadline = device::Deadline(timeout_ms);
-  } while (deadline.HasLeft(left_ms));
+    std::memset(&buffer_[static_cast<std::size_t>(length)], 0, kSpareBytes);
+    datagram.bytes = buffer_.get();
+    datagram.length = static_cast<std::uint32_t>(length);
+    return datagram;
+  }
   return {};
 }
 

@@ -7,6 +7,7 @@
 #include <cstdint>
 
 #include "base/text.h"
+#include "device/deadline.h"
 #include "device/local_memory.h"
 
 namespace mcftp {
@@ -130,16 +131,18 @@ class UdpNetwork {
   /// frames.
   ///
   /// @param timeout_ms  0 waits without limit
-  /// @return nothing after the time-out and on any failure. The datagram is followed by zeros in
-  ///   memory, kSpareBytes of them at most.
+  /// @return nothing after the time-out and on any failure. The datagram is followed by kSpareBytes
+  ///   zeros in memory.
   [[nodiscard]] Datagram Receive(const UdpEndpoint& endpoint, std::uint32_t timeout_ms) noexcept {
-    return Receive(endpoint, nullptr, timeout_ms);
+    device::Deadline deadline(timeout_ms);
+    return Receive(endpoint, nullptr, deadline);
   }
 
   /// The same on two sockets at once: when both have something to give, they take turns.
-  /// @param other  may be null or closed
+  /// @param other     may be null or closed
+  /// @param deadline  of a wait that may have begun before this call
   [[nodiscard]] Datagram Receive(const UdpEndpoint& endpoint, const UdpEndpoint* other,
-                                 std::uint32_t timeout_ms) noexcept;
+                                 device::Deadline& deadline) noexcept;
 
  private:
   void LearnOwnIdentity() noexcept;

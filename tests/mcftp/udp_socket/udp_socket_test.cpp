@@ -263,7 +263,8 @@ TEST_F(UdpSocketTest, ListensOnTwoSocketsAtOnce) {
   ASSERT_TRUE(other.Create());
   ASSERT_TRUE(other.Bind(kPort + 1));
   const auto receive = [&](std::uint32_t timeout_ms) {
-    const Datagram datagram = network_.Receive(endpoint_, &other, timeout_ms);
+    device::Deadline deadline(timeout_ms);
+    const Datagram datagram = network_.Receive(endpoint_, &other, deadline);
     if (!datagram) return std::string("<nothing>");
     return std::string(reinterpret_cast<const char*>(datagram.bytes), datagram.length);
   };
