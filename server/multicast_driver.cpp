@@ -76,6 +76,8 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
   bool listening_ = false;          ///< waiting for a datagram
   bool again_ = false;              ///< Pump will come back by itself
   bool closed_ = false;
+  bool timer_set_ = false;
+  Micros timer_at_{0};
   std::array<char, 65536> buffer_{};
 };
 
@@ -213,12 +215,19 @@ void MulticastDriver::Socket::Again() {
   });
 }
 
+/// Every block moves the deadline. The timer is only set again when the deadline has come nearer;
+/// when it has gone further away, the timer finds out at its end.
 void MulticastDriver::Socket::SetTimer() {
   const std::optional<Micros> deadline = run_.deadline(NowMicros());
   if (!deadline || kept_ != nullptr) return;
+  if (timer_set_ && timer_at_ <= *deadline) return;
+  timer_set_ = true;
+  timer_at_ = *deadline;
   timer_.expires_at(std::chrono::steady_clock::time_point(*deadline));
   timer_.async_wait([self = shared_from_this()](const ErrorCode& error) {
-    if (!error) self->Pump();
+    if (error) return;  // set anew, or over
+    self->timer_set_ = false;
+    self->Pump();
   });
 }
 

@@ -13,8 +13,11 @@ constexpr Micros kLeastPatience = std::chrono::milliseconds(10);
 /// Below this share, in hundredths of a percent, one report is enough.
 constexpr std::uint16_t kHopelessPercent = 5000;
 /// A master that has become one because it is slow may be so much slower than the best.
-constexpr std::uint32_t kSlowest = 10;
-constexpr std::uint32_t kSlowSeconds = 5;
+constexpr double kSlowest = 10;
+constexpr std::uint32_t kSlowMeasures = 5;
+/// Acknowledgements that make a rate, and not only a burst.
+constexpr std::uint32_t kEnoughAcks = 16;
+constexpr unsigned kMostBackoff = 8;
 
 std::uint32_t Unsettled(std::deque<Device>& devices) {
   return static_cast<std::uint32_t>(std::count_if(
@@ -65,6 +68,7 @@ void FirstPass::Elect(Device& candidate, Micros now) {
   from_start_ = from_start_ && (next_ == 1 || &candidate == master_);
   for (const InFlight& flying : flight_) lacking_.insert(flying.block);
   flight_.clear();
+  if (&candidate != master_) MeasureAnew(now);
   if (master_ != nullptr && &candidate != master_) {
     lacking_.clear();  // nothing is known of what the new one lacks
     window_ = SendWindow(desk_.options().window, desk_.block_size());
@@ -83,9 +87,7 @@ void FirstPass::Ask(Micros now) {
 
 void FirstPass::BecomeMaster(Micros now) {
   electing_ = false;
-  second_began_ = now;
-  acked_in_second_ = 0;
-  slow_seconds_ = 0;
+  window_.SetAlone(desk_.devices().size() == 1);
   desk_.TellMaster(*master_, now);
 }
 
@@ -131,12 +133,15 @@ void FirstPass::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
 
 void FirstPass::Acknowledged(std::uint32_t block, bool duplicate, Micros now) {
   lacking_.erase(block);
+  if (duplicate) ++wasted_;
   const auto at = std::find_if(flight_.begin(), flight_.end(),
                                [block](const InFlight& flying) { return flying.block == block; });
   if (at == flight_.end()) return;
-  if (at->again && duplicate) ++wasted_;
-  if (!at->again) window_.OnAck(at->sent_at, now);
-  ++acked_in_second_;
+  if (!at->again) {
+    window_.OnAck(at->sent_at, now);
+    backoff_ = 0;
+  }
+  ++measured_acks_;
   const auto index = static_cast<std::size_t>(at - flight_.begin());
   flight_.erase(at);
   for (std::size_t i = 0; i < index; ++i) ++flight_[i].overtaken;
@@ -151,22 +156,34 @@ void FirstPass::Lost(const InFlight& gone) {
   window_.OnLoss();
 }
 
+double FirstPass::MeasuredRate(Micros now) const {
+  const auto span = static_cast<double>(std::max((now - measure_began_).count(), Micros::rep{1}));
+  return measured_acks_ * 1e6 / span;
+}
+
+void FirstPass::MeasureAnew(Micros now) {
+  if (measured_acks_ >= kEnoughAcks) best_rate_ = std::max(best_rate_, MeasuredRate(now));
+  measure_began_ = now;
+  measured_acks_ = 0;
+  slow_measures_ = 0;
+}
+
 /// Gives up a master that holds all others back.
 void FirstPass::Measure(Micros now) {
-  if (now - second_began_ < std::chrono::seconds(1)) return;
-  best_second_ = std::max(best_second_, acked_in_second_);
-  slow_seconds_ = acked_in_second_ * kSlowest < best_second_ ? slow_seconds_ + 1 : 0;
-  second_began_ = now;
-  acked_in_second_ = 0;
-  if (slow_seconds_ < kSlowSeconds || Unsettled(desk_.devices()) < 2) return;
-  if (master_->figures.overruns > 0) {
-    desk_.SetReleased(*master_, "is more than ten times slower than others", now);
-    ElectAfter(master_, now);
+  if (now - measure_began_ < std::chrono::seconds(1)) return;
+  const double rate = MeasuredRate(now);
+  best_rate_ = std::max(best_rate_, rate);
+  slow_measures_ = rate * kSlowest < best_rate_ ? slow_measures_ + 1 : 0;
+  measure_began_ = now;
+  measured_acks_ = 0;
+  if (slow_measures_ < kSlowMeasures || Unsettled(desk_.devices()) < 2) return;
+  Device& slow = *master_;
+  if (slow.figures.overruns > 0) {
+    desk_.SetReleased(slow, "is more than ten times slower than others", now);
   } else {
-    Device* slow = master_;
-    desk_.GiveRole(*slow, Role::kPassive, now);
-    ElectAfter(slow, now);
+    desk_.GiveRole(slow, Role::kPassive, now);
   }
+  ElectAfter(&slow, now);
 }
 
 // ---- time ----
@@ -174,11 +191,15 @@ void FirstPass::Measure(Micros now) {
 Micros FirstPass::Patience() const {
   const MulticastOptions& options = desk_.options();
   if (!window_.round_trip().known()) return options.ack_wait;
-  return std::clamp(window_.round_trip().Bound(), kLeastPatience, options.ack_wait_max);
+  // Answers to blocks that went out twice measure nothing: until there are others, patience grows.
+  const Micros bound = std::max(window_.round_trip().Bound(), 2 * window_.round_trip().smoothed());
+  return std::min(std::max(bound, kLeastPatience) * (1U << backoff_), options.ack_wait_max);
 }
 
 void FirstPass::OnTime(Micros now) {
   if (done_ || master_ == nullptr) return;
+  Measure(now);
+  if (done_) return;
   if (electing_) {
     if (now < asked_at_ + desk_.options().elect_wait) return;
     if (tries_ < desk_.options().elect_tries) {
@@ -195,7 +216,9 @@ void FirstPass::OnTime(Micros now) {
   // Blocks that are paced expire one by one, and each makes room for another: so silence is told by
   // when the master was heard, not by an empty way.
   bool silent = false;
-  while (!flight_.empty() && now >= flight_.front().sent_at + Patience()) {
+  const Micros patience = Patience();
+  while (!flight_.empty() && now >= flight_.front().sent_at + patience) {
+    backoff_ = std::min(backoff_ + 1, kMostBackoff);
     silent = master_->heard_at <= flight_.front().sent_at;
     Lost(flight_.front());
     flight_.pop_front();

@@ -52,6 +52,8 @@ class FirstPass {
   void CheckEnd();
   void Finish();
   void Measure(Micros now);
+  void MeasureAnew(Micros now);
+  [[nodiscard]] double MeasuredRate(Micros now) const;
   [[nodiscard]] bool MayRepeat() const;
   [[nodiscard]] Micros Patience() const;
 
@@ -71,12 +73,13 @@ class FirstPass {
   std::deque<InFlight> flight_;
   std::set<std::uint32_t> lacking_;  ///< not acknowledged by the master
   std::uint32_t wasted_ = 0;         ///< blocks sent again that the master had
+  unsigned backoff_ = 0;             ///< doublings of the patience
 
   // Whether a slow master is worth waiting for:
-  Micros second_began_{0};
-  std::uint32_t acked_in_second_ = 0;
-  std::uint32_t best_second_ = 0;
-  std::uint32_t slow_seconds_ = 0;
+  Micros measure_began_{0};
+  std::uint32_t measured_acks_ = 0;
+  double best_rate_ = 0;  ///< blocks per second that any master has acknowledged
+  std::uint32_t slow_measures_ = 0;
   bool done_ = false;
 };
 

@@ -8,15 +8,17 @@ namespace {
 constexpr double kFirstSize = 4;
 constexpr double kLeastSize = 2;
 /// Of a device's receive buffer, which holds 32 KiB: what may wait in it, in bytes.
-constexpr double kQueueLow = 11'200;
-constexpr double kQueueHigh = 22'400;
+constexpr double kQueue = 22'400;
+constexpr double kTry = 1.1;
+constexpr double kBack = 0.6;
 
 }  // namespace
 
 SendWindow::SendWindow(std::uint32_t limit, std::uint16_t block_size)
     : limit_(std::max<std::uint32_t>(limit, 1)),
-      queue_low_(std::max(1.0, kQueueLow / block_size)),
-      queue_high_(std::max(2.0, kQueueHigh / block_size)),
+      queue_(std::max(2.0, kQueue / block_size)),
+      queue_allowed_(queue_),
+      queue_most_(limit_),
       size_(std::min(kFirstSize, limit_)) {}
 
 void SendWindow::OnAck(Micros sent_at, Micros now) {
@@ -33,16 +35,21 @@ void SendWindow::EndRound() {
   const double least = static_cast<double>(round_trip_.least().count());
   const double queued = size_ * (1 - least / static_cast<double>(round_least_.count()));
   const bool half_lost = lost_ > acked_;
-  const bool queue_lost = lost_ * 10 > acked_ + lost_ && queued > queue_low_;
+  const bool queue_lost = lost_ * 10 > acked_ + lost_ && queued > queue_ / 2;
+  if (lost_ > 0 && queued > queue_) {
+    queue_most_ = std::max(queue_, std::min(queued, queue_allowed_) * kBack);
+    queue_allowed_ = queue_most_;
+  }
   if (half_lost || queue_lost) {
     Reduce();
-  } else if (queued > queue_high_) {
+  } else if (queued > queue_allowed_) {
     size_ -= std::max(1.0, size_ / 8);
     starting_ = false;
-  } else if (queued < queue_low_) {
+  } else if (queued < queue_allowed_ / 2) {
     size_ += starting_ ? size_ : std::max(1.0, size_ / 8);
   } else {
     starting_ = false;
+    if (alone_ && lost_ == 0) queue_allowed_ = std::min(queue_allowed_ * kTry, queue_most_);
   }
   size_ = std::clamp(size_, std::min(kLeastSize, limit_), limit_);
   acked_ = 0;

@@ -11,7 +11,8 @@ namespace server {
 /// Grows while answers come as fast as on an empty way, and stops when blocks begin to queue up
 /// before the device: a handheld buffers some twenty datagrams, so queueing is watched in blocks
 /// and kept well below that. Single losses, which are everyday life on a radio, do not shrink it;
-/// losses behind a queue, losses of half a round and silence do.
+/// losses behind a queue, losses of half a round and silence do. Where nobody else listens, it
+/// tries how much more the device bears.
 class SendWindow {
  public:
   /// @param limit  blocks, at least 1
@@ -19,6 +20,8 @@ class SendWindow {
 
   [[nodiscard]] std::uint32_t size() const { return static_cast<std::uint32_t>(size_); }
   [[nodiscard]] const RoundTrip& round_trip() const { return round_trip_; }
+  /// Others hear what is sent too, and say nothing when it is too much for them.
+  void SetAlone(bool alone) { alone_ = alone; }
 
   /// @param sent_at  when the block that is acknowledged went out; it was sent once
   void OnAck(Micros sent_at, Micros now);
@@ -32,8 +35,10 @@ class SendWindow {
   void EndRound();
 
   double limit_;
-  double queue_low_;   ///< blocks that may wait before the device; below: grow
-  double queue_high_;  ///< above: shrink
+  double queue_;          ///< blocks that any device can hold
+  double queue_allowed_;  ///< blocks that may wait before this one; below half of it: grow
+  double queue_most_;     ///< what has turned out to be too much, less a good part
+  bool alone_ = false;
   double size_;
   bool starting_ = true;  ///< doubles with every round
 
