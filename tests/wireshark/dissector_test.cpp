@@ -4,9 +4,11 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <random>
 #include <string>
 #include <string_view>
 
@@ -243,6 +245,29 @@ TEST_F(DissectorTest, TakesEveryLengthOfEveryFrame) {
   std::string expected;
   for (std::size_t i = 0; i < packets; ++i) expected += "MCFTP|\n";
   EXPECT_EQ(output, expected);
+}
+
+TEST_F(DissectorTest, TakesAnyBytes) {
+  std::mt19937 random(7000);
+  for (int i = 0; i < 2000; ++i) {
+    test::Bytes frame(2 + random() % 120);
+    for (std::uint8_t& byte : frame) {
+      byte = static_cast<std::uint8_t>(random() % 4 == 0 ? random() : 0);
+    }
+    frame[0] = static_cast<std::uint8_t>(random() % 2 == 0 ? 0x80 : 0);
+    frame[1] = static_cast<std::uint8_t>(random());
+    Add(kServer, kPublicGroup, frame);
+  }
+
+  EXPECT_EQ(Fields("frame.number _ws.lua.error", "-Y '_ws.lua.error or !mcftp'"), "");
+}
+
+TEST_F(DissectorTest, TakesATimeStampThatFillsItsField) {
+  test::Bytes frame = Hex(golden::kAnnouncement);
+  std::fill_n(frame.begin() + 22, 20, std::uint8_t{'9'});
+  Add(kServer, kPublicGroup, frame);
+
+  EXPECT_EQ(Fields("mcftp.time_stamp mcftp.file_name"), "99999999999999999999|\\Temp\\a.bin\n");
 }
 
 TEST_F(DissectorTest, ReadsCapturesWhoseChecksumsAreRight) {

@@ -270,7 +270,7 @@ end
 local function add_text(tree, field, frame, at)
   local length = text_length(frame, at)
   if length == nil then return nil end
-  local text = frame(at, length):stringz()
+  local text = up_to_zero(frame(at, length))
   tree:add(field, frame(at, length), text)
   return text, at + length
 end
@@ -293,7 +293,7 @@ show[ANNOUNCEMENT] = function(frame, tree)
   tree:add(f.oack_wait, frame(10, 4))
   tree:add(f.attributes, frame(14, 4))
   tree:add(f.transfer, frame(18, 4))
-  tree:add(f.time_stamp, frame(22, 20), frame(22, 20):stringz())
+  tree:add(f.time_stamp, frame(22, 20), up_to_zero(frame(22, 20)))
   tree:add(f.server_port, frame(42, 2))
   tree:add(f.server_address, frame(44, 4))
   tree:add(f.step_percent, frame(48, 1))
