@@ -10,6 +10,8 @@ using State = Device::Closing;
 
 constexpr Micros kLeastWait = std::chrono::milliseconds(10);
 constexpr Micros kFirstWait = std::chrono::milliseconds(200);
+/// Who lets so many questions pass makes room for others.
+constexpr std::uint32_t kSilentTries = 2;
 
 }  // namespace
 
@@ -22,15 +24,32 @@ void Closing::NextGroup(Micros now) {
   stage_ = Stage::kAsking;
   to_send_ = 0;
   sendings_ = 0;
-  for (Device& device : desk_.devices()) {
-    if (device.settled()) continue;
-    if (group_.size() >= desk_.options().poll_group) break;
-    device.closing = State::kAsked;
-    device.tries = 0;
-    group_.push_back(&device);
-  }
+  Fill(now);
   done_ = group_.empty();
-  for (Device* device : group_) Ask(*device, now);
+}
+
+/// Silent devices do not keep others out of the group, and those that were silent before come last.
+void Closing::Fill(Micros now) {
+  std::size_t answering = 0;
+  for (const Device* device : group_) {
+    if (device->tries <= kSilentTries) ++answering;
+  }
+  for (const bool deferred : {false, true}) {
+    for (Device& device : desk_.devices()) {
+      if (answering >= desk_.options().poll_group) return;
+      if (device.settled() || device.deferred != deferred || InGroup(device)) continue;
+      ++answering;
+      device.closing = State::kAsked;
+      if (!deferred) device.tries = 0;
+      group_.push_back(&device);
+      Ask(device, now);
+    }
+    if (!group_.empty()) return;
+  }
+}
+
+bool Closing::InGroup(const Device& device) const {
+  return std::find(group_.begin(), group_.end(), &device) != group_.end();
 }
 
 void Closing::Ask(Device& device, Micros now) {
@@ -48,12 +67,11 @@ std::size_t Closing::Count(State state) const {
 // ---- what comes back ----
 
 void Closing::OnNak(Device& device, Micros now) {
-  const bool asked = std::find(group_.begin(), group_.end(), &device) != group_.end();
-  if (asked && now >= device.asked_at + Wait(device)) Ask(device, now);
+  if (InGroup(device) && now >= device.asked_at + Wait(device)) Ask(device, now);
 }
 
 void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
-  if (std::find(group_.begin(), group_.end(), &device) == group_.end()) return;
+  if (!InGroup(device)) return;
   if (block == log_.count()) {
     const bool has_all = device.closing >= State::kHasGuard || device.recalled;
     if (has_all && log_.sent_at(block) != BlockLog::kNever) {
@@ -99,7 +117,7 @@ void Closing::Go(Micros now) {
     NextGroup(now);
     return;
   }
-  if (stage_ == Stage::kAsking && Count(State::kAsked) == 0) {
+  if (stage_ == Stage::kAsking && AllHaveAnswered()) {
     stage_ = Stage::kGuard;
     if (Count(State::kReady) > 0) to_send_ = log_.guard();
   }
@@ -111,6 +129,20 @@ void Closing::Go(Micros now) {
       Count(State::kLacksLast) > 0) {
     to_send_ = log_.count();
   }
+}
+
+/// Whether the group can go on. Those that answer no more are left for the end.
+bool Closing::AllHaveAnswered() {
+  if (Count(State::kAsked) == 0) return true;
+  const auto is_silent = [this](const Device* device) {
+    return device->closing == State::kAsked && device->tries > desk_.options().elect_tries;
+  };
+  const auto silent =
+      static_cast<std::size_t>(std::count_if(group_.begin(), group_.end(), is_silent));
+  if (silent == group_.size() || silent < Count(State::kAsked)) return false;
+  for (Device* device : group_) device->deferred = device->deferred || is_silent(device);
+  group_.erase(std::remove_if(group_.begin(), group_.end(), is_silent), group_.end());
+  return true;
 }
 
 std::uint32_t Closing::TakeBlock(Micros now) {
@@ -177,6 +209,7 @@ void Closing::OnTime(Micros now) {
     }
   }
   if (guard_due) to_send_ = log_.guard();
+  if (stage_ == Stage::kAsking && !group_.empty()) Fill(now);
   if (!group_.empty()) Go(now);
 }
 

@@ -39,6 +39,9 @@ class Closing {
   enum class Stage : std::uint8_t { kAsking, kGuard, kLast };
 
   void NextGroup(Micros now);
+  void Fill(Micros now);
+  [[nodiscard]] bool InGroup(const Device& device) const;
+  [[nodiscard]] bool AllHaveAnswered();
   void Ask(Device& device, Micros now);
   void Answered(Device& device, Device::Closing state, Micros now);
   void Go(Micros now);

@@ -68,7 +68,10 @@ void FirstPass::Elect(Device& candidate, Micros now) {
   from_start_ = from_start_ && (next_ == 1 || &candidate == master_);
   for (const InFlight& flying : flight_) lacking_.insert(flying.block);
   flight_.clear();
-  if (&candidate != master_) MeasureAnew(now);
+  if (&candidate != master_) {
+    MeasureAnew(now);
+    lost_ = 0;
+  }
   if (master_ != nullptr && &candidate != master_) {
     lacking_.clear();  // nothing is known of what the new one lacks
     window_ = SendWindow(desk_.options().window, desk_.block_size());
@@ -153,6 +156,7 @@ void FirstPass::Acknowledged(std::uint32_t block, bool duplicate, Micros now) {
 
 void FirstPass::Lost(const InFlight& gone) {
   lacking_.insert(gone.block);
+  ++lost_;
   window_.OnLoss();
 }
 
@@ -267,7 +271,9 @@ void FirstPass::CheckEnd() {
 
 void FirstPass::Finish() {
   done_ = true;
-  if (master_ != nullptr && !electing_ && from_start_ && lacking_.empty()) {
+  if (master_ == nullptr) return;
+  master_->figures.loss = static_cast<double>(lost_) / std::max<double>(next_, 1);
+  if (!electing_ && from_start_ && lacking_.empty()) {
     master_->whole = true;
     master_->position = log_.guard();
   }

@@ -72,6 +72,7 @@ class FirstPass {
   std::uint32_t next_ = 1;
   std::deque<InFlight> flight_;
   std::set<std::uint32_t> lacking_;  ///< not acknowledged by the master
+  std::uint32_t lost_ = 0;           ///< sendings that the master did not acknowledge
   std::uint32_t wasted_ = 0;         ///< blocks sent again that the master had
   unsigned backoff_ = 0;             ///< doublings of the patience
 

@@ -15,6 +15,9 @@ constexpr std::uint32_t kMostAhead = 16;
 constexpr double kPatienceWithOne = 10;
 constexpr std::uint64_t kFreeRepairs = 64;
 constexpr std::uint32_t kQuickTries = 4;
+/// Who lets so many questions pass makes room for others, and is asked on.
+constexpr std::uint32_t kSilentTries = 2;
+constexpr Micros kFirstBound = std::chrono::milliseconds(200);
 
 }  // namespace
 
@@ -34,7 +37,7 @@ void Repair::OnJoin(Micros now) {
 void Repair::Fill(Micros now) {
   std::size_t answering = 0;
   for (const Device* device : group_) {
-    if (device->tries <= desk_.options().nak_tries) ++answering;
+    if (device->tries <= kSilentTries) ++answering;
   }
   bool waiting = !group_.empty();
   for (Device& device : desk_.devices()) {
@@ -93,6 +96,8 @@ void Repair::OnNak(Device& device, std::uint32_t block, Micros now) {
   device.tries = 0;
   if (block > device.position) Advance(device, block, now);
   device.named_at = now;
+  device.figures.loss =
+      std::max(device.figures.loss, static_cast<double>(device.gaps) / device.position);
   if (block < log_.guard()) return;
   device.whole = true;
   desk_.GiveRole(device, Role::kPassive, now);
@@ -105,6 +110,7 @@ void Repair::Advance(Device& device, std::uint32_t block, Micros now) {
     device.round_trip.Add(now - log_.sent_at(device.position));
   }
   device.run = block == device.position + 1 ? device.run + 1 : 0;
+  if (device.position > 0) ++device.gaps;
   device.position = block;
   device.sends = block <= device.ahead ? 1 : 0;
 }
@@ -113,7 +119,7 @@ void Repair::Advance(Device& device, std::uint32_t block, Micros now) {
 
 Micros Repair::Bound(const Device& device) const {
   const Micros most = desk_.options().nak_wait;
-  if (!device.round_trip.known()) return most;
+  if (!device.round_trip.known()) return std::min(kFirstBound, most);
   // Twice the round trip: a queue on the way grows while we send.
   const Micros bound = std::max(device.round_trip.Bound(), 2 * device.round_trip.smoothed());
   return std::clamp(bound, kLeastBound, most);
@@ -225,7 +231,7 @@ void Repair::OnTime(Micros now) {
       continue;
     }
     Ask(*device, now);
-    if (device->tries == desk_.options().nak_tries + 1) Fill(now);
+    if (device->tries == kSilentTries + 1) Fill(now);
   }
 }
 

@@ -44,6 +44,7 @@ struct Device {
   std::uint32_t run = 0;    ///< gaps next to each other that it has named in a row
   std::uint32_t ahead = 0;  ///< blocks up to here have been looked at for it
   std::uint64_t alone = 0;  ///< repairs that went out for it alone
+  std::uint32_t gaps = 0;   ///< blocks that it has named
 
   // The end of the file:
   enum class Closing : std::uint8_t {
@@ -54,6 +55,7 @@ struct Device {
     kLacksLast,  ///< and did not get it
   };
   Closing closing = Closing::kAsked;
+  bool deferred = false;  ///< it did not answer while others did
 
   [[nodiscard]] bool settled() const { return figures.state != DeviceState::kJoined; }
 };

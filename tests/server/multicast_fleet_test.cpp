@@ -21,6 +21,7 @@ struct Circumstances {
   std::size_t size = 1'000'000;
   std::uint64_t seed = 1;
   std::uint32_t window = 64;
+  std::uint32_t expected = 0;  ///< 0: as many as there are devices
   ModelNetwork::Link link;
 };
 
@@ -30,7 +31,9 @@ class MulticastFleetTest : public ::testing::Test {
     content_ = SomeBytes(with.size);
     MulticastOptions options;
     options.window = with.window;
-    options.start.expected = static_cast<std::uint32_t>(with.devices);
+    options.start.expected =
+        with.expected > 0 ? with.expected : static_cast<std::uint32_t>(with.devices);
+    options.first_transfer_id = 0x11;
     options.seed = with.seed;
     ModelNetwork::Link link = with.link;
     link.loss_down = with.loss;
@@ -246,6 +249,27 @@ TEST_F(MulticastFleetTest, DoesNotCallADeviceProvenThatGaveTheFileUp) {
   network.Run();
   ExpectTruth(/*all=*/false);
   EXPECT_EQ(Figures().Count(DeviceState::kProven), 1U);
+}
+
+TEST_F(MulticastFleetTest, ServesItsDevicesAmongHundredsThatOnlySeemToBeThere) {
+  for (const std::size_t size : {500U, 2000U, 100'000U}) {
+    Circumstances with;
+    with.devices = 6;
+    with.size = size;
+    with.loss = 0.02;
+    with.expected = 506;
+    ModelNetwork& network = Make(with);
+    network.At(std::chrono::microseconds(200), [&] {
+      for (std::uint32_t i = 0; i < 500; ++i) {
+        network.run().OnDatagram({0x0A020000 + i, 7000}, Request(0x11, kName, true), network.now());
+      }
+      network.Pump();
+    });
+    network.Run();
+    ExpectTruth(/*all=*/true);
+    EXPECT_EQ(Figures().Count(DeviceState::kDead), 500U);
+    EXPECT_LT(Figures().ended - Figures().data_began, std::chrono::seconds(60)) << size;
+  }
 }
 
 TEST_F(MulticastFleetTest, SendsFileAfterFileAndEndsEveryDeviceWithTheLast) {
