@@ -78,6 +78,7 @@ int RunCommandLine(int argc, char** argv) {
   AddDeviceVerb(app, action);
   AddRunVerb(app, action);
   AddExplainVerb(app, action);
+  AddFleetVerb(app, action);
   try {
     RefuseUnknownVerb(app, argc, argv);
     app.parse(argc, argv);

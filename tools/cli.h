@@ -18,6 +18,7 @@ void AddServeVerb(CLI::App& app, Action& action);
 void AddDeviceVerb(CLI::App& app, Action& action);
 void AddRunVerb(CLI::App& app, Action& action);
 void AddExplainVerb(CLI::App& app, Action& action);
+void AddFleetVerb(CLI::App& app, Action& action);
 
 /// Adds --json, with the verb's own words about what it changes.
 void AddJsonOption(CLI::App& verb, bool& json, const std::string& effect);
