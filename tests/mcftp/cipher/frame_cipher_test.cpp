@@ -32,11 +32,21 @@ TEST_F(FrameCipherTest, SealsAndOpensGoldenFrames) {
   const struct {
     const char* clear;
     const char* enciphered;
-  } kCases[] = {{golden::kAck0, golden::kEncipheredAck0},
-                {golden::kAck5, golden::kEncipheredAck5},
-                {golden::kNak2, golden::kEncipheredNak2},
+  } kCases[] = {{golden::kAnnouncement, golden::kEncipheredAnnouncement},
+                {golden::kMaskedAnnouncement, golden::kEncipheredMaskedAnnouncement},
+                {golden::kEmptyLastFile, golden::kEncipheredEmptyLastFile},
+                {golden::kReadRequest, golden::kEncipheredReadRequest},
+                {golden::kOackPassive, golden::kEncipheredOackPassive},
                 {golden::kOackAckMaster, golden::kEncipheredOackAckMaster},
-                {golden::kOverrun, golden::kEncipheredOverrun}};
+                {golden::kOackNakMaster, golden::kEncipheredOackNakMaster},
+                {golden::kData, golden::kEncipheredData},
+                {golden::kAck0, golden::kEncipheredAck0},
+                {golden::kAck5, golden::kEncipheredAck5},
+                {golden::kDuplicateAck5, golden::kEncipheredDuplicateAck5},
+                {golden::kNak2, golden::kEncipheredNak2},
+                {golden::kOverrun, golden::kEncipheredOverrun},
+                {golden::kUnknownTransfer, golden::kEncipheredUnknownTransfer},
+                {golden::kDiskFull, golden::kEncipheredDiskFull}};
   for (const auto& c : kCases) {
     Bytes frame = Seal(Hex(c.clear));
     EXPECT_EQ(ToHex(frame), c.enciphered);
