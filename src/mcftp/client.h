@@ -41,12 +41,12 @@ struct Session {
   std::uint32_t transfer_id = 0;
   std::uint8_t step_percent = 0;
   std::uint16_t step_kib = 0;
-  /// Kept, and never used: frames go to whoever sent the last one that was no DATA frame.
+  /// KEPT ODDITY: kept, and never used: frames go to whoever sent the last one that was no DATA.
   std::uint16_t server_port = 0;
   std::uint32_t server_address = 0;
 };
 
-/// What is counted for one file and begins anew with the next.
+/// What is counted for one file and begins anew with the next. Some of it is only kept.
 struct FileProgress {
   std::uint32_t bytes = 0;               ///< written
   std::uint32_t bytes_since_report = 0;  ///< to the user interfaces
@@ -79,9 +79,6 @@ class McftpClient : public device::OnLocalHeap {
 
   /// Waits until the client's thread, if there ever was one, has done its very last act.
   void AwaitEnd() noexcept;
-
-  /// Valid after AwaitEnd.
-  [[nodiscard]] const RunCounters& counters() const noexcept { return counters_; }
 
  private:
   /// The machine's record. An event chooses both the next state and the action that runs there.
@@ -191,11 +188,11 @@ class McftpClient : public device::OnLocalHeap {
 
   Session session_;
   base::FixedText<kMaxFileName + 1> file_name_;  ///< as announced
-  bool file_is_known_ = false;  ///< file_name_ is in hand: announcements of it are not heard
-  TimeStamp time_stamp_;        ///< survives files that bring none
-  Role role_ = Role::kPassive;  ///< survives files, too
-  bool duplicate_ = false;      ///< the last block had come before
-  bool error_received_ = false;
+  bool file_is_known_ = false;        ///< file_name_ is in hand: announcements of it are not heard
+  TimeStamp time_stamp_;              ///< survives files that bring none
+  Role role_ = Role::kPassive;        ///< survives files, too
+  bool duplicate_ = false;            ///< the last block had come before
+  bool error_received_ = false;       ///< only kept
   bool private_group_known_ = false;  ///< what follows is this session's
   std::uint32_t private_address_ = 0;
   std::uint16_t private_port_ = 0;

@@ -31,14 +31,17 @@ Event McftpClient::AwaitAnnouncement() noexcept {
     }
     if (frame_.header.Is(Opcode::kOptionAck)) AnswerForPreviousFile();
   } while (!frame_.header.Is(Opcode::kAnnouncement));
+  const bool last_file = frame_.announcement.last_file;
+  if (last_file) Log("Last file flag set");
+  if (!IsForThisDevice()) return last_file ? Event::EventShutdown : Event::EventAbort;
   ReadAnnouncement();
-  if (!IsForThisDevice()) {
-    return session_.last_file ? Event::EventShutdown : Event::EventAbort;
-  }
   return AcceptFile();
 }
 
 /// The server has not heard the answer that ended the file before.
+///
+/// KEPT ODDITY: a client that waits for an announcement answers OACKs, though it has no session;
+/// one that has had no file acknowledges block 0.
 void McftpClient::AnswerForPreviousFile() noexcept {
   if (role_ == Role::kNakMaster) {
     Log("Resending NAK for block number %u (last)", static_cast<unsigned>(session_.block_count));
@@ -49,6 +52,8 @@ void McftpClient::AnswerForPreviousFile() noexcept {
   }
 }
 
+/// What a rejected announcement says is not taken on: until a file is accepted, the client answers
+/// for the one before.
 void McftpClient::ReadAnnouncement() noexcept {
   const Announcement& said = frame_.announcement;
   session_.last_file = said.last_file;
@@ -65,7 +70,6 @@ void McftpClient::ReadAnnouncement() noexcept {
   session_.server_address = names_server ? said.server_address : 0;
   // KEPT ODDITY: a file without a time stamp gets that of the file before.
   if (said.time_stamp[0] != '\0') time_stamp_ = ParseTimeStamp(base::View(said.time_stamp));
-  if (session_.last_file) Log("Last file flag set");
 }
 
 bool McftpClient::IsForThisDevice() noexcept {
@@ -87,6 +91,8 @@ bool McftpClient::IsForThisDevice() noexcept {
   return false;
 }
 
+/// KEPT ODDITY: when the file cannot be opened there is no reset: its name stays known, and further
+/// announcements of it are not heard. The same holds when no request is answered.
 Event McftpClient::AcceptFile() noexcept {
   file_name_.Assign(frame_.announcement.file_name);
   file_is_known_ = true;

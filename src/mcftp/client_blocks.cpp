@@ -68,6 +68,8 @@ bool McftpClient::AnswerRole() noexcept {
   return true;  // not reached
 }
 
+/// KEPT ODDITY: acknowledging the last block ends the file, whatever is missing before it; and a
+/// passive client never ends a file by itself.
 Event McftpClient::HandleData() noexcept {
   const std::uint16_t block = frame_.data.block;
   if (role_ == Role::kPassive) CheckOverrun();
@@ -152,8 +154,8 @@ bool McftpClient::SendAck(std::uint16_t block) noexcept {
 
 /// Names the first block that is missing, or the last one when none is.
 ///
-/// KEPT ODDITY: a NAK of the last block is sent once a file and stands for the whole file, also
-/// when just that block is the missing one.
+/// KEPT ODDITY: a NAK of the last block is sent once between two resets and stands for the whole
+/// file, also when just that block is the missing one.
 bool McftpClient::SendNak() noexcept {
   const std::uint16_t last = BlockCount16();
   if (progress_.last_naked == last) return true;

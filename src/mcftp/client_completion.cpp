@@ -23,6 +23,7 @@ void McftpClient::CompleteFile() noexcept {
     ++(right ? counters_.files_received : counters_.size_mismatches);
   }
   if (!right) {
+    // The size that was found wrong, which is not always the number of bytes received.
     Log("Rx size mismatch (Tx size: %u, Rx bytes: %u)", static_cast<unsigned>(session_.file_size),
         static_cast<unsigned>(size));
   }

@@ -35,6 +35,8 @@ Event McftpClient::SendRequest() noexcept {
 }
 
 /// The request was all that there is to such a file.
+///
+/// KEPT ODDITY: the last file is left open by this, and gets neither time nor attributes.
 Event McftpClient::EndZeroLengthFile() noexcept {
   Log("Zero length file announced: %s", file_name_.c_str());
   if (!session_.last_file) return Event::EventAbort;
@@ -62,7 +64,9 @@ Event McftpClient::AwaitOack() noexcept {
   return Event::EventErrorFrame;
 }
 
-/// Only a session's first OACK says which group it is; whatever role it gives is not answered.
+/// Only a session's first OACK says which group it is.
+///
+/// KEPT ODDITY: it is never answered, whatever role it gives; the role counts all the same.
 Event McftpClient::JoinPrivateGroup() noexcept {
   if (!private_group_known_) {
     private_address_ = frame_.oack.address;

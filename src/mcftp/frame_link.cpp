@@ -52,10 +52,11 @@ bool FrameLink::JoinPrivateGroup(std::uint32_t address, std::uint16_t port) noex
   LeavePrivateGroup();
   private_group_ = group;
   private_port_ = port;
-  if (port != public_.port()) {
+  private_is_public_ = port == public_.port() && group == public_group_;
+  if (private_is_public_) {
+    private_joined_ = true;  // a member already, and for good
+  } else if (port != public_.port()) {
     private_joined_ = JoinOnOwnSocket();
-  } else if (group == public_group_) {
-    return true;  // a member already, and for good
   } else {
     private_joined_ = public_.JoinGroup(private_group_text().c_str());
   }
@@ -75,7 +76,8 @@ AddressText FrameLink::private_group_text() const noexcept {
 }
 
 void FrameLink::LeavePrivateGroup() noexcept {
-  if (private_joined_) (private_.is_open() ? private_ : public_).LeaveGroup();
+  const bool drops = private_joined_ && !private_is_public_;
+  if (drops) (private_.is_open() ? private_ : public_).LeaveGroup();
   private_.Close();
   private_joined_ = false;
 }

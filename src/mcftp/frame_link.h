@@ -49,7 +49,7 @@ struct FileInHand {
 /// thread alone. Logs nothing.
 class FrameLink {
  public:
-  /// Longest frame that a client sends is a read request; the cipher needs room behind it.
+  /// The longest frame that a client sends is a read request; the cipher needs room behind it.
   static constexpr std::size_t kSendBuffer = 1024;
 
   FrameLink() noexcept = default;
@@ -76,6 +76,7 @@ class FrameLink {
   [[nodiscard]] bool JoinPrivateGroup(std::uint32_t address, std::uint16_t port) noexcept;
   [[nodiscard]] bool private_group_joined() const noexcept { return private_joined_; }
   [[nodiscard]] AddressText private_group_text() const noexcept;
+  /// The public group stays joined if it is the private one, too.
   void LeavePrivateGroup() noexcept;
 
   // ---- frames ----
@@ -91,7 +92,7 @@ class FrameLink {
 
   /// Waits for a frame. What cannot be a frame, a repeated announcement of the file in hand, DATA
   /// that is not the server's or not the file's: all that is dropped and uses up the wait. A
-  /// dropped frame may still switch the cipher or say who the server is.
+  /// dropped frame may still switch the cipher; it never says who the server is.
   /// @param timeout_ms  0 waits without limit
   [[nodiscard]] bool Receive(std::uint32_t timeout_ms, const FileInHand& file,
                              Frame& frame) noexcept;
@@ -113,6 +114,7 @@ class FrameLink {
   std::uint32_t private_group_ = 0;  ///< network order; the group joined last
   std::uint16_t private_port_ = 0;
   bool private_joined_ = false;
+  bool private_is_public_ = false;  ///< the file comes over the public group, which is never left
   bool enciphering_ = false;
   device::LocalObject<KeyedCipher> cipher_;
   std::size_t sent_length_ = 0;  ///< of the datagram in the buffer

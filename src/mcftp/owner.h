@@ -21,7 +21,8 @@ struct ClientOwner {
   void (*log)(void* context, const WCHAR* line) = nullptr;
 
   /// Where progress is posted as `message` (wParam: address of the file's name, lParam: percent)
-  /// while no user interface is to be told by datagram. Null or 0: nowhere.
+  /// while no user interface is to be told by datagram. Null or 0: nowhere. The name is the
+  /// client's own: it changes with the next file, unannounced, and is gone with the client.
   HWND window = nullptr;
   UINT message = 0;
 

@@ -35,7 +35,7 @@ class OverrunWatch {
   /// The block that was reported last and has not been caught up with, 0 for none.
   [[nodiscard]] std::uint16_t recorded_block() const noexcept { return recorded_block_; }
   void ForgetRecordedBlock() noexcept { recorded_block_ = 0; }
-  /// Whether the block checked last was short of its full share.
+  /// Whether the block checked last was short of its full share. Nothing depends on it.
   [[nodiscard]] bool is_short() const noexcept { return short_; }
 
  private:

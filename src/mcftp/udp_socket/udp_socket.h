@@ -103,8 +103,7 @@ struct Datagram {
   [[nodiscard]] explicit operator bool() const noexcept { return bytes != nullptr; }
 };
 
-/// The host's own name and address, and receiving, which needs to know
-/// them.
+/// The host's own name and address, and receiving, which needs to know them.
 class UdpNetwork {
  public:
   UdpNetwork() noexcept = default;

@@ -125,8 +125,9 @@ static_assert(PackHeader(UnpackHeader(0xFFFF)) == 0x81FF);
   return static_cast<Role>(header.role_bits);
 }
 
-/// The fixed part of a frame, in bytes. A shorter frame is dropped, whoever receives it; a number
-/// that is no opcode has the header alone.
+/// The fixed part of a frame, in bytes. A shorter frame is dropped by those whom it is meant for; a
+/// client takes frames that only servers receive at any length. A number that is no opcode has the
+/// header alone.
 [[nodiscard]] std::size_t MinimumLength(std::uint8_t opcode) noexcept;
 
 /// What a server says about a file before it sends it.

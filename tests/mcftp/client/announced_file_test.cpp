@@ -296,4 +296,89 @@ TEST_F(AnnouncedFileTest, TellsNamesApartByTheirLetters) {
   EndWaiting();
 }
 
+TEST_F(AnnouncedFileTest, ARejectedOneIsNotTheFileBefore) {
+  Start(std::string(test::kOptions) + " -HV=MR41");
+  Offer offer;
+  offer.size = 600;
+  EstablishAsMaster(offer);
+  ToPrivate(Data(1, 512));
+  ToPrivate(Data(2, 88));
+  ToPrivate(Data(2, 88));
+  Offer rejected;
+  rejected.masks = "XX*";
+  rejected.stamp = "2011-11-11 11:11:11";
+  ToPublic(Announcement(rejected));
+  Forget();
+
+  ToClient(test::kOackAck);
+
+  EXPECT_EQ(Frames(), Lines{ToHex(Ack(2))}) << "not of the 3 blocks that were offered";
+  offer.name = "\\Temp\\b.bin";
+  offer.stamp = "";
+  ToPublic(Announcement(offer));
+  ToClient(test::kOackAck);
+  ToPrivate(Data(2, 88));
+  WIN32_FIND_DATAW found;
+  FindClose(FindFirstFileW(TEXT("\\Temp\\b.bin"), &found));
+  SYSTEMTIME time = {};
+  FileTimeToSystemTime(&found.ftLastWriteTime, &time);
+  EXPECT_EQ(time.wYear, 2006) << "nor its time stamp";
+  EndWaiting();
+}
+
+TEST_F(AnnouncedFileTest, SaysWhenTheFolderIsThereAndTheFileStillDoesNotOpen) {
+  test::PutFile("\\Temp\\a.bin", "old");
+  test::SetAttributesOf("\\Temp\\a.bin", FILE_ATTRIBUTE_READONLY);
+  Start();
+
+  ToPublic(Announcement({}));
+
+  EXPECT_THAT(Log(), ElementsAre("Announcement on 239.1.1.1 for:", "\\Temp\\a.bin",
+                                 "MCT mask(s): ", "Data blocks: 3", "Opening: \\Temp\\a.bin (1300)",
+                                 "Error creating: \\Temp\\a.bin", kWaiting));
+  EndWaiting();
+}
+
+/// A server that repeats itself faster than it answers keeps nobody waiting.
+TEST_F(AnnouncedFileTest, RepeatedAnnouncementsDoNotPutTheNextRequestOff) {
+  Start();
+  sim::VirtualPort stranger(world(), {0x0A000009, 7001},
+                            [](sim::VirtualPort&, const sim::Endpoint&, std::string_view) {});
+  const milliseconds begin = Now();
+  ToPublic(Announcement({}));
+  Forget();
+
+  while (Now() - begin < milliseconds(960)) {
+    Wait(milliseconds(95));
+    ToPublic(Announcement({}));
+    stranger.Send(test::kClient, Data(1, 512));
+  }
+  EXPECT_THAT(Log(), IsEmpty());
+  Wait(milliseconds(1010) - (Now() - begin));
+
+  EXPECT_THAT(Log(), ElementsAre("Timeout waiting for Option Ack, retrying...",
+                                 "Establishing session with 10.0.0.2", "RRQ Retry: 1",
+                                 "RRQ sent to 10.0.0.2"));
+  EndWaiting();
+}
+
+TEST_F(AnnouncedFileTest, AnswersForTheFileBeforeEvenWhenTheyCannotBeSent) {
+  Start();
+  ReceiveAllButTheLast();
+  ToPrivate(Data(2, 88));
+  device().faults().Add({"sendto", 1, 0});
+  ToClient(test::kOackAck);
+  EXPECT_THAT(Log(), Contains("Resending ACK for block number 2 (last)")) << "in the dally";
+  ToPrivate(Data(2, 88));
+  Forget();
+  ToClient(test::kOackAck);
+  ToClient(test::kOackNak);
+  EXPECT_THAT(Log(), ElementsAre("Resending ACK for block number 2 (last)", "OACK Received",
+                                 "Change in Master Client status", "Master Client: TRUE (NAKing)",
+                                 "Resending NAK for block number 2 (last)", "NAKing block 2 of 2"));
+  EXPECT_FALSE(has_ended());
+  device().faults().Clear();
+  EndWaiting();
+}
+
 }  // namespace

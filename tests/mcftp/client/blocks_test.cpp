@@ -1,5 +1,6 @@
 // Blocks, from the right server and from others, and the progress they make.
 #include "mcftp/client/transfer_test.h"
+#include "trace/trace.h"
 
 namespace {
 
@@ -10,6 +11,7 @@ using test::Data;
 using test::Hex;
 using test::kErrorFrame;
 using test::kOackAck;
+using test::kOackNak;
 using test::kOackPassive;
 using test::kUnknownFrame;
 using test::kWaiting;
@@ -298,6 +300,156 @@ TEST_F(BlocksTest, BeginsEachFileAtZeroPercent) {
     ToPrivate(Data(2, 88));
     EXPECT_EQ(Status().size(), 1U);
   }
+  EndWaiting();
+}
+
+TEST_F(BlocksTest, WritesTheLastBlockOfTheLargestFileThereIs) {
+  std::vector<std::string> seeks;
+  Start();
+  Offer offer;
+  offer.block_size = 65535;
+  offer.size = 65534U * 65535U + 1;
+  EstablishAsMaster(offer);
+  device().trace().SetSink([&](std::string_view line) {
+    if (line.find("SetFilePointer") != std::string_view::npos) seeks.emplace_back(line);
+  });
+
+  ToPrivate(Data(65535, 1));
+  device().trace().SetSink({});
+
+  ASSERT_EQ(seeks.size(), 1U);
+  EXPECT_THAT(seeks[0], ::testing::HasSubstr("\"distance\":-196606")) << "4,294,770,690 as 32 bits";
+  EXPECT_THAT(seeks[0], ::testing::HasSubstr("\"error\":0")) << "with the upper half";
+  EndWaiting();
+}
+
+TEST_F(BlocksTest, APassiveClientWithEverythingLeavesForAnotherFileWithoutCompletingItsOwn) {
+  Start();
+  Offer offer;
+  offer.size = 600;
+  Establish(offer);
+  ToPrivate(Data(1, 512));
+  ToPrivate(Data(2, 88));
+  Forget();
+  Offer other;
+  other.name = "\\Temp\\b.bin";
+
+  ToPublic(Announcement(other));
+
+  EXPECT_THAT(Log(), ElementsAre(kWaiting));
+  EXPECT_THAT(Frames(), IsEmpty());
+  EXPECT_EQ(test::GetFile("\\Temp\\a.bin"), std::string(512, 'A') + std::string(88, 'B'));
+  EndWaiting();
+}
+
+TEST_F(BlocksTest, ReportsOverrunAgainAndForgetsItWhenCaughtUp) {
+  SetSetting("RxBlocksBeforeOverrun", 4);
+  Start();
+  Offer offer;
+  offer.size = 512 * 40;
+  offer.step_percent = 0;
+  Establish(offer);
+  ToPrivate(Data(5, 512));
+  ToPrivate(Data(9, 512));
+  EXPECT_EQ(Frames().size(), 1U) << "not more than 4 behind the first";
+  ToPrivate(Data(10, 512));
+  EXPECT_THAT(Log(), ElementsAre("<< OVERRUN ERROR: 20.00 at 5", "<< OVERRUN ERROR: 30.00 at 10"));
+  EXPECT_EQ(Frames().size(), 1U);
+
+  for (const unsigned block : {1U, 2U, 3U, 4U, 6U, 7U, 8U, 11U}) ToPrivate(Data(block, 512));
+  EXPECT_THAT(Log(), IsEmpty());
+  ToPrivate(Data(14, 512));  // 12 of 14: caught up, and checked again only behind 10 + 4
+  ToPrivate(Data(30, 512));
+  EXPECT_THAT(Log(), ElementsAre("<< OVERRUN ERROR: 43.33 at 30"));
+  EndWaiting();
+}
+
+TEST_F(BlocksTest, KeepsTheOverrunOnRecordWhileItIsAMaster) {
+  SetSetting("RxBlocksBeforeOverrun", 1);
+  Start();
+  Offer offer;
+  offer.size = 512 * 40;
+  Establish(offer);
+  ToPrivate(Data(4, 512));
+  ToClient(kOackAck);
+  Forget();
+
+  for (const unsigned block : {20U, 30U}) ToPrivate(Data(block, 512));
+  EXPECT_THAT(Log(), IsEmpty()) << "a master does not check";
+  EXPECT_EQ(Frames(), (Lines{ToHex(Ack(20)), ToHex(Ack(30))}));
+  ToClient(kOackNak);
+  Forget();
+  ToPrivate(Data(1, 512));
+  ToPrivate(Data(2, 512));
+  EXPECT_THAT(Log(), ElementsAre("NAKing block 2 of 40", "NAKing block 3 of 40"));
+  ToPrivate(Data(3, 512));
+  EXPECT_THAT(Log(), ElementsAre("NAKing block 5 of 40", "Transitioning from NAK to ACK mode"));
+  EndWaiting();
+}
+
+TEST_F(BlocksTest, BackInAckModeOnlyAnAcknowledgementEndsTheFile) {
+  SetSetting("RxBlocksBeforeOverrun", 1);
+  Start();
+  Offer offer;
+  offer.size = 512 * 4;
+  Establish(offer);
+  ToPrivate(Data(4, 512));  // reported at the last block
+  ToClient(kOackNak);
+  for (const unsigned block : {1U, 2U}) ToPrivate(Data(block, 512));
+  Forget();
+
+  ToPrivate(Data(3, 512));
+  EXPECT_THAT(Log(), ElementsAre("NAKing block 4 of 4", "Transitioning from NAK to ACK mode"))
+      << "the change comes first, and then no ACK of the last block has gone out";
+  ToPrivate(Data(4, 512));
+  EXPECT_THAT(Log(), Contains("File transfer complete (2048 bytes)."));
+  EXPECT_EQ(Frames(), (Lines{ToHex(Nak(4)), "01 40 00 00 00 04"}));
+  EndWaiting();
+}
+
+/// What is named in answer for the file before counts in the next file, when that has as many
+/// blocks.
+TEST_F(BlocksTest, ANakForTheFileBeforeStandsForTheNextOne) {
+  Start();
+  Offer offer;
+  offer.size = 100;
+  EstablishAsMaster(offer);
+  ToPrivate(Data(1, 100));
+  ToPrivate(Data(1, 100));
+  ToClient(kOackNak);
+  EXPECT_THAT(Log(), Contains("Resending NAK for block number 1 (last)"));
+  offer.name = "\\Temp\\b.bin";
+  ToPublic(Announcement(offer));
+  ToClient(kOackNak);
+  Forget();
+
+  ToClient(kOackNak);
+
+  EXPECT_THAT(Log(),
+              ElementsAre("Client elected master client (NAK mode)",
+                          "Rx size mismatch (Tx size: 100, Rx bytes: 0)",
+                          "File transfer complete (0 bytes).", "1 files received (100 total bytes)",
+                          "1 file size mismatches", "Timestamp updated", "Attributes updated",
+                          "File closed: \\Temp\\b.bin", "Dallying..."));
+  EXPECT_THAT(Frames(), IsEmpty());
+  EndWaiting();
+}
+
+TEST_F(BlocksTest, ReportsThatCannotBeSentChangeNothing) {
+  SetSetting("RxBlocksBeforeOverrun", 1);
+  Start();
+  Offer offer;
+  offer.size = 512 * 40;
+  offer.step_percent = 0;
+  Establish(offer);
+  device().faults().Add({"sendto"});
+  ToPrivate(Data(4, 512));
+  EXPECT_THAT(Log(), ElementsAre("<< OVERRUN ERROR: 25.00 at 4"));
+  device().faults().Clear();
+  device().faults().Add({"WriteFile", 1, 1, ERROR_ACCESS_DENIED});
+  device().faults().Add({"sendto"});
+  ToPrivate(Data(5, 512));
+  EXPECT_THAT(Log(), ElementsAre("Failed to write block #5", kWaiting));
   EndWaiting();
 }
 

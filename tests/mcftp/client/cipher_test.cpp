@@ -1,8 +1,5 @@
 // Enciphered frames: the client speaks as it was spoken to last.
 #include "mcftp/client/client_test.h"
-// The platform's own names come last.
-#include "mcftp/registry.h"
-#include "mcftp/settings.h"
 
 namespace {
 
@@ -92,13 +89,8 @@ TEST_F(CipherTest, ReservedBitsAreLookedAtBeforeTheCipher) {
   EndWaiting();
 }
 
-TEST_F(CipherTest, TheSettingCountsUntilTheFirstFrame) {
-  mcftp::Settings settings;
-  ASSERT_TRUE(mcftp::LoadSettings(settings));
-  mcftp::Registry registry;
-  ASSERT_TRUE(
-      registry.Create("HKEY_LOCAL_MACHINE\\Software\\Corvanta\\Device Management\\MCFTP Client"));
-  ASSERT_TRUE(registry.WriteDword("EncryptionEnabled", 1));
+TEST_F(CipherTest, AFrameInTheClearOverrulesTheSetting) {
+  SetSetting("EncryptionEnabled", 1);
   Start();
 
   ToPublic(Announcement({}));

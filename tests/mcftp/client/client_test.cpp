@@ -5,6 +5,9 @@
 #include <utility>
 
 #include "support/device_files.h"
+// The platform's own names come last.
+#include "mcftp/registry.h"
+#include "mcftp/settings.h"
 
 namespace test {
 namespace {
@@ -65,6 +68,15 @@ void MulticastTest::Start(const std::string& options, bool keep_lines) {
   ASSERT_NE(thread_, nullptr);
   Wait(milliseconds(1));
   if (!keep_lines) Forget();
+}
+
+void MulticastTest::SetSetting(const char* name, std::uint32_t value) {
+  mcftp::Settings settings;
+  ASSERT_TRUE(mcftp::LoadSettings(settings));
+  mcftp::Registry registry;
+  ASSERT_TRUE(
+      registry.Create("HKEY_LOCAL_MACHINE\\Software\\Corvanta\\Device Management\\MCFTP Client"));
+  ASSERT_TRUE(registry.WriteDword(name, value));
 }
 
 bool MulticastTest::has_ended() const {

@@ -28,6 +28,8 @@ inline constexpr sim::Endpoint kClient = {kDeviceAddress, 7000};
 inline constexpr sim::Endpoint kPublicGroup = {0xEF010101, 7000};   // 239.1.1.1
 inline constexpr sim::Endpoint kPrivateGroup = {0xEF010102, 7000};  // 239.1.1.2
 
+inline constexpr char kWaiting[] = "Waiting for a Multicast MCFTP Server to announce a file...";
+
 /// The options of most tests.
 inline constexpr char kOptions[] = "-A=239.1.1.1 -P=7000 -UA=127.0.0.1 -UP=5655";
 
@@ -54,6 +56,9 @@ class MulticastTest : public DeviceTest {
   Lines McastLog();
   /// Status datagrams, in hexadecimal up to the name: "01 00 00 27 ... \Temp\a.bin".
   Lines Status();
+
+  /// Before the client starts.
+  static void SetSetting(const char* name, std::uint32_t value);
 
   // ---- the server ----
 

@@ -160,4 +160,28 @@ TEST_F(CompletionTest, DalliesAsLongAsItIsSet) {
   EndWaiting();
 }
 
+TEST_F(CompletionTest, TakesASizeThatCannotBeReadForAWrongOne) {
+  Start();
+  ReceiveAllButTheLast();
+  device().faults().Add({"FlushFileBuffers"});
+  device().faults().Add({"GetFileSize"});
+
+  ToPrivate(Data(2, 88));
+
+  EXPECT_THAT(Log(), Contains("Rx size mismatch (Tx size: 600, Rx bytes: 0)"));
+  EndWaiting();
+}
+
+TEST_F(CompletionTest, NoticesALastBlockThatIsLongerThanItShouldBe) {
+  Start();
+  ReceiveAllButTheLast();
+
+  ToPrivate(Data(2, 512));
+
+  EXPECT_THAT(Log(), Contains("Rx size mismatch (Tx size: 600, Rx bytes: 1024)"));
+  EXPECT_THAT(Status(), ElementsAre("01 00 00 aa 00 00 04 00 00 00 02 58 \\Temp\\a.bin"))
+      << "170 percent";
+  EndWaiting();
+}
+
 }  // namespace

@@ -12,14 +12,13 @@ using test::Hex;
 using test::kOackAck;
 using test::kOackNak;
 using test::kOackPassive;
+using test::kWaiting;
 using test::Nak;
 using test::Offer;
 using test::Request;
 using test::ToHex;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
-
-constexpr char kWaiting[] = "Waiting for a Multicast MCFTP Server to announce a file...";
 
 class ExchangeTest : public MulticastTest {
  protected:

@@ -87,6 +87,17 @@ TEST_F(FrameLinkTest, DoesNotEncipherTwiceWhatItSendsAgain) {
               ElementsAre("80 40 5b 7c ed 9d cb 76 89 c0", "80 42 5b 7c ed 9d cb 76 89 c0"));
 }
 
+TEST_F(FrameLinkTest, EnciphersAsItIsToldUntilTheFirstFrameComes) {
+  ASSERT_TRUE(Receive(test::kOackPassive));
+  link_.set_enciphering(true);
+  EXPECT_TRUE(SendAck(5));
+  EXPECT_THAT(Sent(), ElementsAre("80 40 5b 7c ed 9d cb 76 89 c0"));
+
+  ASSERT_TRUE(Receive(test::kOackPassive));
+  EXPECT_TRUE(SendAck(5));
+  EXPECT_THAT(Sent(), ElementsAre("00 40 00 00 00 05"));
+}
+
 TEST_F(FrameLinkTest, HasNothingToSendAgainAtFirstOrBehindAFailure) {
   ASSERT_TRUE(Receive(test::kOackPassive));
   EXPECT_FALSE(link_.Resend());

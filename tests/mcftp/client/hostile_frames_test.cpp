@@ -188,4 +188,38 @@ TEST_F(HostileFramesTest, LivesThroughDamagedFramesOfAWholeTransfer) {
   ExpectAlive();
 }
 
+TEST_F(HostileFramesTest, DropsBrokenFramesInTheDallyAndBeforeTheOack) {
+  const std::vector<std::string> frames = {Announcement({}), kOackAck, Data(1, 512),
+                                           Hex("00 60 00 00 00 05")};
+  const auto pour_all = [&] {
+    for (const std::string& frame : frames) {
+      const std::size_t least = frame == kOackAck ? 10 : frame == frames[0] ? frame.size() : 6;
+      for (std::size_t length = 0; length < least; ++length) Pour(frame.substr(0, length));
+    }
+    for (std::size_t length = 6; length < 518; length += 5) Pour(frames[2].substr(0, length));
+    Wait(milliseconds(1));
+  };
+  Start();
+  Offer offer;
+  offer.size = 600;
+  offer.oack_wait_ms = 20000;
+  ToPublic(Announcement(offer));
+  Forget();
+  pour_all();
+  EXPECT_THAT(Log(), IsEmpty());
+  EXPECT_THAT(Frames(), IsEmpty());
+
+  ToClient(kOackPassive);
+  ToClient(kOackAck);
+  ToPrivate(Data(1, 512));
+  ToPrivate(Data(2, 88));
+  Forget();
+  pour_all();
+  EXPECT_THAT(Log(), IsEmpty());
+  EXPECT_THAT(Frames(), IsEmpty());
+  ToClient(kOackAck);
+  EXPECT_EQ(Frames(), Lines{ToHex(Ack(2))}) << "still in the dally";
+  ExpectAlive();
+}
+
 }  // namespace

@@ -331,4 +331,36 @@ TEST_F(PrivateGroupTest, BeginsAnewWhenAnAnswerCannotBeSent) {
   EndWaiting();
 }
 
+TEST_F(PrivateGroupTest, IsLeftAtTheEndWhereverItIs) {
+  const struct {
+    std::string oack;
+    const char* group;
+  } cases[] = {{Hex("00 70 00 00 1b 59 ef 01 01 02"), "239.1.1.2"},   // a port of its own
+               {Hex("00 70 00 00 1b 58 ef 01 01 01"), "239.1.1.1"}};  // the public group itself
+  for (const auto& c : cases) {
+    Start();
+    ToPublic(Announcement({}));
+    ToClient(c.oack);
+    ToClient(kErrorFrame);
+    Offer empty;
+    empty.header = "00 21";
+    empty.size = 0;
+    Forget();
+    ToPublic(Announcement(empty));
+    EXPECT_THAT(Log(), Contains(std::string("Leaving multicast group: ") + c.group));
+    EXPECT_EQ(End(), 0);
+  }
+}
+
+TEST_F(PrivateGroupTest, IsNotLeftWhenItCouldNotBeJoined) {
+  Start();
+  Establish();
+  ToClient(kErrorFrame);
+  ToPublic(Announcement({}));
+  ToClient(Hex("00 70 00 00 1b 58 0a 00 00 09"));
+  EXPECT_THAT(Log(), Contains("Failed to join private multicast group: 10.0.0.9"));
+  EXPECT_EQ(End(), 0);
+  EXPECT_THAT(Log(), Not(Contains(::testing::StartsWith("Leaving"))));
+}
+
 }  // namespace

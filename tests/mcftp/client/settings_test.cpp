@@ -203,6 +203,38 @@ TEST_F(SettingsTest, StopsAtTheFirstValueThatIsMissing) {
   EXPECT_EQ(settings.dally_timeout_ms, 5000U) << "behind the missing one nothing is read";
 }
 
+TEST_F(SettingsTest, ReadsInOrderUpToWhicheverValueIsMissing) {
+  std::uint32_t Settings::*const members[] = {&Settings::load_client,
+                                              &Settings::authentication_enabled,
+                                              &Settings::authentication_algorithm,
+                                              &Settings::compression_enabled,
+                                              &Settings::compression_algorithm,
+                                              &Settings::encryption_enabled,
+                                              &Settings::encryption_algorithm,
+                                              &Settings::max_session_retries,
+                                              &Settings::receive_timeout_ms,
+                                              &Settings::dally_timeout_ms,
+                                              &Settings::overrun_error_messages,
+                                              &Settings::rx_blocks_before_overrun,
+                                              &Settings::overrun_percent_threshold,
+                                              &Settings::max_random_backoff};
+  for (std::size_t missing = 0; missing < 14; ++missing) {
+    Registry::DeleteKey(kKey);
+    Settings settings;
+    ASSERT_TRUE(LoadSettings(settings));
+    for (std::size_t i = 0; i < 14; ++i) Put(kNumbers[i].first, 7000);
+    const std::u16string name(kNumbers[missing].first.begin(), kNumbers[missing].first.end());
+    Remove(name.c_str());
+
+    EXPECT_FALSE(LoadSettings(settings)) << kNumbers[missing].first;
+
+    for (std::size_t i = 0; i < 14; ++i) {
+      const std::uint32_t expected = i < missing ? 7000 : kNumbers[i].second;
+      EXPECT_EQ(settings.*members[i], expected) << i << " without " << missing;
+    }
+  }
+}
+
 TEST_F(SettingsTest, TakesAValueOfTheWrongTypeForAMissingOne) {
   Settings settings;
   ASSERT_TRUE(LoadSettings(settings));

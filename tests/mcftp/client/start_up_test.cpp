@@ -4,9 +4,6 @@
 #include "mcftp/client/client_test.h"
 #include "memory/memory.h"
 #include "net/network.h"
-// The platform's own names come last.
-#include "mcftp/registry.h"
-#include "mcftp/settings.h"
 
 namespace {
 
@@ -15,20 +12,11 @@ using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using ::testing::StartsWith;
 
-constexpr char kKey[] = "HKEY_LOCAL_MACHINE\\Software\\Corvanta\\Device Management\\MCFTP Client";
-
 class StartUpTest : public MulticastTest {
  protected:
   std::int32_t StartAndEnd(const std::string& options) {
     Start(options, /*keep_lines=*/true);
     return End();
-  }
-  static void SetSetting(const char* name, std::uint32_t value) {
-    mcftp::Settings settings;
-    ASSERT_TRUE(mcftp::LoadSettings(settings));
-    mcftp::Registry registry;
-    ASSERT_TRUE(registry.Create(kKey));
-    ASSERT_TRUE(registry.WriteDword(name, value));
   }
   /// The log's last lines.
   Lines LogEnd(std::size_t count) {
@@ -64,8 +52,7 @@ TEST_F(StartUpTest, SaysEachStepAndEndsFiveMinutesLaterWithoutAServer) {
                           "FQDN: mr7", "IP Address: 10.0.0.1", "State Machine v1.0", "Protocol v3",
                           "Receive Timeout: 32000", "Overrun Threshold: 85",
                           "Minimum blocks before overrun: 100", "Initialization complete",
-                          "McftpClient::StateMachineThread started",
-                          "Waiting for a Multicast MCFTP Server to announce a file..."));
+                          "McftpClient::StateMachineThread started", test::kWaiting));
   const milliseconds begin = Now();
   EXPECT_EQ(End(), 0);
   EXPECT_NEAR(static_cast<double>((Now() - begin).count()), 300000, 260);
@@ -281,8 +268,7 @@ TEST_F(StartUpTest, ShowsTheSettingsThatItRunsWith) {
 
   EXPECT_THAT(LogEnd(6), ElementsAre("Receive Timeout: 1234", "Overrun Threshold: 50",
                                      "Minimum blocks before overrun: 7", "Initialization complete",
-                                     "McftpClient::StateMachineThread started",
-                                     "Waiting for a Multicast MCFTP Server to announce a file..."));
+                                     "McftpClient::StateMachineThread started", test::kWaiting));
   EXPECT_EQ(End(), 0);
 }
 
@@ -348,6 +334,32 @@ TEST_F(RemoteDebugTest, HandsTheOwnerAtMost2048Characters) {
   const Lines lines = Log();
   EXPECT_EQ(lines[1].size(), 2048U);
   EXPECT_EQ(End(), 0);
+}
+
+/// The stop callback comes before the thread's last act, and the client stays until that is done.
+TEST_F(StartUpTest, ReturnsOnlyWhenTheClientsThreadHasDoneItsLastAct) {
+  struct Watch {
+    bool stopped = false;
+    bool stopped_first = false;
+    bool at_the_end = false;
+  } watch;
+  mcftp::ClientOwner owner;
+  owner.context = &watch;
+  owner.stopped = [](void* context) { static_cast<Watch*>(context)->stopped = true; };
+  owner.log = [](void* context, const WCHAR* line) {
+    auto& seen = *static_cast<Watch*>(context);
+    const std::u16string_view text(line);
+    if (text != u"McftpClient::StateMachineThread stopping") return;
+    seen.stopped_first = seen.stopped;
+    Sleep(5000);  // the starter has looked at its mark many times meanwhile
+    seen.at_the_end = true;
+  };
+
+  EXPECT_EQ(mcftp::StartMulticastClient(test::kOptions, &owner), 0);
+
+  EXPECT_TRUE(watch.stopped_first);
+  EXPECT_TRUE(watch.at_the_end);
+  EXPECT_EQ(device().memory().bad_frees(), 0U);
 }
 
 }  // namespace

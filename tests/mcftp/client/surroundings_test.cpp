@@ -14,13 +14,12 @@ using test::Data;
 using test::Hex;
 using test::kOackAck;
 using test::kOackPassive;
+using test::kWaiting;
 using test::Offer;
 using test::ToHex;
 using ::testing::Contains;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
-
-constexpr char kWaiting[] = "Waiting for a Multicast MCFTP Server to announce a file...";
 
 // ---- files of a RAM store ----
 
