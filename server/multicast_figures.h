@@ -68,6 +68,7 @@ struct FileFigures {
   std::uint64_t announcements = 0;
   std::uint64_t first_pass_frames = 0;  ///< blocks sent for the first time
   std::uint64_t repair_frames = 0;      ///< blocks sent again
+  std::uint64_t farewell_frames = 0;    ///< a last block once more, which ends the devices' dallies
   std::uint64_t control_frames = 0;     ///< OACK and ERROR
   std::uint64_t frames = 0;             ///< all that was sent for this file
   std::uint64_t wire_bytes = 0;         ///< of all these, Ethernet, IP and UDP headers included

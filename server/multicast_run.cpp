@@ -19,6 +19,8 @@
 namespace server {
 namespace {
 
+/// Frames that are no blocks, while a block waits.
+constexpr int kMostControl = 16;
 /// No frame for a server is longer.
 constexpr std::size_t kLongestReceived = 2048;
 /// What happens in between is lost with a server that dies: devices that are proven are asked
@@ -27,6 +29,11 @@ constexpr Micros kStoreInterval = std::chrono::milliseconds(250);
 
 void Require(bool holds, const std::string& what) {
   if (!holds) throw std::invalid_argument(what);
+}
+
+bool IsDevice(const Peer& peer) {
+  return peer.port != 0 && peer.address != 0 && peer.address != 0xFFFFFFFF &&
+         !IsGroup(peer.address);
 }
 
 void CheckOptions(const MulticastOptions& options) {
@@ -68,7 +75,7 @@ class MulticastRun::Body {
         random_(options_.seed != 0 ? options_.seed : std::random_device{}()) {
     figures_.rate = options_.rate;
     remembers_ = !options_.session_file.empty();
-    memory_.fingerprint = Fingerprint(options_, files_);
+    if (remembers_) memory_.fingerprint = Fingerprint(options_, files_);
     if (remembers_) recalled_ = Recall(options_.session_file);
     if (recalled_ && !Fits(*recalled_)) recalled_.reset();
   }
@@ -116,12 +123,14 @@ class MulticastRun::Body {
   std::set<Peer> known_;  ///< devices of this round that are not dead
   std::set<std::uint32_t> transfer_ids_;
   bool ended_ = false;
+  int control_in_a_row_ = 0;
 
   RunMemory memory_;  ///< its last file is the one under way
   std::optional<RunMemory> recalled_;
   bool remembers_ = false;
   std::uint64_t stored_changes_ = 0;
   std::size_t stored_devices_ = 0;
+  FilePhase stored_phase_ = FilePhase::kWaiting;
   Micros stored_at_{-kStoreInterval};
   std::array<std::uint8_t, kLongestReceived + mcftp::Blowfish::kBlock> received_{};
 };
@@ -165,10 +174,12 @@ bool MulticastRun::Body::Resume(Micros now) {
 
 void MulticastRun::Body::Remember(Micros now) {
   if (!remembers_ || session_ == nullptr || session_->changes() == stored_changes_) return;
-  const bool urgent = figures_.files.back().devices.size() != stored_devices_;
+  const FileFigures& current = figures_.files.back();
+  const bool urgent = current.devices.size() != stored_devices_ || current.phase != stored_phase_;
   if (!urgent && now < stored_at_ + kStoreInterval) return;
   stored_changes_ = session_->changes();
-  stored_devices_ = figures_.files.back().devices.size();
+  stored_devices_ = current.devices.size();
+  stored_phase_ = current.phase;
   stored_at_ = now;
   FileMemory file;
   file.index = memory_.files.back().index;
@@ -288,7 +299,7 @@ void MulticastRun::Body::OnTime(Micros now) {
 void MulticastRun::Body::OnDatagram(const Peer& from, std::string_view bytes, Micros now) {
   ++figures_.frames_received;
   mcftp::Header header;
-  bool good = bytes.size() <= kLongestReceived && from.address != own_.address;
+  bool good = bytes.size() <= kLongestReceived && from.address != own_.address && IsDevice(from);
   if (good) {
     std::copy(bytes.begin(), bytes.end(), received_.begin());
     good = mcftp::DecodeHeader(received_.data(), bytes.size(), header) &&
@@ -315,9 +326,14 @@ void MulticastRun::Body::Account(const Outgoing& outgoing, Micros now) {
 
 const Outgoing* MulticastRun::Body::Next(Micros now) {
   Remember(now);
-  const Outgoing* next = outbox_.Next();
-  if (next == nullptr && session_ != nullptr && pace_.Ready(now) && session_->HasBlock(now)) {
-    next = session_->NextBlock(now);
+  // Answers go first, but whoever asks for many of them does not keep the blocks back.
+  const Outgoing* next = control_in_a_row_ < kMostControl ? outbox_.Next() : nullptr;
+  ++control_in_a_row_;
+  if (next == nullptr) {
+    control_in_a_row_ = 0;
+    if (session_ != nullptr && pace_.Ready(now) && session_->HasBlock(now)) {
+      next = session_->NextBlock(now);
+    }
     if (next == nullptr) next = outbox_.Next();
   }
   if (next != nullptr) Account(*next, now);
@@ -340,6 +356,7 @@ void MulticastRun::Body::StartNow(Micros now) {
 
 void MulticastRun::Body::SetRate(std::uint64_t bits_per_second, Micros now) {
   pace_.SetRate(bits_per_second, now);
+  if (session_ != nullptr) session_->OnRate(now);
   figures_.rate = bits_per_second;
 }
 

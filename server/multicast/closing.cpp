@@ -40,6 +40,7 @@ void Closing::Fill(Micros now) {
       if (device.settled() || device.deferred != deferred || InGroup(device)) continue;
       ++answering;
       device.closing = State::kAsked;
+      device.sends = 0;
       if (!deferred) device.tries = 0;
       group_.push_back(&device);
       Ask(device, now);
@@ -53,7 +54,8 @@ bool Closing::InGroup(const Device& device) const {
 }
 
 void Closing::Ask(Device& device, Micros now) {
-  desk_.GiveRole(device, Role::kAckMaster, now);
+  desk_.GiveRole(device, device.closing == State::kClosed ? Role::kNakMaster : Role::kAckMaster,
+                 now);
   device.asked_at = now;
   if (++device.tries == 1) device.unanswered_since = now;
 }
@@ -66,21 +68,37 @@ std::size_t Closing::Count(State state) const {
 
 // ---- what comes back ----
 
-void Closing::OnNak(Device& device, Micros now) {
-  if (InGroup(device) && now >= device.asked_at + Wait(device)) Ask(device, now);
+void Closing::OnNak(Device& device, std::uint32_t block, Micros now) {
+  if (!InGroup(device)) return;
+  if (device.closing == State::kClosed) {
+    Bury(device,
+         block < log_.count() ? "has given the file up"
+                              : "has closed the file, nobody knows whether with its last block",
+         now);
+    Go(now);
+  } else if (now >= device.asked_at + Wait(device)) {
+    Ask(device, now);  // it has not taken the role
+  }
+}
+
+/// Not in the file any more: it may be asked to name what it lacks, which would complete it if it
+/// were.
+void Closing::AskClosed(Device& device, Micros now) {
+  device.closing = State::kClosed;
+  device.tries = 0;
+  Ask(device, now);
 }
 
 void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
   if (!InGroup(device)) return;
   if (block == log_.count()) {
-    const bool has_all = device.closing >= State::kHasGuard || device.recalled;
-    if (has_all && log_.sent_at(block) != BlockLog::kNever) {
+    const bool to_block = device.closing == State::kUncertain && device.tries == 0;
+    const bool in_dally = device.closing == State::kClosed;
+    if (to_block || in_dally) {
       desk_.SetProven(device, now);
       Go(now);
-    } else if (device.closing == State::kAsked) {
-      // It answers so after a file that it has left, whether it had all of it or not.
-      Bury(device, "has given the file up", now);
-      Go(now);
+    } else {
+      AskClosed(device, now);
     }
   } else if (block == 0 && device.tries > 0) {
     if (device.tries == 1) device.round_trip.Add(now - device.asked_at);
@@ -89,7 +107,7 @@ void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
       Answered(device, log_.count() == 1 ? State::kHasGuard : State::kReady, now);
     } else if (device.closing == State::kUncertain) {
       Answered(device, State::kLacksLast, now);
-    } else {
+    } else if (device.closing != State::kClosed) {
       device.tries = 0;
     }
   } else if (block == log_.guard() && block != 0 && device.closing <= State::kReady) {
@@ -98,9 +116,19 @@ void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
   }
 }
 
+void Closing::OnJoin(Device& device, Micros now) {
+  // The network may have made a second request of the first. Nobody begins anew so late, but if one
+  // did, it would acknowledge the last blocks and lack the others.
+  const bool repeated = now - device.first_joined_at <= desk_.options().oack_wait;
+  if (!InGroup(device) || device.closing == State::kAsked || repeated) return;
+  Bury(device, "asked for the file again while it was being closed", now);
+  Go(now);
+}
+
 void Closing::Answered(Device& device, State state, Micros now) {
   device.closing = state;
   device.tries = 0;
+  if (state == State::kHasGuard) device.sends = 0;
   Go(now);
 }
 
@@ -117,7 +145,7 @@ void Closing::Go(Micros now) {
     NextGroup(now);
     return;
   }
-  if (stage_ == Stage::kAsking && AllHaveAnswered()) {
+  if (stage_ == Stage::kAsking && Count(State::kClosed) == 0 && AllHaveAnswered()) {
     stage_ = Stage::kGuard;
     if (Count(State::kReady) > 0) to_send_ = log_.guard();
   }
@@ -125,8 +153,8 @@ void Closing::Go(Micros now) {
     stage_ = Stage::kLast;
     to_send_ = log_.count();
   }
-  if (stage_ == Stage::kLast && to_send_ == 0 && Count(State::kUncertain) == 0 &&
-      Count(State::kLacksLast) > 0) {
+  if (stage_ == Stage::kLast && to_send_ == 0 && Count(State::kLacksLast) > 0 &&
+      Count(State::kUncertain) + Count(State::kClosed) == 0) {
     to_send_ = log_.count();
   }
 }
@@ -152,15 +180,29 @@ std::uint32_t Closing::TakeBlock(Micros now) {
   log_.Sent(block, now);
   if (stage_ == Stage::kGuard) ++sendings_;
   for (Device* device : group_) {
-    if (stage_ == Stage::kLast) {
+    if (stage_ == Stage::kLast && device->closing != State::kClosed) {
       device->closing = State::kUncertain;
       device->tries = 0;
+      ++device->sends;
     }
+    if (stage_ == Stage::kGuard && device->closing == State::kReady) ++device->sends;
     if (stage_ == Stage::kGuard && device->closing == State::kReady && device->tries++ == 0) {
       device->unanswered_since = now;
     }
   }
+  CheckUnreached(now);
   return block;
+}
+
+/// Gives up devices that answer questions and no blocks.
+void Closing::CheckUnreached(Micros now) {
+  for (Device* device : group_) {
+    if (device->sends <= kMostSends || device->closing == State::kClosed) continue;
+    desk_.SetReleased(*device, "hears questions and no blocks", now);
+  }
+  if (std::any_of(group_.begin(), group_.end(), [](const Device* d) { return d->settled(); })) {
+    Go(now);
+  }
 }
 
 // ---- time ----
@@ -185,6 +227,7 @@ void Closing::Bury(Device& device, const char* why, Micros now) {
 std::optional<Micros> Closing::DueAt(const Device& device) const {
   if (to_send_ != 0) return std::nullopt;
   const bool waiting = device.closing == State::kAsked || device.closing == State::kUncertain ||
+                       device.closing == State::kClosed ||
                        (stage_ == Stage::kGuard && device.closing == State::kReady);
   if (!waiting) return std::nullopt;
   const bool block_out = stage_ != Stage::kAsking;
@@ -198,9 +241,10 @@ void Closing::OnTime(Micros now) {
     const auto due = DueAt(*device);
     if (!due || now < *due) continue;
     if (IsSilent(*device, now)) {
+      const bool last = device->closing == State::kUncertain || device->closing == State::kClosed;
       Bury(*device,
-           device->closing == State::kUncertain ? "does not say whether it has the last block"
-                                                : "does not answer at the end of the file",
+           last ? "does not say whether it has the last block"
+                : "does not answer at the end of the file",
            now);
     } else {
       // Its role may have been taken back by a frame that was late.

@@ -18,16 +18,20 @@ namespace server {
 /// 2. the guard goes out until all have acknowledged it;
 /// 3. the last block goes out. Who does not acknowledge it is asked by its role, because a device
 ///    that has completed leaves at the next block without a word: block 0 says that the block was
-///    lost, the last block's number that only its acknowledgement was. Nobody gets the last block
-///    again before everybody's state is known.
+///    lost, the last block's number that the file is closed on the device. Nobody gets the last
+///    block again before everybody's state is known.
+/// 4. A device that has closed the file and did not say so in answer to the last block is asked
+///    once more, as one that names what it lacks: in its dally it acknowledges the last block
+///    again, which is proof; having left the file before, it names a block, which is none.
 class Closing {
  public:
   Closing(TransferDesk& desk, BlockLog& log) : desk_(desk), log_(log) {}
 
   void Begin(Micros now);
   void OnAck(Device& device, std::uint32_t block, Micros now);
-  /// A device that names blocks has not taken the role.
-  void OnNak(Device& device, Micros now);
+  void OnNak(Device& device, std::uint32_t block, Micros now);
+  /// A device that is being closed asks for the file again.
+  void OnJoin(Device& device, Micros now);
   void OnGivenUp(Device& device, Micros now);
   void OnTime(Micros now);
   [[nodiscard]] bool HasBlock() const { return to_send_ != 0; }
@@ -45,6 +49,8 @@ class Closing {
   void Ask(Device& device, Micros now);
   void Answered(Device& device, Device::Closing state, Micros now);
   void Go(Micros now);
+  void AskClosed(Device& device, Micros now);
+  void CheckUnreached(Micros now);
   void Bury(Device& device, const char* why, Micros now);
   [[nodiscard]] std::size_t Count(Device::Closing state) const;
   [[nodiscard]] std::optional<Micros> DueAt(const Device& device) const;

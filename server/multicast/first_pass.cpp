@@ -18,6 +18,11 @@ constexpr std::uint32_t kSlowMeasures = 5;
 /// Acknowledgements that make a rate, and not only a burst.
 constexpr std::uint32_t kEnoughAcks = 16;
 constexpr unsigned kMostBackoff = 8;
+/// Questions to a candidate when there are others who may be asked.
+constexpr std::uint32_t kQuickTries = 2;
+constexpr std::size_t kLargestWave = 16;
+/// Blocks that nobody acknowledged: with fewer a device may just be slow.
+constexpr std::uint32_t kVainBlocks = 5;
 
 std::uint32_t Unsettled(std::deque<Device>& devices) {
   return static_cast<std::uint32_t>(std::count_if(
@@ -37,7 +42,8 @@ void FirstPass::Begin(Micros now) {
     done_ = true;  // all blocks are held back, or have gone out
     return;
   }
-  ElectAfter(nullptr, now);
+  BeginElection(now);
+  ElectNext(now);
 }
 
 void FirstPass::Resume(std::uint32_t next, Micros now) {
@@ -48,97 +54,183 @@ void FirstPass::Resume(std::uint32_t next, Micros now) {
 
 // ---- the master ----
 
-void FirstPass::ElectAfter(const Device* last, Micros now) {
-  std::deque<Device>& devices = desk_.devices();
-  std::size_t start = 0;
-  for (std::size_t i = 0; i < devices.size(); ++i) {
-    if (&devices[i] == last) start = i + 1;
-  }
-  for (std::size_t i = 0; i < devices.size(); ++i) {
-    Device& device = devices[(start + i) % devices.size()];
-    if (device.settled()) continue;
-    Elect(device, now);
-    return;
-  }
-  Finish();
-}
-
-void FirstPass::Elect(Device& candidate, Micros now) {
-  if (!electing_ || master_ == nullptr) election_began_ = now;
-  from_start_ = from_start_ && (next_ == 1 || &candidate == master_);
+void FirstPass::BeginElection(Micros now) {
   for (const InFlight& flying : flight_) lacking_.insert(flying.block);
   flight_.clear();
-  if (&candidate != master_) {
-    MeasureAnew(now);
-    lost_ = 0;
-  }
-  if (master_ != nullptr && &candidate != master_) {
-    lacking_.clear();  // nothing is known of what the new one lacks
-    window_ = SendWindow(desk_.options().window, desk_.block_size());
-  }
+  if (electing_) return;
   electing_ = true;
-  master_ = &candidate;
+  ++election_;
+  election_began_ = now;
+  wave_size_ = 1;
+}
+
+bool FirstPass::AnyUnasked() const {
+  const std::deque<Device>& devices = desk_.devices();
+  return std::any_of(devices.begin(), devices.end(), [this](const Device& device) {
+    return !device.settled() && !device.deaf && device.election != election_;
+  });
+}
+
+bool FirstPass::IsAsked(const Device& device) const {
+  return electing_ && std::find(wave_.begin(), wave_.end(), &device) != wave_.end();
+}
+
+/// Offers the mastership to those who have not been asked in this election: to one, and when that
+/// one is silent to more and more at once. No block goes out meanwhile.
+void FirstPass::ElectNext(Micros now) {
+  EndWave(nullptr, now);
+  if (!AnyUnasked()) {
+    const bool over = now - election_began_ >= desk_.options().silence_limit;
+    ++election_;
+    if (over || !AnyUnasked()) {
+      Finish(now);  // nobody answers; the repair asks them all once more
+      return;
+    }
+  }
+  for (Device& device : desk_.devices()) {
+    if (wave_.size() == wave_size_) break;
+    if (device.settled() || device.deaf || device.election == election_) continue;
+    device.election = election_;
+    wave_.push_back(&device);
+  }
+  wave_size_ = std::min(wave_size_ * 4, kLargestWave);
   tries_ = 0;
   Ask(now);
 }
 
+void FirstPass::Elect(Device& candidate, Micros now) {
+  BeginElection(now);
+  EndWave(&candidate, now);
+  candidate.election = election_;
+  wave_ = {&candidate};
+  tries_ = 0;
+  Ask(now);
+}
+
+void FirstPass::EndWave(const Device* winner, Micros now) {
+  for (Device* asked : wave_) {
+    if (asked != winner && !asked->settled()) desk_.GiveRole(*asked, Role::kPassive, now);
+  }
+  wave_.clear();
+}
+
 void FirstPass::Ask(Micros now) {
-  desk_.GiveRole(*master_, Role::kAckMaster, now);
+  for (Device* device : wave_) desk_.GiveRole(*device, Role::kAckMaster, now);
   asked_at_ = now;
   ++tries_;
 }
 
-void FirstPass::BecomeMaster(Micros now) {
+void FirstPass::BecomeMaster(Device& device, Micros now) {
+  EndWave(&device, now);
   electing_ = false;
+  from_start_ = from_start_ && (next_ == 1 || &device == master_);
+  if (&device != master_) {
+    MeasureAnew(now);
+    lost_ = 0;
+    vain_elections_ = 0;
+    vain_blocks_ = 0;
+    progress_at_ = now;
+    lacking_.clear();  // nothing is known of what the new one lacks
+    if (master_ != nullptr) window_ = SendWindow(desk_.options().window, desk_.block_size());
+  }
+  ++vain_elections_;
+  master_ = &device;
   window_.SetAlone(desk_.devices().size() == 1);
   desk_.TellMaster(*master_, now);
 }
 
 void FirstPass::Replace(Device& by, Micros now) {
-  desk_.GiveRole(*master_, Role::kPassive, now);
+  if (!electing_) desk_.GiveRole(*master_, Role::kPassive, now);
   Elect(by, now);
 }
 
+/// It answers when it is asked, and blocks do not reach it.
+void FirstPass::GiveUpMaster(Micros now) {
+  Device& master = *master_;
+  master.deaf = true;
+  lacking_.clear();
+  from_start_ = false;
+  desk_.GiveRole(master, Role::kPassive, now);
+  BeginElection(now);
+  ElectNext(now);
+}
+
+void FirstPass::CheckDeaf(Micros now) {
+  if (done_ || electing_) return;
+  const MulticastOptions& options = desk_.options();
+  const bool long_in_vain =
+      vain_blocks_ >= kVainBlocks && now - progress_at_ >= options.silence_limit;
+  if (vain_elections_ > options.elect_tries || long_in_vain) GiveUpMaster(now);
+}
+
 void FirstPass::OnNak(Device& device, Micros now) {
-  if (&device == master_ && !electing_ && now - asked_at_ > Patience()) Ask(now);
+  if (&device == master_ && !electing_ && now - asked_at_ > Patience()) {
+    desk_.GiveRole(device, Role::kAckMaster, now);
+    asked_at_ = now;
+  }
 }
 
 void FirstPass::OnOverrun(Device& device, std::uint16_t percent_x100, Micros now) {
-  if (device.figures.late || master_ == nullptr) return;
+  if (device.figures.late || master_ == nullptr || done_) return;
   window_.Reduce();
-  if (&device == master_) return;
+  if (&device == master_ || IsAsked(device)) return;
   // Lowering the pace has not helped, or will not: it sets the pace itself.
   if (device.figures.overruns > 1 || percent_x100 < kHopelessPercent) Replace(device, now);
 }
 
 void FirstPass::OnGivenUp(Device& device, Micros now) {
-  if (&device == master_ && !done_) ElectAfter(master_, now);
+  if (done_ || (&device != master_ && !IsAsked(device))) return;
+  BeginElection(now);
+  ElectNext(now);
+}
+
+/// A master that asks for the file may have begun anew.
+void FirstPass::OnJoin(Device& device, Micros now) {
+  window_.SetAlone(desk_.devices().size() == 1);
+  if (&device != master_ || done_) return;
+  from_start_ = false;
+  if (!electing_) Elect(device, now);
+}
+
+void FirstPass::OnRate(Micros now) {
+  best_rate_ = 0;
+  measured_acks_ = 0;
+  MeasureAnew(now);
 }
 
 // ---- what comes back ----
 
 void FirstPass::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
-  if (&device != master_ || done_) return;
-  if (electing_) {
+  if (done_) return;
+  if (IsAsked(device)) {
     if (ack.block == log_.count()) {
       // No client says this of a file whose last block never went out: it means another one.
       desk_.SetDead(device, "has given the file up", now);
-      ElectAfter(&device, now);
+      ElectNext(now);
       return;
     }
-    if (ack.block == 0 && tries_ == 1) master_->round_trip.Add(now - asked_at_);
-    BecomeMaster(now);
+    if (ack.block == 0 && tries_ == 1) device.round_trip.Add(now - asked_at_);
+    BecomeMaster(device, now);
   }
+  if (&device != master_ || electing_) return;
   if (ack.block != 0) Acknowledged(ack.block, ack.duplicate, now);
   Measure(now);
-  CheckEnd();
+  CheckDeaf(now);
+  CheckEnd(now);
 }
 
 void FirstPass::Acknowledged(std::uint32_t block, bool duplicate, Micros now) {
-  lacking_.erase(block);
-  if (duplicate) ++wasted_;
+  const bool was_lacking = lacking_.erase(block) > 0;
   const auto at = std::find_if(flight_.begin(), flight_.end(),
                                [block](const InFlight& flying) { return flying.block == block; });
+  const bool expected = at != flight_.end() || was_lacking;
+  // What it has twice was sent in vain; a second acknowledgement that the network made was not.
+  if (duplicate && (at == flight_.end() || at->again)) ++wasted_;
+  if (expected) {
+    vain_elections_ = 0;
+    vain_blocks_ = 0;
+    progress_at_ = now;
+  }
   if (at == flight_.end()) return;
   if (!at->again) {
     window_.OnAck(at->sent_at, now);
@@ -187,7 +279,9 @@ void FirstPass::Measure(Micros now) {
   } else {
     desk_.GiveRole(slow, Role::kPassive, now);
   }
-  ElectAfter(&slow, now);
+  slow.deaf = true;  // it is asked last
+  BeginElection(now);
+  ElectNext(now);
 }
 
 // ---- time ----
@@ -201,42 +295,47 @@ Micros FirstPass::Patience() const {
 }
 
 void FirstPass::OnTime(Micros now) {
-  if (done_ || master_ == nullptr) return;
-  Measure(now);
+  if (done_) return;
+  if (!electing_) Measure(now);
+  CheckDeaf(now);
   if (done_) return;
   if (electing_) {
-    if (now < asked_at_ + desk_.options().elect_wait) return;
-    if (tries_ < desk_.options().elect_tries) {
-      Ask(now);
-    } else if (now - election_began_ >= desk_.options().silence_limit) {
-      Finish();  // nobody answers; the repair asks them all once more
-    } else {
-      Device* silent = master_;
-      if (Unsettled(desk_.devices()) > 1) desk_.GiveRole(*silent, Role::kPassive, now);
-      ElectAfter(silent, now);
-    }
+    ElectionTimeout(now);
     return;
   }
   // Blocks that are paced expire one by one, and each makes room for another: so silence is told by
   // when the master was heard, not by an empty way.
   bool silent = false;
+  bool lost_now = false;
   const Micros patience = Patience();
   while (!flight_.empty() && now >= flight_.front().sent_at + patience) {
-    backoff_ = std::min(backoff_ + 1, kMostBackoff);
+    lost_now = true;
     silent = master_->heard_at <= flight_.front().sent_at;
     Lost(flight_.front());
     flight_.pop_front();
   }
+  if (lost_now) backoff_ = std::min(backoff_ + 1, kMostBackoff);
   if (silent) {
     window_.OnSilence();
     Elect(*master_, now);
   } else {
-    CheckEnd();
+    CheckEnd(now);
+  }
+}
+
+void FirstPass::ElectionTimeout(Micros now) {
+  const MulticastOptions& options = desk_.options();
+  if (now < asked_at_ + options.elect_wait) return;
+  const std::uint32_t most = AnyUnasked() ? kQuickTries : options.elect_tries;
+  if (tries_ < most) {
+    Ask(now);
+  } else {
+    ElectNext(now);
   }
 }
 
 std::optional<Micros> FirstPass::deadline() const {
-  if (done_ || master_ == nullptr) return std::nullopt;
+  if (done_) return std::nullopt;
   if (electing_) return asked_at_ + desk_.options().elect_wait;
   if (flight_.empty()) return std::nullopt;
   return flight_.front().sent_at + Patience();
@@ -260,23 +359,27 @@ std::uint32_t FirstPass::TakeBlock(Micros now) {
   if (again) lacking_.erase(block);
   flight_.push_back({block, now, again, 0});
   log_.Sent(block, now);
+  ++vain_blocks_;
   desk_.figures().window = window_.size();
   desk_.figures().round_trip = window_.round_trip().smoothed();
   return block;
 }
 
-void FirstPass::CheckEnd() {
-  if (!electing_ && next_ >= end_ && flight_.empty() && !MayRepeat()) Finish();
+void FirstPass::CheckEnd(Micros now) {
+  if (!done_ && !electing_ && next_ >= end_ && flight_.empty() && !MayRepeat()) Finish(now);
 }
 
-void FirstPass::Finish() {
+void FirstPass::Finish(Micros now) {
   done_ = true;
-  if (master_ == nullptr) return;
+  EndWave(nullptr, now);
+  if (master_ == nullptr || master_->settled()) return;
   master_->figures.loss = static_cast<double>(lost_) / std::max<double>(next_, 1);
   if (!electing_ && from_start_ && lacking_.empty()) {
     master_->whole = true;
     master_->position = log_.guard();
   }
+  // It would go on acknowledging what others get.
+  if (!electing_ && Unsettled(desk_.devices()) > 1) desk_.GiveRole(*master_, Role::kPassive, now);
 }
 
 }  // namespace server

@@ -5,6 +5,7 @@
 #include <deque>
 #include <optional>
 #include <set>
+#include <vector>
 
 #include "server/multicast/block_log.h"
 #include "server/multicast/send_window.h"
@@ -27,6 +28,8 @@ class FirstPass {
   void OnNak(Device& device, Micros now);
   void OnOverrun(Device& device, std::uint16_t percent_x100, Micros now);
   void OnGivenUp(Device& device, Micros now);
+  void OnJoin(Device& device, Micros now);
+  void OnRate(Micros now);
   void OnTime(Micros now);
   [[nodiscard]] bool HasBlock() const;
   std::uint32_t TakeBlock(Micros now);
@@ -43,14 +46,21 @@ class FirstPass {
   };
 
   void Elect(Device& candidate, Micros now);
-  void ElectAfter(const Device* last, Micros now);
+  void ElectNext(Micros now);
+  void BeginElection(Micros now);
   void Ask(Micros now);
   void Replace(Device& by, Micros now);
-  void BecomeMaster(Micros now);
+  void GiveUpMaster(Micros now);
+  void CheckDeaf(Micros now);
+  void EndWave(const Device* winner, Micros now);
+  void ElectionTimeout(Micros now);
+  [[nodiscard]] bool IsAsked(const Device& device) const;
+  [[nodiscard]] bool AnyUnasked() const;
+  void BecomeMaster(Device& device, Micros now);
   void Acknowledged(std::uint32_t block, bool duplicate, Micros now);
   void Lost(const InFlight& gone);
-  void CheckEnd();
-  void Finish();
+  void CheckEnd(Micros now);
+  void Finish(Micros now);
   void Measure(Micros now);
   void MeasureAnew(Micros now);
   [[nodiscard]] double MeasuredRate(Micros now) const;
@@ -62,12 +72,20 @@ class FirstPass {
   SendWindow window_;
   const std::uint32_t end_;  ///< the first block that is held back
 
-  Device* master_ = nullptr;  ///< also the candidate, while electing_
-  bool electing_ = true;
+  Device* master_ = nullptr;  ///< the latest one, while electing_
+  bool electing_ = false;
+  std::vector<Device*> wave_;  ///< who is offered the mastership; the first to take it has it
+  std::size_t wave_size_ = 1;
+  std::uint32_t election_ = 0;
   Micros election_began_{0};
   Micros asked_at_{0};
   std::uint32_t tries_ = 0;
   bool from_start_ = true;  ///< the master has been master since block 1
+
+  // Whether the master hears blocks at all:
+  std::uint32_t vain_elections_ = 0;  ///< since it acknowledged a block
+  std::uint32_t vain_blocks_ = 0;
+  Micros progress_at_{0};
 
   std::uint32_t next_ = 1;
   std::deque<InFlight> flight_;

@@ -3,6 +3,11 @@
 #include <algorithm>
 
 namespace server {
+namespace {
+
+constexpr Micros kJoinTime = std::chrono::seconds(30);
+
+}  // namespace
 
 using mcftp::Role;
 
@@ -21,8 +26,16 @@ void LockStep::Resume(std::uint32_t first_unsent, bool last_sent, Micros now) {
   }
 }
 
-void LockStep::OnJoin(Device& /*device*/, Micros /*now*/) {
-  // Found when its turn comes.
+/// A new device is found when its turn comes. One that asks again may have begun anew: it has gaps.
+void LockStep::OnJoin(Device& device, Micros /*now*/) {
+  device.may_have_gaps = true;
+  if (&device == subject_ && phase_ == Phase::kStream) has_gaps_ = true;
+}
+
+/// Those who come too late would keep all others waiting, one after the other.
+bool LockStep::takes_devices(Micros now) const {
+  if (phase_ == Phase::kDrain) return now - drain_began_ < kJoinTime;
+  return phase_ != Phase::kDone;
 }
 
 // ---- choosing a master ----
@@ -56,6 +69,7 @@ void LockStep::BecomeMaster(Micros now) {
   phase_ = Phase::kStream;
   old_master_ = nullptr;
   has_gaps_ = std::max<std::uint32_t>(subject_->position, 1) < next_;
+  subject_->may_have_gaps = subject_->may_have_gaps || has_gaps_;
   desk_.TellMaster(*subject_, now);
   GoOn(now);
 }
@@ -103,11 +117,11 @@ void LockStep::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
     case Phase::kElect:
       if (ack.block == 0) {
         BecomeMaster(now);
-      } else if (has_last && first_unsent_ > ack.block) {
+      } else if (has_last && first_unsent_ > ack.block && !device.may_have_gaps) {
         desk_.SetProven(device, now);
         Drain(now);
       } else if (has_last) {
-        desk_.SetDead(device, "acknowledges a last block that was never sent", now);
+        desk_.SetReleased(device, "has closed the file before it had every block", now);
         ElectNext(now);
       }
       break;
@@ -120,13 +134,23 @@ void LockStep::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
         OnMasterAck(ack.block, now);
       }
       break;
-    case Phase::kRepair: Ask(Role::kNakMaster, now); break;  // its record sent it into ACK mode
-    case Phase::kDrain:
+    case Phase::kRepair:
       if (has_last) {
+        desk_.SetReleased(device, "has closed the file before it had every block", now);
+        EndRepair(now);
+      } else {
+        AskAgain(now);
+      }
+      break;
+    case Phase::kDrain:
+      if (has_last && device.may_have_gaps) {
+        desk_.SetReleased(device, "has closed the file before it had every block", now);
+        DrainNext(now);
+      } else if (has_last) {
         desk_.SetProven(device, now);
         DrainNext(now);
       } else {
-        Ask(Role::kNakMaster, now);
+        AskAgain(now);
       }
       break;
     case Phase::kDone: break;
@@ -135,8 +159,29 @@ void LockStep::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
 
 // ---- devices that say what they lack ----
 
+/// A device in NAK mode that acknowledges was sent into ACK mode by its own record of an overrun.
+/// What it says may still be on its way from before: it is not asked for every frame.
+void LockStep::AskAgain(Micros now) {
+  const MulticastOptions& options = desk_.options();
+  if (tries_ >= options.nak_tries || now - subject_->spoken_to_at < options.ack_wait_min) return;
+  Ask(Role::kNakMaster, now);
+}
+
+/// Whether the device has named this block so often that it will not get it: it has left the file,
+/// or hears questions and no blocks. Then it is given up.
+bool LockStep::NamesInVain(Device& device, std::uint16_t block, Micros now) {
+  device.sends = block == device.position ? device.sends + 1 : 0;
+  if (device.sends < kMostSends) return false;
+  desk_.SetReleased(device, "names block " + std::to_string(block) + " again and again", now);
+  return true;
+}
+
 void LockStep::OnNak(Device& device, std::uint16_t block, Micros now) {
   if (&device != subject_ || block < device.position) return;  // late: it has got further since
+  if (NamesInVain(device, block, now)) {
+    OnGivenUp(device, now);
+    return;
+  }
   device.position = block;
   to_send_.clear();
   switch (phase_) {
@@ -148,18 +193,23 @@ void LockStep::OnNak(Device& device, std::uint16_t block, Micros now) {
       break;
     case Phase::kRepair:
       tries_ = 0;
+      device.may_have_gaps = false;
       if (const auto report = overruns_.find(&device);
           report != overruns_.end() && block < report->second.block) {
         Send(block);
       } else {
-        // From its reported block on it acknowledges, without having said so.
         overruns_.erase(&device);
         next_ = block;
-        BecomeMaster(now);
+        if (block == desk_.block_count()) {
+          Elect(device, now);  // it may have closed the file with that: its answer will tell
+        } else {
+          BecomeMaster(now);  // from its reported block on it acknowledges, without having said so
+        }
       }
       break;
     case Phase::kDrain:
       tries_ = 0;
+      device.may_have_gaps = false;
       if (block < desk_.block_count()) {
         Send(block);
       } else {
@@ -196,6 +246,7 @@ void LockStep::Repair(Micros now) {
 void LockStep::Drain(Micros now) {
   desk_.SetPhase(FilePhase::kRepairing, now);
   phase_ = Phase::kDrain;
+  drain_began_ = now;
   overruns_.clear();
   last_went_out_ = Micros(-1);
   DrainNext(now);

@@ -36,7 +36,7 @@ class LockStep final : public Transfer {
   void OnTime(Micros now) override;
   [[nodiscard]] bool HasBlock(Micros now) override;
   std::uint32_t TakeBlock(Micros now) override;
-  [[nodiscard]] bool takes_devices() const override { return phase_ != Phase::kDone; }
+  [[nodiscard]] bool takes_devices(Micros now) const override;
   [[nodiscard]] std::optional<Micros> deadline(Micros now) override;
   [[nodiscard]] bool done() const override { return phase_ == Phase::kDone; }
 
@@ -65,6 +65,8 @@ class LockStep final : public Transfer {
   void Send(std::uint32_t block);
   void OnMasterAck(std::uint32_t block, Micros now);
   void EndRepair(Micros now);
+  [[nodiscard]] bool NamesInVain(Device& device, std::uint16_t block, Micros now);
+  void AskAgain(Micros now);
   void Finish();
 
   void ElectTimeout(Micros now);
@@ -83,6 +85,7 @@ class LockStep final : public Transfer {
 
   std::deque<std::uint32_t> to_send_;
   std::uint32_t tries_ = 0;
+  Micros drain_began_{0};
   std::optional<Micros> timer_;
   bool timer_at_send_ = false;  ///< the wait begins when the block has gone out
   Micros sent_at_{0};

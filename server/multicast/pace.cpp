@@ -36,8 +36,10 @@ Micros Pace::ReadyAt(Micros now) const {
 }
 
 void Pace::Take(std::uint64_t bytes, Micros now) {
-  tokens_ = rate_ == 0 ? frame_ * kBurstFrames
-                       : Tokens(now) - static_cast<std::int64_t>(bytes) * kMillionthsPerByte;
+  tokens_ = rate_ == 0
+                ? frame_ * kBurstFrames
+                : std::max(Tokens(now) - static_cast<std::int64_t>(bytes) * kMillionthsPerByte,
+                           -frame_ * kBurstFrames);
   filled_at_ = now;
 }
 

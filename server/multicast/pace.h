@@ -25,8 +25,8 @@ class Pace {
   [[nodiscard]] bool Ready(Micros now) const { return rate_ == 0 || Tokens(now) >= frame_; }
   /// When Ready will hold if nothing else is sent.
   [[nodiscard]] Micros ReadyAt(Micros now) const;
-  /// A frame of `bytes` on the wire goes out. Frames that cannot wait may overdraw the bucket: the
-  /// next ones wait the longer.
+  /// A frame of `bytes` on the wire goes out. Frames that cannot wait may overdraw the bucket, by
+  /// its own size at most: the next ones wait the longer, and not for ever.
   void Take(std::uint64_t bytes, Micros now);
 
  private:

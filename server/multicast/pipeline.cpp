@@ -1,8 +1,16 @@
 #include "server/multicast/pipeline.h"
 
+#include <algorithm>
+
 namespace server {
+namespace {
+
+constexpr Micros kLeastJoinTime = std::chrono::seconds(30);
+
+}  // namespace
 
 void Pipeline::Begin(Micros now) {
+  began_ = now;
   desk_.SetPhase(FilePhase::kStreaming, now);
   first_pass_.Begin(now);
   Go(now);
@@ -13,6 +21,7 @@ void Pipeline::Resume(std::uint32_t first_unsent, bool last_sent, Micros now) {
     log_.Sent(block, now);
   }
   if (last_sent) log_.Sent(log_.count(), now);
+  began_ = now;
   desk_.SetPhase(FilePhase::kStreaming, now);
   first_pass_.Resume(first_unsent, now);
   Go(now);
@@ -21,6 +30,7 @@ void Pipeline::Resume(std::uint32_t first_unsent, bool last_sent, Micros now) {
 void Pipeline::Go(Micros now) {
   if (step_ == Step::kFirstPass && first_pass_.done()) {
     step_ = Step::kRepair;
+    joins_until_ = now + std::max(2 * (now - began_), kLeastJoinTime);
     desk_.SetPhase(FilePhase::kRepairing, now);
     repair_.Begin(first_pass_.window().size(), now);
   }
@@ -32,8 +42,23 @@ void Pipeline::Go(Micros now) {
   if (step_ == Step::kClosing && closing_.done()) step_ = Step::kDone;
 }
 
-void Pipeline::OnJoin(Device& /*device*/, Micros now) {
-  if (step_ == Step::kRepair) repair_.OnJoin(now);
+/// Those who come too late would keep all others waiting, one after the other.
+bool Pipeline::takes_devices(Micros now) const {
+  return step_ == Step::kFirstPass || (step_ == Step::kRepair && now < joins_until_);
+}
+
+void Pipeline::OnJoin(Device& device, Micros now) {
+  switch (step_) {
+    case Step::kFirstPass: first_pass_.OnJoin(device, now); break;
+    case Step::kRepair: repair_.OnJoin(now); break;
+    case Step::kClosing: closing_.OnJoin(device, now); break;
+    case Step::kDone: break;
+  }
+  Go(now);
+}
+
+void Pipeline::OnRate(Micros now) {
+  if (step_ == Step::kFirstPass) first_pass_.OnRate(now);
 }
 
 void Pipeline::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
@@ -50,7 +75,7 @@ void Pipeline::OnNak(Device& device, std::uint16_t block, Micros now) {
   switch (step_) {
     case Step::kFirstPass: first_pass_.OnNak(device, now); break;
     case Step::kRepair: repair_.OnNak(device, block, now); break;
-    case Step::kClosing: closing_.OnNak(device, now); break;
+    case Step::kClosing: closing_.OnNak(device, block, now); break;
     case Step::kDone: break;
   }
   Go(now);

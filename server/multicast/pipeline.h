@@ -31,10 +31,11 @@ class Pipeline final : public Transfer {
   void OnOverrun(Device& device, std::uint16_t percent_x100, std::uint16_t block,
                  Micros now) override;
   void OnGivenUp(Device& device, Micros now) override;
+  void OnRate(Micros now) override;
   void OnTime(Micros now) override;
   [[nodiscard]] bool HasBlock(Micros now) override;
   std::uint32_t TakeBlock(Micros now) override;
-  [[nodiscard]] bool takes_devices() const override { return step_ <= Step::kRepair; }
+  [[nodiscard]] bool takes_devices(Micros now) const override;
   [[nodiscard]] std::optional<Micros> deadline(Micros now) override;
   [[nodiscard]] bool done() const override { return step_ == Step::kDone; }
 
@@ -50,6 +51,8 @@ class Pipeline final : public Transfer {
   Repair repair_;
   Closing closing_;
   Step step_ = Step::kFirstPass;
+  Micros began_{0};
+  Micros joins_until_{0};  ///< once repairing
 };
 
 }  // namespace server

@@ -15,6 +15,9 @@ constexpr std::uint32_t kMostAhead = 16;
 constexpr double kPatienceWithOne = 10;
 constexpr std::uint64_t kFreeRepairs = 64;
 constexpr std::uint32_t kQuickTries = 4;
+constexpr std::uint32_t kFirstWindow = 4;
+/// Groups of devices that may be in ours, most of them silent.
+constexpr std::size_t kSilentShare = 16;
 /// Who lets so many questions pass makes room for others, and is asked on.
 constexpr std::uint32_t kSilentTries = 2;
 constexpr Micros kFirstBound = std::chrono::milliseconds(200);
@@ -22,7 +25,8 @@ constexpr Micros kFirstBound = std::chrono::milliseconds(200);
 }  // namespace
 
 void Repair::Begin(std::uint32_t window, Micros now) {
-  window_ = std::max<std::uint32_t>(window, 4);
+  window_ = kFirstWindow;
+  window_limit_ = std::max(window, kFirstWindow);
   for (Device& device : desk_.devices()) {
     if (log_.guard() <= 1) device.whole = true;  // there is nothing that could be missing yet
   }
@@ -39,13 +43,14 @@ void Repair::Fill(Micros now) {
   for (const Device* device : group_) {
     if (device->tries <= kSilentTries) ++answering;
   }
+  const std::size_t most = desk_.options().poll_group;
   bool waiting = !group_.empty();
   for (Device& device : desk_.devices()) {
-    if (device.settled() || device.whole) continue;
-    if (std::find(group_.begin(), group_.end(), &device) != group_.end()) continue;
+    if (device.settled() || device.whole || device.in_group) continue;
     waiting = true;
-    if (answering >= desk_.options().poll_group) break;
+    if (answering >= most || group_.size() >= most * kSilentShare) break;
     ++answering;
+    device.in_group = true;
     device.tries = 0;
     device.named_at = Micros(0);
     group_.push_back(&device);
@@ -61,10 +66,10 @@ void Repair::Ask(Device& device, Micros now) {
   if (++device.tries == 1) device.unanswered_since = now;
 }
 
-void Repair::Remove(const Device& device, Micros now) {
-  const auto at = std::find(group_.begin(), group_.end(), &device);
-  if (at == group_.end()) return;
-  group_.erase(at);
+void Repair::Remove(Device& device, Micros now) {
+  if (!device.in_group) return;
+  device.in_group = false;
+  group_.erase(std::find(group_.begin(), group_.end(), &device));
   chosen_ = 0;
   Fill(now);
 }
@@ -76,13 +81,22 @@ void Repair::OnGivenUp(Device& device, Micros now) {
 /// A device in NAK mode that acknowledges has been sent into ACK mode by its own record of an
 /// overrun: it has to be asked again.
 void Repair::OnAck(Device& device, Micros now) {
-  const bool asked = std::find(group_.begin(), group_.end(), &device) != group_.end();
-  if (asked && now - device.asked_at > Bound(device)) Ask(device, now);
+  if (!device.in_group || now - device.asked_at <= Bound(device)) return;
+  if (IsSilent(device, now)) {
+    desk_.SetDead(device, "acknowledges instead of saying what it lacks", now);
+    Remove(device, now);
+  } else {
+    Ask(device, now);
+  }
+}
+
+bool Repair::IsSilent(const Device& device, Micros now) const {
+  return device.tries >= desk_.options().nak_tries &&
+         now - device.unanswered_since >= desk_.options().silence_limit;
 }
 
 void Repair::OnNak(Device& device, std::uint32_t block, Micros now) {
-  if (std::find(group_.begin(), group_.end(), &device) == group_.end()) return;
-  if (block < device.position) return;  // late: it has got further since
+  if (!device.in_group || block < device.position) return;  // late: it has got further since
   if (block > log_.guard()) {
     desk_.SetDead(device, "names a block behind the one that nobody has: it means another file",
                   now);
@@ -100,6 +114,7 @@ void Repair::OnNak(Device& device, std::uint32_t block, Micros now) {
       std::max(device.figures.loss, static_cast<double>(device.gaps) / device.position);
   if (block < log_.guard()) return;
   device.whole = true;
+  desk_.Changed();
   desk_.GiveRole(device, Role::kPassive, now);
   Remove(device, now);
 }
@@ -109,6 +124,8 @@ void Repair::Advance(Device& device, std::uint32_t block, Micros now) {
   if (device.sends == 1 && device.asked_at < log_.sent_at(device.position)) {
     device.round_trip.Add(now - log_.sent_at(device.position));
   }
+  window_ = std::min(window_ + 1, window_limit_);
+  alone_since_ = now;
   device.run = block == device.position + 1 ? device.run + 1 : 0;
   if (device.position > 0) ++device.gaps;
   device.position = block;
@@ -135,7 +152,7 @@ bool Repair::IsLacking(const Device& device) const {
 /// Further blocks that the device cannot have: they went out before it came, or lie in the middle
 /// of a long gap by all appearances.
 std::uint32_t Repair::ChooseAhead(Device& device) const {
-  if (device.position == 0) return 0;
+  if (device.position == 0 || device.tries > 0) return 0;
   device.ahead = std::max(device.ahead, device.position);
   while (device.ahead + 1 < log_.guard()) {
     const std::uint32_t block = device.ahead + 1;
@@ -182,14 +199,26 @@ std::uint32_t Repair::TakeBlock(Micros now) {
   for (Device* device : group_) {
     if (device->position == block) ++device->sends;
     if (device->ahead + 1 == block) device->ahead = block;
-    if (device->tries == 0) slowest = std::max(slowest, Bound(*device));
+    slowest = std::max(slowest, device->tries == 0 ? Bound(*device) : Micros(0));
   }
-  on_way_.push_back(now + slowest);
+  on_way_.push_back(now + std::max(slowest, kLeastBound));
   if (only != nullptr) {
     ++only->alone;
     CheckHopeless(*only, now);
   }
+  CheckUnreached(block, now);
   return block;
+}
+
+/// Gives up devices that name a block again and again, though it goes out: they have left the file,
+/// or hear questions and no blocks.
+void Repair::CheckUnreached(std::uint32_t block, Micros now) {
+  const std::vector<Device*> group = group_;
+  for (Device* device : group) {
+    if (device->position != block || device->sends <= kMostSends) continue;
+    desk_.SetReleased(*device, "names block " + std::to_string(block) + " again and again", now);
+    Remove(*device, now);
+  }
 }
 
 void Repair::CheckHopeless(Device& device, Micros now) {
@@ -224,8 +253,7 @@ void Repair::OnTime(Micros now) {
   const std::vector<Device*> group = group_;  // who is given up leaves it
   for (Device* device : group) {
     if (now < AskAt(*device)) continue;
-    if (device->tries >= desk_.options().nak_tries &&
-        now - device->unanswered_since >= desk_.options().silence_limit) {
+    if (IsSilent(*device, now)) {
       desk_.SetDead(*device, "does not say what it lacks", now);
       Remove(*device, now);
       continue;

@@ -35,8 +35,10 @@ class Repair {
  private:
   void Fill(Micros now);
   void Ask(Device& device, Micros now);
-  void Remove(const Device& device, Micros now);
+  void Remove(Device& device, Micros now);
+  [[nodiscard]] bool IsSilent(const Device& device, Micros now) const;
   void Advance(Device& device, std::uint32_t block, Micros now);
+  void CheckUnreached(std::uint32_t block, Micros now);
   void CheckHopeless(Device& device, Micros now);
   [[nodiscard]] std::uint32_t Choose(Micros now);
   [[nodiscard]] std::uint32_t ChooseAhead(Device& device) const;
@@ -50,7 +52,8 @@ class Repair {
   std::vector<Device*> group_;
   std::size_t turn_ = 0;      ///< whose wish is looked at first
   std::uint32_t chosen_ = 0;  ///< the block HasBlock has found
-  std::uint32_t window_ = 1;
+  std::uint32_t window_ = 1;  ///< grows as devices get what they lack
+  std::uint32_t window_limit_ = 1;
   std::deque<Micros> on_way_;  ///< when the blocks that may be on their way will have arrived
   Micros alone_since_{0};
   bool done_ = false;

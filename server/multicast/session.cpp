@@ -114,7 +114,7 @@ bool MulticastSession::AnnouncedEnough(Micros now) const {
   const std::size_t asked = devices_.size();
   const bool copy_is_old = now >= copy_at_;
   const bool minimal = figures_.announcements >= options_.announce_min && copy_is_old;
-  if (start_now_) return true;
+  if (start_now_) return now >= AnsweredAt();
   if (block_count() == 0) return minimal;
   if (start.longest_wait.count() > 0) {
     if (now >= figures_.began + start.longest_wait) return true;
@@ -140,7 +140,8 @@ std::optional<Micros> MulticastSession::AnnouncingEnds() const {
     ends = std::min(ends, figures_.began + plan_.start.longest_wait);
   }
   const std::size_t enough = std::max(plan_.start.expected, plan_.start.minimum);
-  if (block_count() > 0 && plan_.start.expected > 0 && devices_.size() >= enough) {
+  const bool all_here = plan_.start.expected > 0 && devices_.size() >= enough;
+  if (start_now_ || (block_count() > 0 && all_here)) {
     ends = std::min(ends, AnsweredAt());
   }
   return ends;
@@ -149,7 +150,11 @@ std::optional<Micros> MulticastSession::AnnouncingEnds() const {
 void MulticastSession::StartNow(Micros now) {
   if (figures_.phase != FilePhase::kAnnounced || devices_.empty()) return;
   start_now_ = true;
-  BeginTransfer(now);
+  if (AnnouncedEnough(now)) BeginTransfer(now);
+}
+
+void MulticastSession::OnRate(Micros now) {
+  if (transfer_ != nullptr) transfer_->OnRate(now);
 }
 
 void MulticastSession::BeginTransfer(Micros now) {
@@ -182,12 +187,13 @@ void MulticastSession::Resume(const FileMemory& memory, Micros now) {
     Device& device = AddDevice(known.peer, Micros(0));
     device.figures.state = known.state;
     device.figures.late = memory.phase != FilePhase::kAnnounced;
-    device.whole = known.whole;
-    device.recalled = true;
+    // While a file is being closed nobody lacks anything else, and nobody may be asked to name it.
+    device.whole = known.whole || memory.phase == FilePhase::kClosing;
   }
   first_unsent_ = std::min(memory.first_unsent, block_count() + 1);
   std::fill_n(sent_.begin(), first_unsent_, true);
   sent_[block_count()] = memory.last_sent;
+  highest_sent_ = memory.last_sent ? block_count() : first_unsent_ - 1;
   if (memory.phase == FilePhase::kAnnounced) {
     Begin(now);
   } else if (memory.phase >= FilePhase::kLingering || devices_.empty() || block_count() == 0) {
@@ -269,8 +275,8 @@ void MulticastSession::KeepAlive(Micros now) {
   keepalive_at_ = now + kKeepAliveSweep;
   if (now - heard_by_all_ < options_.keepalive) return;
   for (Device& device : devices_) {
-    if (device.settled() || device.role != Role::kPassive) continue;
-    if (now - device.spoken_to_at >= options_.keepalive) GiveRole(device, Role::kPassive, now);
+    if (device.settled() || now - device.spoken_to_at < options_.keepalive) continue;
+    GiveRole(device, device.role, now);
   }
 }
 
@@ -307,7 +313,12 @@ const Outgoing* MulticastSession::NextBlock(Micros now) {
     return nullptr;
   }
   heard_by_all_ = now;
-  ++(sent_[block] ? figures_.repair_frames : figures_.first_pass_frames);
+  if (goodbye) {
+    ++figures_.farewell_frames;
+  } else {
+    ++(sent_[block] ? figures_.repair_frames : figures_.first_pass_frames);
+  }
+  highest_sent_ = std::max(highest_sent_, block);
   sent_[block] = true;
   while (first_unsent_ <= block_count() && sent_[first_unsent_]) {
     if (++first_unsent_ % kBlocksBetweenChanges == 0) ++changes_;
@@ -357,21 +368,17 @@ void MulticastSession::Heard(Device& device, std::string what, Micros now) {
 }
 
 bool MulticastSession::OnRequest(const Peer& from, const mcftp::ReadRequest& request, Micros now) {
+  Device* known = Find(from);
   if (request.transfer_id != plan_.transfer_id) {
-    outbox_.SendError(from, kUnknownTransfer);
+    // A late copy of a request for another file must not end this one on a device.
+    if (known == nullptr || known->settled()) TurnAway(from, now);
     return true;
   }
   if (request.file_name != plan_.file->device_path) return false;
-  last_request_ = now;
-  Device* known = Find(from);
-  const bool open = figures_.phase == FilePhase::kAnnounced ||
-                    (transfer_ != nullptr && transfer_->takes_devices());
-  if (known != nullptr && (known->figures.state == DeviceState::kProven || open)) {
-    ++known->figures.requests;
-    Heard(*known, "RRQ", now);
-    if (known->figures.state != DeviceState::kProven) Rejoin(*known, now);
-  } else if (!open) {
-    outbox_.SendError(from, kUnknownTransfer);
+  if (known != nullptr) {
+    OnRequestOfKnown(*known, now);
+  } else if (!takes_devices(now)) {
+    TurnAway(from, now);
   } else if (devices_.size() >= options_.max_devices) {
     ++run_.turned_away;
   } else {
@@ -380,11 +387,45 @@ bool MulticastSession::OnRequest(const Peer& from, const mcftp::ReadRequest& req
   return true;
 }
 
+bool MulticastSession::takes_devices(Micros now) const {
+  if (figures_.phase == FilePhase::kAnnounced) return true;
+  return transfer_ != nullptr && transfer_->takes_devices(now);
+}
+
+/// So many of these answers in a second at most: anybody can ask for them in anybody's name.
+void MulticastSession::TurnAway(const Peer& from, Micros now) {
+  constexpr std::uint32_t kMostPerSecond = 100;
+  if (now - turning_since_ >= std::chrono::seconds(1)) {
+    turning_since_ = now;
+    turned_away_ = 0;
+  }
+  if (++turned_away_ <= kMostPerSecond) outbox_.SendError(from, kUnknownTransfer);
+}
+
+void MulticastSession::OnRequestOfKnown(Device& device, Micros now) {
+  ++device.figures.requests;
+  if (device.figures.requests == 2) last_request_ = now;
+  Heard(device, "RRQ", now);
+  const DeviceState state = device.figures.state;
+  const bool empty_file = block_count() == 0;
+  if (state == DeviceState::kReleased || (state != DeviceState::kJoined && !takes_devices(now))) {
+    if (empty_file) return;
+    if (state == DeviceState::kProven) device.figures.reason = "has asked for the file again";
+    TurnAway(device.figures.peer, now);
+  } else if (takes_devices(now)) {
+    if (!empty_file) Rejoin(device, now);
+  } else {
+    GiveRole(device, device.role, now);
+    if (transfer_ != nullptr) transfer_->OnJoin(device, now);
+  }
+}
+
 Device& MulticastSession::AddDevice(const Peer& peer, Micros now) {
   DeviceFigures& figures = figures_.devices.emplace_back();
   figures.peer = peer;
   Device& device = devices_.emplace_back(figures);
   device.joined_at = now;
+  device.first_joined_at = now;
   table_[peer] = &device;
   return device;
 }
@@ -394,6 +435,7 @@ void MulticastSession::Join(const Peer& from, Micros now) {
   device.figures.late = transfer_ != nullptr;
   device.figures.requests = 1;
   last_join_ = now;
+  last_request_ = now;
   ++changes_;
   Heard(device, "RRQ", now);
   Tell(MulticastEventKind::kJoined, &device, "", now);
@@ -416,7 +458,6 @@ void MulticastSession::Rejoin(Device& device, Micros now) {
   device.position = 0;
   device.named_at = Micros(0);
   device.whole = false;
-  device.recalled = false;
   device.ahead = 0;
   device.run = 0;
   if (was_given_up) ++changes_;
@@ -459,7 +500,10 @@ void MulticastSession::OnError(Device& device, const mcftp::ErrorFrame& error, M
     transfer_->OnGivenUp(device, now);
   } else if (error.code == mcftp::kOverrunCode) {
     const auto report = ParseOverrun(error.message);
-    if (!report || report->block > block_count()) return;
+    if (!report || report->block == 0 || report->block > highest_sent_ ||
+        report->percent_x100 > kWholePercent) {
+      return;
+    }
     ++device.figures.overruns;
     Tell(MulticastEventKind::kOverrun, &device, words, now);
     transfer_->OnOverrun(device, report->percent_x100, report->block, now);

@@ -49,6 +49,7 @@ class MulticastSession final : private TransferDesk {
                              const std::uint8_t* frame, std::size_t length, Micros now);
   void OnTime(Micros now);
   void StartNow(Micros now);
+  void OnRate(Micros now);
   /// Ends without waiting for anybody.
   void Stop(Micros now);
 
@@ -75,6 +76,7 @@ class MulticastSession final : private TransferDesk {
   void SetReleased(Device& device, const std::string& why, Micros now) override;
   void SetPhase(FilePhase phase, Micros now) override;
   void TellMaster(const Device& device, Micros now) override;
+  void Changed() override { ++changes_; }
 
   void Announce(Micros now);
   [[nodiscard]] bool AnnouncedEnough(Micros now) const;
@@ -89,6 +91,7 @@ class MulticastSession final : private TransferDesk {
 
   [[nodiscard]] bool OnRequest(const Peer& from, const mcftp::ReadRequest& request, Micros now);
   void Join(const Peer& from, Micros now);
+  void OnRequestOfKnown(Device& device, Micros now);
   void Rejoin(Device& device, Micros now);
   void OnAck(Device& device, const mcftp::AckFrame& ack, Micros now);
   void OnNak(Device& device, std::uint16_t block, Micros now);
@@ -98,6 +101,8 @@ class MulticastSession final : private TransferDesk {
   void Settle(Device& device, DeviceState state, const std::string& why, Micros now);
   void Tell(MulticastEventKind kind, const Device* device, std::string detail, Micros now);
   [[nodiscard]] Device* Find(const Peer& peer);
+  [[nodiscard]] bool takes_devices(Micros now) const;
+  void TurnAway(const Peer& from, Micros now);
   [[nodiscard]] Peer private_group() const;
 
   const MulticastOptions& options_;
@@ -112,17 +117,20 @@ class MulticastSession final : private TransferDesk {
   std::unique_ptr<Transfer> transfer_;
   std::vector<bool> sent_;  ///< by block
   std::uint32_t first_unsent_ = 1;
+  std::uint32_t highest_sent_ = 0;
 
   Micros copy_at_{0};    ///< when the next announcement is due
   Micros last_copy_{0};  ///< when the latest went out
   Micros last_join_{0};
-  Micros last_request_{0};  ///< also of a device that asks again
+  Micros last_request_{0};  ///< the first two of each device count
   bool start_now_ = false;
   Micros lingers_until_{0};
   bool farewell_ = false;   ///< the last block goes out once more
   Micros heard_by_all_{0};  ///< the latest block: it keeps everybody waiting on
   Micros keepalive_at_{0};
   std::uint64_t changes_ = 0;
+  Micros turning_since_{0};
+  std::uint32_t turned_away_ = 0;  ///< since then
 };
 
 }  // namespace server

@@ -1,11 +1,13 @@
 #include "server/multicast/session_store.h"
 
+#include <algorithm>
 #include <array>
 #include <fstream>
 #include <iterator>
 #include <sstream>
 #include <system_error>
 
+#include "base/crc32.h"
 #include "mcftp/wire/frames.h"
 
 namespace server {
@@ -35,6 +37,21 @@ class Hash {
   void Byte(unsigned char byte) { value_ = (value_ ^ byte) * 0x100000001B3U; }
   std::uint64_t value_ = 0xCBF29CE484222325U;
 };
+
+/// A file that was made anew may have its old size and time stamp: what devices hold of it would be
+/// mixed with what it is now.
+std::uint32_t ContentCrc(FileContent& content) {
+  base::Crc32 crc;
+  std::vector<std::uint8_t> piece(65536);
+  for (std::uint32_t at = 0; at < content.size();) {
+    const auto some =
+        std::min<std::uint32_t>(content.size() - at, static_cast<std::uint32_t>(piece.size()));
+    if (!content.Read(at, some, piece.data())) break;
+    crc.Update(piece.data(), some);
+    at += some;
+  }
+  return crc.value();
+}
 
 template <typename Value, typename List, typename Name>
 std::optional<Value> Named(const List& values, Name name, std::string_view word) {
@@ -92,7 +109,9 @@ std::uint64_t Fingerprint(const MulticastOptions& options,
     hash.Add(file.device_path);
     hash.Add(file.masks);
     hash.Add(file.time_stamp);
+    hash.Add(file.attributes);
     hash.Add(file.content->size());
+    hash.Add(ContentCrc(*file.content));
   }
   return hash.value();
 }

@@ -22,18 +22,21 @@ struct Device {
   DeviceFigures& figures;
   mcftp::Role role = mcftp::Role::kPassive;  ///< given last
   Micros joined_at{0};                       ///< its latest request
+  Micros first_joined_at{0};                 ///< its first
   Micros spoken_to_at{0};                    ///< the latest frame to it alone
   Micros heard_at{0};                        ///< the latest frame from it
   RoundTrip round_trip;
 
   /// Every block below this one is known to have arrived. Never falls; 0: nothing is known.
   std::uint32_t position = 0;
-  Micros named_at{0};       ///< the latest NAK that named it
-  std::uint32_t sends = 0;  ///< of that block, since it was named first
+  Micros named_at{0};          ///< the latest NAK that named it
+  std::uint32_t sends = 0;     ///< of that block, since it was named first
+  bool may_have_gaps = false;  ///< was made master in the middle, and has named nothing since
+  bool deaf = false;           ///< answers roles, and no blocks
+  bool in_group = false;       ///< is being asked what it lacks
+  std::uint32_t election = 0;  ///< the latest one in which it was offered the mastership
   /// It has every block but those that are held back for the end.
   bool whole = false;
-  /// Known from an earlier server only.
-  bool recalled = false;
 
   // The device is being asked something:
   Micros asked_at{0};
@@ -53,6 +56,7 @@ struct Device {
     kHasGuard,   ///< lacks the last block only
     kUncertain,  ///< was sent the last block
     kLacksLast,  ///< and did not get it
+    kClosed,     ///< says that it has closed the file, and is asked whether with every block
   };
   Closing closing = Closing::kAsked;
   bool deferred = false;  ///< it did not answer while others did
@@ -79,6 +83,8 @@ class TransferDesk {
   virtual void SetDead(Device& device, const std::string& why, Micros now) = 0;
   virtual void SetReleased(Device& device, const std::string& why, Micros now) = 0;
   virtual void SetPhase(FilePhase phase, Micros now) = 0;
+  /// Something has changed that a restarted server has to know.
+  virtual void Changed() = 0;
   virtual void TellMaster(const Device& device, Micros now) = 0;
 };
 
@@ -95,7 +101,7 @@ class Transfer {
   /// Goes on where another server has stopped: all blocks below `first_unsent` have gone out, with
   /// `last_sent` the last one too. Devices that were whole are so still.
   virtual void Resume(std::uint32_t first_unsent, bool last_sent, Micros now) = 0;
-  /// A device has asked for the first time, or again after it was given up.
+  /// A device has asked for the first time, or again: then it may have begun anew and have nothing.
   virtual void OnJoin(Device& device, Micros now) = 0;
   virtual void OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) = 0;
   virtual void OnNak(Device& device, std::uint16_t block, Micros now) = 0;
@@ -104,17 +110,25 @@ class Transfer {
                          Micros now) = 0;
   /// The device has given the file up; it is dead already.
   virtual void OnGivenUp(Device& device, Micros now) = 0;
+  /// Another rate is allowed: how fast devices were before says nothing any more.
+  virtual void OnRate(Micros /*now*/) {}
   virtual void OnTime(Micros now) = 0;
 
   /// Whether a block could go out now.
   [[nodiscard]] virtual bool HasBlock(Micros now) = 0;
   /// The number of the block that goes out now. HasBlock has just held.
   virtual std::uint32_t TakeBlock(Micros now) = 0;
-  /// Whether devices may still join: not when the file is being closed.
-  [[nodiscard]] virtual bool takes_devices() const = 0;
+  /// Whether devices may still join: not when the file is being closed, nor for ever before that.
+  [[nodiscard]] virtual bool takes_devices(Micros now) const = 0;
   [[nodiscard]] virtual std::optional<Micros> deadline(Micros now) = 0;
   [[nodiscard]] virtual bool done() const = 0;
 };
+
+/// A block that has gone out so often since a device named it, and is still named, does not reach
+/// it.
+inline constexpr std::uint32_t kMostSends = 24;
+/// Frames of an overrun report: a share in hundredths of a percent.
+inline constexpr std::uint16_t kWholePercent = 10000;
 
 /// The earlier of two moments that may not exist.
 [[nodiscard]] inline std::optional<Micros> Earlier(std::optional<Micros> a,

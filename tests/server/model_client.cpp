@@ -321,6 +321,7 @@ void ModelNetwork::RestartServer(server::MulticastOptions options,
                                  std::vector<server::MulticastFile> files) {
   run_ = std::make_unique<server::MulticastRun>(std::move(options), std::move(files));
   server_timer_ = Micros(-1);
+  server_dead_ = false;
   run_->Start({kServer.address, run_->former_port() != 0 ? run_->former_port() : kServer.port},
               now_);
   Pump();
@@ -373,6 +374,7 @@ void ModelNetwork::SendUp(std::size_t index, const std::string& bytes) {
   const int copies = Falls(link_.repeat) ? 2 : 1;
   for (int copy = 0; copy < copies; ++copy) {
     Travel(index, false, [this, index, bytes] {
+      if (server_dead_) return;
       run_->OnDatagram(PeerOf(index), bytes, now_);
       Pump();
     });
@@ -392,6 +394,7 @@ void ModelNetwork::SetClientTimer(std::size_t index) {
 }
 
 void ModelNetwork::Pump() {
+  if (server_dead_) return;
   run_->OnTime(now_);
   while (const server::Outgoing* next = run_->Next(now_)) SendDown(*next);
   const auto deadline = run_->deadline(now_);

@@ -36,6 +36,9 @@ class ModelClient {
   void OnTime(server::Micros now);
   [[nodiscard]] std::optional<server::Micros> deadline() const;
 
+  /// Leaves the file as after a frame that does not belong there: it waits for an announcement.
+  void Abort() { Reset(); }
+
   [[nodiscard]] State state() const { return state_; }
   /// The files that are complete by the client's own lights, as they stand on its disk.
   [[nodiscard]] const std::map<std::string, std::string>& files() const { return files_; }
@@ -111,6 +114,8 @@ class ModelNetwork {
   /// Wakes the server after it was told something.
   void Pump();
 
+  /// From now on nobody sends and nobody hears, but the devices.
+  void KillServer() { server_dead_ = true; }
   /// The server dies, and another one starts in its place.
   void RestartServer(server::MulticastOptions options, std::vector<server::MulticastFile> files);
 
@@ -155,6 +160,7 @@ class ModelNetwork {
   std::vector<server::Micros> latest_down_;
   std::vector<server::Micros> latest_up_;
   std::vector<server::Micros> timer_at_;
+  bool server_dead_ = false;
   server::Micros server_timer_{-1};
   server::Micros line_free_at_{0};
 };

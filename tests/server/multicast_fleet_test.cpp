@@ -272,6 +272,62 @@ TEST_F(MulticastFleetTest, ServesItsDevicesAmongHundredsThatOnlySeemToBeThere) {
   }
 }
 
+bool IsData(std::string_view bytes) {
+  return (static_cast<unsigned char>(bytes[1]) >> 4U) == 3;
+}
+
+/// As behind a switch that does not forward the files' group.
+TEST_F(MulticastFleetTest, EndsThoughSomeDevicesHearQuestionsAndNoBlocks) {
+  struct Case {
+    std::size_t devices;
+    std::size_t deaf;
+  };
+  for (const Case& c : {Case{1, 1}, Case{2, 2}, Case{5, 1}, Case{5, 2}}) {
+    for (const std::size_t size : {500U, 2000U, 300'000U}) {
+      for (const std::uint32_t window : {1U, 64U}) {
+        Circumstances with;
+        with.devices = c.devices;
+        with.size = size;
+        with.window = window;
+        ModelNetwork& network = Make(with);
+        network.passes_down = [&c](std::size_t device, std::string_view bytes) {
+          return device >= c.deaf || !IsData(bytes);
+        };
+        network.Run(std::chrono::minutes(10));
+        ASSERT_TRUE(network.run().finished());
+        // In lock-step the receipt of a last block that is all a device lacks rests on its copies.
+        if (window > 1) {
+          ExpectTruth(/*all=*/false);
+          EXPECT_EQ(Figures().Count(DeviceState::kProven), c.devices - c.deaf)
+              << c.devices << " devices, " << c.deaf << " deaf, " << size << " bytes";
+        }
+        EXPECT_LT(Figures().ended - Figures().data_began, std::chrono::minutes(2));
+      }
+    }
+  }
+}
+
+TEST_F(MulticastFleetTest, EndsThoughSomeDevicesHaveLeftTheFileAndGoOnAnswering) {
+  for (const std::uint32_t window : {1U, 64U}) {
+    for (const int milliseconds : {1130, 1200, 1400, 1900}) {
+      Circumstances with;
+      with.devices = 5;
+      with.size = 600'000;
+      with.loss = 0.01;
+      with.window = window;
+      with.link.bits_per_second = 10'000'000;
+      ModelNetwork& network = Make(with);
+      network.At(std::chrono::milliseconds(milliseconds), [&] {
+        network.device(1).Abort();
+        network.device(3).Abort();
+      });
+      network.Run(std::chrono::minutes(10));
+      ExpectTruth(/*all=*/false);
+      EXPECT_GE(Figures().Count(DeviceState::kProven), 3U) << milliseconds;
+    }
+  }
+}
+
 TEST_F(MulticastFleetTest, SendsFileAfterFileAndEndsEveryDeviceWithTheLast) {
   MulticastOptions options;
   options.start.expected = 4;

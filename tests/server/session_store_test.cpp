@@ -110,6 +110,37 @@ TEST_F(RestartedRunTest, GoesOnAtWhateverMomentTheServerDies) {
   }
 }
 
+TEST_F(RestartedRunTest, CallsNobodyProvenWhoGaveTheFileUpWhileThereWasNoServer) {
+  for (int hundredths = 100; hundredths < 260; hundredths += 11) {
+    std::filesystem::remove(options_.session_file);
+    ModelNetwork network(options_, {files_[0]}, 4, link_, 5);
+    network.At(std::chrono::milliseconds(hundredths * 10), [&] { network.KillServer(); });
+    network.At(std::chrono::milliseconds(hundredths * 10 + 40'000),
+               [&] { network.RestartServer(options_, {files_[0]}); });
+    network.Run(std::chrono::minutes(5));
+    ASSERT_TRUE(network.run().finished()) << "died at " << hundredths;
+    for (const DeviceFigures& device : network.run().figures().files[0].devices) {
+      if (device.state != DeviceState::kProven) continue;
+      const auto& had =
+          network.device(device.peer.address - ModelNetwork::PeerOf(0).address).files();
+      const auto file = had.find(files_[0].device_path);
+      EXPECT_TRUE(file != had.end() && file->second == contents_[0])
+          << ToText(device.peer) << ", died at " << hundredths << " hundredths";
+    }
+  }
+}
+
+TEST_F(RestartedRunTest, BeginsAnewWhenAFileHasOtherBytes) {
+  {
+    ModelNetwork network(options_, files_, 4, link_, 5);
+    network.Run(std::chrono::seconds(2));
+  }
+  contents_[0][5] = static_cast<char>(contents_[0][5] ^ 1);
+  files_[0].content = MemoryContent(contents_[0]);
+  const MulticastRun run(options_, files_);
+  EXPECT_EQ(run.former_port(), 0);
+}
+
 TEST_F(RestartedRunTest, AnnouncesNoFinishedFileAgainAndKeepsWhatWasProven) {
   ModelNetwork network(options_, files_, 4, link_, 5);
   std::size_t files_before = 0;
