@@ -45,5 +45,8 @@ inline bool ce_FD_ISSET(SOCKET socket, const ce_fd_set* set) {
 #define fopen ce_fopen
 #define fwrite ce_fwrite
 #define fclose ce_fclose
+#define fflush ce_fflush
+#undef stdout
+#define stdout ce_stdout()
 
 #include "winsock_names.h"

@@ -68,6 +68,8 @@ BOOL GetStoreInformation(STORE_INFORMATION* information);
 BOOL GetSystemMemoryDivision(DWORD* store_pages, DWORD* ram_pages, DWORD* page_size);
 DWORD SetSystemMemoryDivision(DWORD store_pages);
 BOOL GetSystemPowerStatusEx(SYSTEM_POWER_STATUS_EX* status, BOOL refreshed);
+HANDLE ActivateDevice(const WCHAR* key, DWORD client_information);
+BOOL DeactivateDevice(HANDLE device);
 HANDLE SetPowerRequirement(void* device, CEDEVICE_POWER_STATE state, ULONG flags,
                            void* system_state, ULONG system_flags);
 DWORD ReleasePowerRequirement(HANDLE requirement);

@@ -45,6 +45,17 @@ DWORD SetSystemMemoryDivision(DWORD /*store_pages*/) {
   return kDivisionFailed;
 }
 
+/// Desktop Windows loads its drivers by other means, and none of the device's.
+HANDLE ActivateDevice(const WCHAR* /*key*/, DWORD /*client_information*/) {
+  SetLastError(ERROR_CALL_NOT_IMPLEMENTED);
+  return nullptr;
+}
+
+BOOL DeactivateDevice(HANDLE /*device*/) {
+  SetLastError(ERROR_INVALID_HANDLE);
+  return FALSE;
+}
+
 BOOL GetSystemPowerStatusEx(SYSTEM_POWER_STATUS_EX* status, BOOL /*refreshed*/) {
   constexpr BYTE kUnknown = 255;
   SYSTEM_POWER_STATUS desktop = {};

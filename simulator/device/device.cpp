@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <utility>
 
+#include "driver/drivers.h"
 #include "faults/faults.h"
 #include "kernel/debug.h"
 #include "kernel/handle_table.h"
@@ -42,7 +43,8 @@ Device::Device(World& world, Profile profile, std::filesystem::path folder)
       network_(std::make_unique<Network>(*this)),
       screen_(std::make_unique<Screen>(*this)),
       libraries_(std::make_unique<Libraries>()),
-      messages_(std::make_unique<ManagementQueue>(*this)) {}
+      messages_(std::make_unique<ManagementQueue>(*this)),
+      drivers_(std::make_unique<Drivers>(*this)) {}
 
 // No thread may still use a part when it goes, and what handles stand for goes before the parts.
 Device::~Device() {

@@ -28,11 +28,12 @@ class Screen;           // windows and what they show
 class Network;          // the device's sockets
 class Debug;            // OutputDebugStringW, NKDbgPrintfW
 class Libraries;        // what programs load at run time
+class Drivers;          // what CreateFileW opens as "EFL1:"
 class ManagementQueue;  // where they leave messages for the management system
 
 /// Every part is made with the device and lives as long. `folder` is the device on disk:
 /// `storage/` is its file system, `registry.reg` its registry, `device.profile` its profile,
-/// `messages/` what it has sent to its message queue.
+/// `messages/` what it has sent to its message queue, `flash/` what was written into its flash.
 class Device {
  public:
   Device(World& world, Profile profile, std::filesystem::path folder);
@@ -59,6 +60,7 @@ class Device {
   [[nodiscard]] Network& network() const { return *network_; }
   [[nodiscard]] Debug& debug() const { return *debug_; }
   [[nodiscard]] Libraries& libraries() const { return *libraries_; }
+  [[nodiscard]] Drivers& drivers() const { return *drivers_; }
   [[nodiscard]] ManagementQueue& messages() const { return *messages_; }
 
   /// The device of the calling thread; ends the program with `what` when there is none.
@@ -83,6 +85,7 @@ class Device {
   std::unique_ptr<Screen> screen_;
   std::unique_ptr<Libraries> libraries_;
   std::unique_ptr<ManagementQueue> messages_;
+  std::unique_ptr<Drivers> drivers_;
 };
 
 }  // namespace sim

@@ -14,6 +14,7 @@ namespace sim {
 namespace {
 
 constexpr std::size_t kRecordsKept = 65536;
+constexpr std::size_t kConsoleKept = 65536;
 
 void Keep(std::deque<Debug::Record>& records, Debug::Record record) {
   if (records.size() == kRecordsKept) records.pop_front();
@@ -46,8 +47,14 @@ std::string Debug::KernelText() const {
   return Join(KernelRecords());
 }
 
+std::string Debug::ConsoleText() const {
+  const std::lock_guard<std::mutex> guard(mutex_);
+  return console_;
+}
+
 void Debug::Clear() {
   const std::lock_guard<std::mutex> guard(mutex_);
+  console_.clear();
   output_.clear();
   kernel_.clear();
 }
@@ -66,6 +73,12 @@ void Debug::AddOutput(Record record) {
 void Debug::AddKernel(Record record) {
   const std::lock_guard<std::mutex> guard(mutex_);
   Keep(kernel_, std::move(record));
+}
+
+void Debug::AddConsole(std::string_view text) {
+  const std::lock_guard<std::mutex> guard(mutex_);
+  if (console_.size() > 2 * kConsoleKept) console_.erase(0, console_.size() - kConsoleKept);
+  console_ += text;
 }
 
 }  // namespace sim

@@ -34,6 +34,8 @@ class Debug {
   /// All text of a route in one piece, as UTF-8.
   [[nodiscard]] std::string OutputText() const;
   [[nodiscard]] std::string KernelText() const;
+  /// What programs wrote to their console.
+  [[nodiscard]] std::string ConsoleText() const;
   void Clear();
 
   /// Gets every text of OutputDebugStringW as UTF-8, from the thread that put it out; an empty
@@ -43,11 +45,14 @@ class Debug {
   // For the API functions.
   void AddOutput(Record record);
   void AddKernel(Record record);
+  /// Keeps the most recent 65,536 bytes or more.
+  void AddConsole(std::string_view text);
 
  private:
   mutable std::mutex mutex_;
   std::deque<Record> output_;
   std::deque<Record> kernel_;
+  std::string console_;
   Listener listener_;
 };
 

@@ -1,5 +1,7 @@
 #include "memory/memory.h"
 
+#include <sys/mman.h>
+
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
@@ -13,6 +15,7 @@ namespace {
 
 constexpr std::uint32_t kUsualPageSize = 4096;
 constexpr int kRubbish = 0xCC;
+constexpr std::uint32_t kHostPageSize = 4096;
 
 std::uint32_t PageSize(const Profile& profile) {
   return profile.page_size == 0 ? kUsualPageSize : profile.page_size;
@@ -27,6 +30,20 @@ std::uint64_t PagesFor(std::uint64_t bytes, std::uint32_t page_size) {
   return bytes / page_size + (bytes % page_size != 0 ? 1 : 0);
 }
 
+/// Fresh pages whose addresses have 32 bits. @return null when the host has none.
+void* MapLow(std::size_t size) {
+  constexpr int kProtection = PROT_READ | PROT_WRITE;
+  int flags = MAP_PRIVATE | MAP_ANONYMOUS;
+#ifdef MAP_32BIT
+  flags |= MAP_32BIT;
+#endif
+  void* const address = mmap(nullptr, size, kProtection, flags, -1, 0);
+  if (address == MAP_FAILED) return nullptr;
+  if (reinterpret_cast<std::uintptr_t>(address) + std::uint64_t{size} <= UINT32_MAX) return address;
+  munmap(address, size);
+  return nullptr;
+}
+
 }  // namespace
 
 Memory::Memory(Device& device)
@@ -39,6 +56,7 @@ Memory::Memory(Device& device)
 
 Memory::~Memory() {
   for (const auto& [address, live] : blocks_) std::free(const_cast<void*>(address));
+  for (const auto& [address, size] : pages_) munmap(reinterpret_cast<void*>(address), size);
 }
 
 Memory::Block Memory::Allocate(std::size_t size, bool zeroed) {
@@ -106,6 +124,40 @@ std::uint64_t Memory::peak_bytes() const {
 std::uint64_t Memory::bad_frees() const {
   const std::lock_guard<std::mutex> hold(blocks_mutex_);
   return bad_frees_;
+}
+
+Memory::Block Memory::AllocatePages(std::size_t size) {
+  const std::uint64_t pages = PagesFor(size, kHostPageSize);
+  const std::uint64_t bytes = pages * kHostPageSize;
+  if (size == 0 || bytes > UINT32_MAX || !ram_.Reserve(bytes)) return {};
+  const auto length = static_cast<std::size_t>(bytes);
+  void* const address = MapLow(length);
+  if (address == nullptr) {
+    ram_.Release(bytes);
+    return {};
+  }
+  const std::lock_guard<std::mutex> hold(blocks_mutex_);
+  pages_.emplace(reinterpret_cast<std::uintptr_t>(address), length);
+  return {address, next_number_++, length};
+}
+
+bool Memory::FreePages(void* address) {
+  const std::lock_guard<std::mutex> hold(blocks_mutex_);
+  const auto found = pages_.find(reinterpret_cast<std::uintptr_t>(address));
+  if (found == pages_.end()) return false;
+  munmap(address, found->second);
+  ram_.Release(found->second);
+  pages_.erase(found);
+  return true;
+}
+
+bool Memory::InPages(std::uint64_t address, std::uint64_t size) const {
+  const std::lock_guard<std::mutex> hold(blocks_mutex_);
+  auto after = pages_.upper_bound(static_cast<std::uintptr_t>(address));
+  if (address > UINTPTR_MAX || after == pages_.begin()) return false;
+  --after;
+  const std::uint64_t offset = address - after->first;
+  return offset <= after->second && size <= after->second - offset;
 }
 
 Memory::Division Memory::division() const {

@@ -8,6 +8,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <map>
 #include <mutex>
 #include <unordered_map>
 
@@ -49,6 +50,16 @@ class Memory {
   /// Double frees and frees of foreign addresses; anything but 0 is a fault of the program.
   [[nodiscard]] std::uint64_t bad_frees() const;
 
+  // ---- whole pages, as drivers want them; any thread ----
+
+  /// Pages below 4 GiB, all zero, which take their room from program memory.
+  /// @return number 0 when there are none.
+  Block AllocatePages(std::size_t size);
+  /// @return false when no pages begin at `address`.
+  bool FreePages(void* address);
+  /// Whether all of these bytes lie in pages of one AllocatePages.
+  [[nodiscard]] bool InPages(std::uint64_t address, std::uint64_t size) const;
+
   // ---- the division; any thread ----
 
   struct Division {
@@ -87,6 +98,7 @@ class Memory {
   std::uint64_t live_bytes_ = 0;
   std::uint64_t peak_bytes_ = 0;
   std::uint64_t bad_frees_ = 0;
+  std::map<std::uintptr_t, std::size_t> pages_;  ///< sizes by address
 };
 
 }  // namespace sim

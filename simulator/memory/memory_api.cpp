@@ -3,6 +3,7 @@
 #include <cstdint>
 
 #include "ce/errors.h"
+#include "ce/files.h"
 #include "ce/system.h"
 #include "device/device.h"
 #include "faults/api_call.h"
@@ -47,6 +48,29 @@ std::size_t LocalSize(HLOCAL block) {
   call.Argument("block", found.number);
   if (found.number == 0) return call.Fail(ERROR_INVALID_HANDLE, std::size_t{0});
   return call.Return(found.size);
+}
+
+void* VirtualAlloc(void* address, std::size_t size, DWORD type, DWORD protection) {
+  sim::ApiCall call("VirtualAlloc", ERROR_OUTOFMEMORY);
+  call.Argument("size", static_cast<std::int64_t>(size));
+  void* const none = nullptr;
+  if (call.failed()) return call.Return(none);
+  if ((type & MEM_COMMIT) == 0 || protection != PAGE_READWRITE) {
+    return call.Fail(ERROR_INVALID_PARAMETER, none);
+  }
+  // No program of the device may choose.
+  if (address != nullptr) return call.Fail(ERROR_INVALID_ADDRESS, none);
+  const sim::Memory::Block block = call.device().memory().AllocatePages(size);
+  if (block.number == 0) return call.Fail(ERROR_OUTOFMEMORY, none);
+  static_cast<void>(call.Return(block.number));
+  return block.address;
+}
+
+BOOL VirtualFree(void* address, std::size_t size, DWORD type) {
+  sim::ApiCall call("VirtualFree", sim::kCannotFail);
+  if (size != 0 || type != MEM_RELEASE) return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
+  if (!call.device().memory().FreePages(address)) return call.Fail(ERROR_INVALID_ADDRESS, FALSE);
+  return call.Return(TRUE);
 }
 
 void GlobalMemoryStatus(MEMORYSTATUS* status) {

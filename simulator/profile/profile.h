@@ -69,6 +69,9 @@ struct Profile {
   std::string message_library_lacks;             ///< an entry point that is not there; empty: none
   bool message_queue_opens = true;               ///< false: no connection comes about
 
+  // Firmware.
+  std::string flash_start = "writes";  ///< what starting the flash does: writes, fails or restarts
+
   // Time.
   std::string start_time = "2006-03-01 14:05:09";  ///< local time at which a virtual world begins
   std::int32_t utc_offset_minutes = 0;

@@ -129,6 +129,11 @@ Complaint CheckQueueEntry(std::string_view text) {
   return "is no entry point of the message queue; write lapi_open, lapi_close or lapi_write";
 }
 
+Complaint CheckFlashStart(std::string_view text) {
+  if (text == "writes" || text == "fails" || text == "restarts") return {};
+  return "is nothing that the flash does; write writes, fails or restarts";
+}
+
 template <typename T>
 constexpr std::uint64_t kMost = static_cast<std::uint64_t>(std::numeric_limits<T>::max());
 constexpr std::uint64_t kMostPages = 1U << 19;  // 2 GiB of 4,096-byte pages
@@ -179,6 +184,10 @@ std::vector<Setting<Profile>> MakeProfileSettings() {
            "Entry point that it lacks: lapi_open, lapi_close, lapi_write or empty for none.",
            CheckQueueEntry),
       Switch("messages", "opens", &P::message_queue_opens, "no: the queue refuses connections."),
+
+      Text("flash", "start", &P::flash_start,
+           "Starting it writes what its driver stores, fails, or writes and restarts the device.",
+           CheckFlashStart),
 
       Text("time", "start", &P::start_time, "Local time at which a virtual world begins.",
            CheckTime),

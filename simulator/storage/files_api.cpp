@@ -5,6 +5,7 @@
 #include "ce/errors.h"
 #include "ce/files.h"
 #include "device/device.h"
+#include "driver/drivers.h"
 #include "faults/api_call.h"
 #include "locale/clock.h"
 #include "storage/open_file.h"
@@ -30,6 +31,16 @@ HANDLE OpenByName(sim::ApiCall& call, const WCHAR* name, const sim::Storage::Ope
   return call.Return(call.device().handles().Add(std::move(file)));
 }
 
+/// A device has no file behind it: how it is shared and made is its driver's business.
+HANDLE OpenDevice(sim::ApiCall& call, const WCHAR* name, DWORD access) {
+  call.Argument("name", name);
+  call.Argument("access", access);
+  if (call.failed()) return call.Return(INVALID_HANDLE_VALUE);
+  HANDLE opened = INVALID_HANDLE_VALUE;
+  const DWORD error = call.device().drivers().Open(name, opened);
+  return error == ERROR_SUCCESS ? call.Return(opened) : call.Fail(error, INVALID_HANDLE_VALUE);
+}
+
 std::shared_ptr<sim::OpenFile> FindFile(const sim::ApiCall& call, HANDLE handle) {
   const auto lock = call.world().Acquire();
   return call.device().handles().FindAs<sim::OpenFile>(handle);
@@ -46,6 +57,7 @@ BOOL Finish(sim::ApiCall& call, DWORD error) {
 HANDLE CreateFileW(const WCHAR* name, DWORD access, DWORD share, SECURITY_ATTRIBUTES* /*security*/,
                    DWORD disposition, DWORD attributes, HANDLE /*template_file*/) {
   sim::ApiCall call("CreateFileW", ERROR_ACCESS_DENIED);
+  if (sim::Drivers::IsDeviceName(name)) return OpenDevice(call, name, access);
   return OpenByName(call, name, {name, {access, share, false, false}, disposition, attributes});
 }
 

@@ -9,6 +9,7 @@
 #include "ce/errors.h"
 #include "device/device.h"
 #include "faults/api_call.h"
+#include "kernel/debug.h"
 #include "locale/code_pages.h"
 #include "storage/open_file.h"
 #include "storage/storage.h"
@@ -26,7 +27,7 @@ constexpr int kEndOfFile = -1;
 
 namespace sim {
 
-Streams::Streams() = default;
+Streams::Streams() : console_(std::make_unique<ce_FILE>()) {}
 Streams::~Streams() = default;
 
 ce_FILE* Streams::Add(std::shared_ptr<OpenFile> file) {
@@ -131,10 +132,16 @@ std::size_t ce_fwrite(const void* bytes, std::size_t size, std::size_t count, ce
   call.Argument("count", count);
   const std::size_t nothing = 0;
   if (call.failed() || size == 0 || count == 0) return call.Return(nothing);
-  const std::shared_ptr<sim::OpenFile> file = call.device().storage().streams().Find(stream);
-  if (file == nullptr) return call.Fail(ERROR_INVALID_HANDLE, nothing);
+  sim::Streams& streams = call.device().storage().streams();
+  const std::shared_ptr<sim::OpenFile> file = streams.Find(stream);
+  const bool is_console = stream == streams.console();
+  if (file == nullptr && !is_console) return call.Fail(ERROR_INVALID_HANDLE, nothing);
   if (bytes == nullptr || count > std::numeric_limits<DWORD>::max() / size) {
     return call.Fail(ERROR_INVALID_PARAMETER, nothing);
+  }
+  if (is_console) {
+    call.device().debug().AddConsole({static_cast<const char*>(bytes), size * count});
+    return call.Return(count);
   }
   DWORD written = 0;
   const DWORD error = file->Write(bytes, static_cast<DWORD>(size * count), written);
@@ -150,4 +157,19 @@ int ce_fclose(ce_FILE* stream) {
     return call.Fail(ERROR_INVALID_HANDLE, kEndOfFile);
   }
   return call.Return(call.failed() ? kEndOfFile : 0);
+}
+
+/// What is written has reached its place already.
+int ce_fflush(ce_FILE* stream) {
+  sim::ApiCall call("fflush", ERROR_DISK_FULL);
+  call.Argument("stream", stream);
+  if (call.failed()) return call.Return(kEndOfFile);
+  const sim::Streams& streams = call.device().storage().streams();
+  const bool is_open = stream == streams.console() || streams.Find(stream) != nullptr;
+  return is_open ? call.Return(0) : call.Fail(ERROR_INVALID_HANDLE, kEndOfFile);
+}
+
+ce_FILE* ce_stdout() {
+  sim::ApiCall call("stdout", sim::kCannotFail);
+  return call.Return(call.device().storage().streams().console());
 }

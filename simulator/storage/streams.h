@@ -21,6 +21,8 @@ class Streams {
   Streams& operator=(const Streams&) = delete;
 
   ce_FILE* Add(std::shared_ptr<OpenFile> file);
+  /// The programs' console: always open, without a file.
+  [[nodiscard]] ce_FILE* console() const { return console_.get(); }
   /// @return the stream's file, null for what is no open stream of the device.
   [[nodiscard]] std::shared_ptr<OpenFile> Find(const ce_FILE* stream) const;
   /// Closes the stream. @return false when it was none.
@@ -31,6 +33,7 @@ class Streams {
 
  private:
   using Map = std::map<const ce_FILE*, std::unique_ptr<ce_FILE>>;
+  const std::unique_ptr<ce_FILE> console_;
   mutable std::mutex mutex_;
   Map streams_;
 };

@@ -86,8 +86,14 @@ HANDLE CreateFileMappingW(HANDLE file, SECURITY_ATTRIBUTES* security, DWORD prot
 void* MapViewOfFile(HANDLE mapping, DWORD access, DWORD offset_high, DWORD offset_low,
                     std::size_t size);
 BOOL UnmapViewOfFile(const void* view);
+/// Asks the driver behind an open device. `returned` is never null.
+BOOL DeviceIoControl(HANDLE device, DWORD code, void* input, DWORD input_size, void* output,
+                     DWORD output_size, DWORD* returned, OVERLAPPED* overlapped);
 
 ce_FILE* ce_fopen(const char* name, const char* mode);
 std::size_t ce_fwrite(const void* bytes, std::size_t size, std::size_t count, ce_FILE* stream);
 int ce_fclose(ce_FILE* stream);
+int ce_fflush(ce_FILE* stream);
+/// The stream that the device calls `stdout`: its programs' console.
+ce_FILE* ce_stdout();
 }

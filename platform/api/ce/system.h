@@ -50,6 +50,10 @@ inline constexpr DWORD SYSMEM_MUSTREBOOT = 1;
 inline constexpr DWORD SYSMEM_REBOOTPENDING = 2;
 inline constexpr DWORD SYSMEM_FAILED = 3;
 
+inline constexpr DWORD MEM_COMMIT = 0x1000;
+inline constexpr DWORD MEM_RESERVE = 0x2000;
+inline constexpr DWORD MEM_RELEASE = 0x8000;
+
 // ---- power ----
 inline constexpr BYTE AC_LINE_OFFLINE = 0;
 inline constexpr BYTE AC_LINE_ONLINE = 1;
@@ -132,6 +136,16 @@ void GlobalMemoryStatus(MEMORYSTATUS* status);
 BOOL GetStoreInformation(STORE_INFORMATION* information);
 BOOL GetSystemMemoryDivision(DWORD* store_pages, DWORD* ram_pages, DWORD* page_size);
 DWORD SetSystemMemoryDivision(DWORD store_pages);
+
+/// Whole pages, all zero. Without a wish for an address they lie below 4 GiB, where drivers reach
+/// them.
+void* VirtualAlloc(void* address, std::size_t size, DWORD type, DWORD protection);
+BOOL VirtualFree(void* address, std::size_t size, DWORD type);
+
+/// Loads the driver that the registry key describes, below HKEY_LOCAL_MACHINE.
+/// @return the handle of the loaded driver, null when there is none.
+HANDLE ActivateDevice(const WCHAR* key, DWORD client_information);
+BOOL DeactivateDevice(HANDLE device);
 
 BOOL GetSystemPowerStatusEx(SYSTEM_POWER_STATUS_EX* status, BOOL refreshed);
 /// @return the requirement's handle, null when it could not be set.
