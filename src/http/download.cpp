@@ -1,6 +1,7 @@
 // CHTTPClient::Get: one file from the server to the device.
 #include "base/text.h"
 #include "device/file_crc.h"
+#include "device/flash/ram_file.h"
 #include "http/http_client.h"
 #include "http/texts.h"
 #include "http/url.h"
@@ -18,10 +19,39 @@ constexpr std::size_t kRequestArea = 32768;
 constexpr DWORD kRoundPauseMs = 50;
 constexpr std::string_view kRamPrefix = "RAM:";
 
-/// What writes to `destination`. @return empty when there is no such kind of file, or no memory.
-device::LocalObject<device::File> FileFor(std::string_view destination) noexcept {
-  if (base::StartsWith(destination, kRamPrefix)) return device::LocalObject<device::File>();
-  return device::LocalObject<device::File>(new device::File);
+bool IsRamFile(const char* destination) noexcept {
+  return base::StartsWith(base::View(destination), kRamPrefix);
+}
+
+/// The name by which its kind of file knows `destination`.
+const char* NameOf(const char* destination) noexcept {
+  return destination + (IsRamFile(destination) ? kRamPrefix.size() : 0);
+}
+
+/// The store may have been made for the job; whoever comes first makes it.
+void PrepareRamStore() noexcept {
+  if (device::HasRAMStore()) return;
+  ShowStatus(device::InitRAMStore() ? texts::kShowRamReady : texts::kShowNoRam);
+}
+
+/// What writes to `destination`. @return empty when there is no memory for it.
+device::LocalObject<device::File> FileFor(const char* destination) noexcept {
+  if (!IsRamFile(destination)) return device::LocalObject<device::File>(new device::File);
+  device::LocalObject<device::File> file(new device::RAMFile);
+  PrepareRamStore();
+  Log(texts::kRamFile, NameOf(destination));
+  return file;
+}
+
+/// @return 0, or why there is no CRC-32 of `destination`, `length` bytes long.
+std::uint32_t ComputeCrc(const char* destination, std::uint32_t length,
+                         std::uint32_t* crc) noexcept {
+  if (!IsRamFile(destination)) {
+    Log(texts::kFileCrc);
+    return device::FILECRC32(destination, crc);
+  }
+  Log(texts::kRamFileCrc);
+  return device::RAMFILECRC32(NameOf(destination), crc, length, destination);
 }
 
 /// CREATE_ALWAYS refuses a file that an earlier round has given one of these attributes.
@@ -181,7 +211,8 @@ CHTTPClient::Round CHTTPClient::ReceiveFile(const ResponseHead& head,
   const std::uint32_t attributes = head.attributes.value_or(0);
   file_->SetAttributes(path, attributes);
   Log(texts::kAttributes, path, static_cast<std::int32_t>(attributes), closed ? 1 : 0);
-  const bool good = outcome == Body::kComplete && (!crc_check_ || CheckCrc(head.crc32.value_or(0)));
+  const bool good =
+      outcome == Body::kComplete && (!crc_check_ || CheckCrc(length, head.crc32.value_or(0)));
   if (good)
     BundleRx.store(BundleRx.load(std::memory_order_relaxed) + length, std::memory_order_relaxed);
   Sleep(kRoundPauseMs);
@@ -189,10 +220,10 @@ CHTTPClient::Round CHTTPClient::ReceiveFile(const ResponseHead& head,
 }
 
 bool CHTTPClient::OpenDestination(std::uint32_t size) noexcept {
-  file_ = FileFor(destination_.view());
-  if (!file_ || !destination_fits_) return false;
   const char* const path = destination_.c_str();
-  if (file_->OpenForWriting(path, false, size)) return true;
+  file_ = FileFor(path);
+  if (!file_ || !destination_fits_) return false;
+  if (file_->OpenForWriting(NameOf(path), false, size)) return true;
   return file_->last_error() == ERROR_ACCESS_DENIED && OpenProtected(*file_, path, size);
 }
 
@@ -240,12 +271,11 @@ bool CHTTPClient::WriteBlock(std::uint32_t position, const char* bytes,
   return file_->Seek(position) && file_->Write(bytes, size);
 }
 
-bool CHTTPClient::CheckCrc(std::uint32_t expected) noexcept {
+bool CHTTPClient::CheckCrc(std::uint32_t length, std::uint32_t expected) noexcept {
   const char* const path = destination_.c_str();
   OutputDebugStringW(TEXT("performing CRC check\r\n"));
-  Log(texts::kFileCrc);
   std::uint32_t computed = 0;
-  if (device::FILECRC32(path, &computed) != 0) {
+  if (ComputeCrc(path, length, &computed) != 0) {
     Log(texts::kNoCrcComputed);
     return false;
   }

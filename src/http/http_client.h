@@ -75,9 +75,9 @@ class CHTTPClient : public CSocketIO, public device::OnLocalHeap {
   void SetIdentity(const Identity& identity) noexcept;
   void SetCoreName(const char* core_name) noexcept;
 
-  /// Where the next Get writes: a path on the device. A path of more than 259 characters, and one
-  /// that begins with "RAM:" while there is no RAM store, makes Get fail as a file that cannot be
-  /// opened.
+  /// Where the next Get writes: a path on the device, or "RAM:" and a name for a file of the RAM
+  /// store, which Get makes if it is not there yet. A path of more than 259 characters makes Get
+  /// fail as a file that cannot be opened.
   void SetDestination(const WCHAR* path) noexcept;
 
   /// Null for none.
@@ -120,7 +120,7 @@ class CHTTPClient : public CSocketIO, public device::OnLocalHeap {
   int ReceiveBlock(std::uint32_t most) noexcept;
   [[nodiscard]] bool WriteBlock(std::uint32_t position, const char* bytes,
                                 std::uint32_t size) noexcept;
-  [[nodiscard]] bool CheckCrc(std::uint32_t expected) noexcept;
+  [[nodiscard]] bool CheckCrc(std::uint32_t length, std::uint32_t expected) noexcept;
 
   std::uint16_t connected_port_ = 0;
   std::uint32_t connected_address_ = 0xFFFFFFFFU;

@@ -42,6 +42,7 @@ inline constexpr char kNoAttributes[] = "Orvenix - CHttpClient:Get - No Content-
 inline constexpr char kTimeStamp[] = "Orvenix - Content-timestamp: %s\r\n";
 inline constexpr char kNoTimeStamp[] = "Orvenix - CHttpClient:Get - No Content-timestamp\r\n";
 inline constexpr char kCheckpoints[] = "Orvenix - check pointing is true\r\n";
+inline constexpr char kRamFile[] = "Orvenix - after Ramfile::Init - opening, %s\r\n";
 inline constexpr char kOpenError[] = "Orvenix - OpenForWriting - error, %s\r\n";
 inline constexpr char kOpened[] = "Orvenix - after OPenForWriting - success, !%s%%\r\n";
 inline constexpr char kEmptyFile[] = "Orvenix - after OpenForWriting - zero length file, !%s%%\r\n";
@@ -53,6 +54,7 @@ inline constexpr char kWriteError[] = "Orvenix - file->Write error\r\n";
 inline constexpr char kSizeMatch[] = "Orvenix - http file size match, transfer success\r\n";
 inline constexpr char kAttributes[] = "Setting file attributes, %s, %d, %d\r\n";
 inline constexpr char kFileCrc[] = "Orvenix - FILECRC32\r\n";
+inline constexpr char kRamFileCrc[] = "Orvenix - RAMFILECRC32\r\n";
 inline constexpr char kNoCrcComputed[] = "Orvenix - RAMFILECRC32 or FILECRC32 returned error\r\n";
 inline constexpr char kGoodCrc[] = "Orvenix - good CRC\r\n";
 inline constexpr char kCrcError[] = "Orvenix - CRC error, %s, %d, %d\r\n";
@@ -65,6 +67,8 @@ inline constexpr char kEngineReportEntering[] = "Orvenix - SendUpgradeComplete -
 inline constexpr char kEngineReportExiting[] = "Orvenix - SendUpgradeComplete - Exiting\r\n";
 
 // ---- status lines; two carry their line end into the window ----
+inline constexpr char kShowRamReady[] = "RAMFile::Init - ok";
+inline constexpr char kShowNoRam[] = "RAMFile::Init - error";
 inline constexpr char kShowOpenError[] = "file open error";
 inline constexpr char kShowEmptyFile[] = "filesize = 0";
 inline constexpr char kShowWriteError[] = "fileWrite error - %s";

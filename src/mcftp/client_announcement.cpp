@@ -2,6 +2,7 @@
 #include <coredll.h>
 
 #include "base/text.h"
+#include "device/flash/ram_file.h"
 #include "mcftp/client.h"
 #include "mcftp/rules/mask_compare.h"
 #include "mcftp/rules/time_stamp.h"
@@ -122,7 +123,9 @@ bool McftpClient::MakeOutputFile() noexcept {
     file_.Reset(new device::File);
   } else {
     Log("RAM image: %s", file_name_.c_str());
-    if (owner_.make_ram_file != nullptr) file_.Reset(owner_.make_ram_file(file_name_.c_str()));
+    file_.Reset(new device::RAMFile);
+    // Whoever comes first makes the store. Without one the file cannot be opened.
+    if (!device::HasRAMStore()) device::InitRAMStore();
   }
   return static_cast<bool>(file_);
 }

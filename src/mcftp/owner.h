@@ -3,8 +3,6 @@
 
 #include <coredll.h>
 
-#include "device/file.h"
-
 namespace mcftp {
 
 /// The owner of a client. Everything in it is optional; it has to outlive the client's thread.
@@ -25,11 +23,6 @@ struct ClientOwner {
   /// client's own: it changes with the next file, unannounced, and is gone with the client.
   HWND window = nullptr;
   UINT message = 0;
-
-  /// Makes the object for a file of the RAM store, with `new`; null from it says that there is no
-  /// store or no memory. `name` is the announced one, with "RAM:" in front. Without this function
-  /// the device has no RAM store, and such files are refused.
-  device::File* (*make_ram_file)(const char* name) = nullptr;
 };
 
 }  // namespace mcftp

@@ -12,9 +12,12 @@ namespace upgrade {
 inline constexpr std::size_t kPathSize = 260;
 using PathText = base::FixedText<kPathSize>;
 
+/// In front of the names of files in the memory of the flash driver.
+inline constexpr std::string_view kRamPrefix = "RAM:";
+
 /// Whether the name is that of a file in the memory of the flash driver. Letter case counts.
 [[nodiscard]] constexpr bool IsRamName(std::string_view name) noexcept {
-  return base::StartsWith(name, "RAM:");
+  return base::StartsWith(name, kRamPrefix);
 }
 
 /// What stands behind the last backslash.

@@ -2,6 +2,7 @@
 
 #include "base/number.h"
 #include "base/text.h"
+#include "device/flash/ram_file.h"
 #include "report/log/log.h"
 #include "report/window/progress_window.h"
 #include "upgrade/list_file/package_options.h"
@@ -31,6 +32,10 @@ void InitRam(const UpgradeConfig& job) noexcept {
   report::Log("Orvenix - InitRAM - RAM needed = %s\r\n", size.c_str());
   const std::uint32_t bytes = base::LeadingNumber(size.view()) + kDriverRoom;
   report::ShowStatus("InitRAM = %d", static_cast<int>(bytes));
+  device::SetRAMSize(bytes);
+  // A store that an earlier job has made goes on with its size.
+  if (device::HasRAMStore() || device::InitRAMStore()) return;
+  report::Log("Orvenix - InitRAM - RAM init error = %s\r\n", size.c_str());
 }
 
 void ReadRamAllocation(Run& run) noexcept {
@@ -41,6 +46,7 @@ void ReadRamAllocation(Run& run) noexcept {
     // hostile file holds, is the driver's to refuse.
     if (size == 0) continue;
     report::ShowStatus("RAMSIZE From parms = %d", size);
+    device::SetRAMSize(static_cast<std::uint32_t>(size) + kDriverRoom);
     run.os_image = true;
     return;
   }

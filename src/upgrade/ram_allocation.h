@@ -5,11 +5,13 @@
 
 namespace upgrade {
 
-/// Shows what the first "RAM:" storage requirement of the job asks for, if there is one.
+/// Has the flash driver make its store for what the first "RAM:" storage requirement of the job
+/// asks for, if there is one. A failure is logged; the first file that goes into the store tries
+/// again.
 void InitRam(const UpgradeConfig& job) noexcept;
 
-/// Takes the first "RAMAllocSize=" other than 0 among the packages of this pass: shows it, and
-/// notes that an image for the flash comes.
+/// Takes the first "RAMAllocSize=" other than 0 among the packages of this pass: shows it, sets the
+/// size of the store that the first file makes, and notes that an image for the flash comes.
 void ReadRamAllocation(Run& run) noexcept;
 
 }  // namespace upgrade

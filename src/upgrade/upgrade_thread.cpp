@@ -14,6 +14,7 @@
 #include "report/window/progress_window.h"
 #include "upgrade/cleanup.h"
 #include "upgrade/file_lists.h"
+#include "upgrade/flash_step.h"
 #include "upgrade/keep_awake.h"
 #include "upgrade/memory_division.h"
 #include "upgrade/multicast_launch.h"
@@ -188,6 +189,7 @@ void CarryOut(Run& run, std::int32_t mode) noexcept {
   KeepOrDeletePassState(run);
   Log("Orvenix - SendUpgradeComplete\r\n");
   http::SendUpgradeComplete(run.job, run.error_text.c_str());
+  if (run.os_image && run.succeeded) FlashOsImage();
   ShowOutcome(run);
 }
 

@@ -3,6 +3,7 @@
 #include "base/number.h"
 #include "device/file.h"
 #include "device/file_crc.h"
+#include "device/flash/ram_file.h"
 #include "report/log/log.h"
 #include "report/window/progress_window.h"
 #include "upgrade/fetch.h"
@@ -27,6 +28,13 @@ struct Candidate {
   std::uint32_t size;  ///< bytes
 };
 
+/// @return 0, or why there is no CRC-32.
+std::uint32_t ComputeCrc(const Candidate& file, std::uint32_t* crc) noexcept {
+  const char* const path = file.destination.c_str();
+  if (!IsRamName(file.destination.view())) return device::FILECRC32(path, crc);
+  return device::RAMFILECRC32(path + kRamPrefix.size(), crc, file.size, path);
+}
+
 /// @return whether the file is on the device with the expected content.
 bool IsRight(Run& run, const Candidate& file) noexcept {
   const char* const path = file.destination.c_str();
@@ -34,7 +42,7 @@ bool IsRight(Run& run, const Candidate& file) noexcept {
   report::Log("Orvenix - ValidateFiles - check file !%s!\r\n", path);
   if (IsRamName(file.destination.view())) run.os_image = true;
   std::uint32_t crc = 0;
-  if (device::FILECRC32(path, &crc) != 0) {
+  if (ComputeCrc(file, &crc) != 0) {
     report::Log("Orvenix - ValidateFiles - crc error, no file, %s\r\n", path);
     return false;
   }
@@ -44,10 +52,18 @@ bool IsRight(Run& run, const Candidate& file) noexcept {
   return false;
 }
 
-std::uint32_t LengthOf(const char* path) noexcept {
-  device::File file;
+std::uint32_t LengthOf(device::File& file, const char* name) noexcept {
   std::uint32_t length = 0;
-  return file.OpenForReading(path, true) && file.GetSize(&length) ? length : 0;
+  return file.OpenForReading(name, true) && file.GetSize(&length) ? length : 0;
+}
+
+std::uint32_t LengthOf(const PathText& destination) noexcept {
+  if (IsRamName(destination.view())) {
+    device::RAMFile file;
+    return LengthOf(file, destination.c_str() + kRamPrefix.size());
+  }
+  device::File file;
+  return LengthOf(file, destination.c_str());
 }
 
 void FetchAgain(Run& run, const Candidate& file) noexcept {
@@ -58,7 +74,7 @@ void FetchAgain(Run& run, const Candidate& file) noexcept {
               path);
   if (!FetchFile(run, file.source.c_str(), path, OnFailedGet::kTryAgain)) return;
   report::SetFileProgress(100);
-  const std::uint32_t length = LengthOf(path);
+  const std::uint32_t length = LengthOf(file.destination);
   if (length > 0) AddReceivedBytes(length);
 }
 

@@ -5,18 +5,12 @@
 // fail does so, for every n up to the last call of the job. Whatever call that is, the program must
 // not crash or hang, must keep nothing, must leave the right file alone and must never leave a
 // damaged file that looks complete.
-#include <gmock/gmock.h>
-#include <sys/wait.h>
-#include <unistd.h>
+#include "scenario/fault_walk.h"
 
-#include <algorithm>
-#include <cstdlib>
-#include <iostream>
-#include <iterator>
+#include <gmock/gmock.h>
+
 #include <memory>
 #include <string>
-#include <string_view>
-#include <vector>
 
 #include "ce/files.h"
 #include "ce/system.h"
@@ -42,21 +36,6 @@ constexpr int kShards = 32;
 const std::string kRight = "right from the beginning";
 const std::string kNew(3000, 'n');
 const std::string kDamaged(3000, 'd');
-
-/// Calls that give something back or end a thread. When one fails, what it should have given back
-/// is kept (a file that cannot be closed stays open, and is asked for again and again), and no
-/// program could do anything about it.
-constexpr std::string_view kReleases[] = {
-    "CloseHandle",     "FindClose",   "RegCloseKey",   "ReleasePowerRequirement",
-    "UnmapViewOfFile", "WSACleanup",  "DestroyWindow", "CloseToolhelp32Snapshot",
-    "TerminateThread", "closesocket", "PostMessageW"};
-
-bool IsRelease(const std::string& call) {
-  return std::find(std::begin(kReleases), std::end(kReleases), call) != std::end(kReleases);
-}
-
-/// Far more than a job takes whose every wait runs into its limit, in seconds.
-constexpr std::uint32_t kLimit = 900;
 
 /// One run.
 class Walk {
@@ -87,7 +66,7 @@ class Walk {
     EXPECT_TRUE(result == ICFG_OK || result == ICFG_NO_POWER || result == ICFG_NO_SPACE ||
                 result == ICFG_TEST_FAILED)
         << result;
-    ended_ = test::AwaitEndOfJobs(*device_, kLimit);
+    ended_ = test::AwaitEndOfJobs(*device_, test::kWalkLimit);
     call_ = device_->faults().last_fired();
     device_->faults().Clear();
   }
@@ -98,12 +77,12 @@ class Walk {
 
   void Check() {
     EXPECT_EQ(device_->memory().bad_frees(), 0U);
-    if (!IsRelease(call_)) CheckEnd();
+    if (!test::IsRelease(call_)) CheckEnd();
     EXPECT_EQ(GetFile("\\right.txt"), kRight);
     EXPECT_EQ(GetFile("\\Old\\Data\\settings"), kRight) << "to be saved";
     const auto repaired = GetFile("\\damaged.bin");
     if (fired()) {
-      EXPECT_TRUE(repaired == kNew || repaired == kDamaged || IsRelease(call_))
+      EXPECT_TRUE(repaired == kNew || repaired == kDamaged || test::IsRelease(call_))
           << repaired.value_or("(none)");
     } else {
       EXPECT_EQ(repaired, kNew);
@@ -168,45 +147,12 @@ class Walk {
   std::string call_;
 };
 
-/// Makes one run in a process of its own, so that a run that goes wrong spoils no other.
-enum class Outcome : std::uint8_t { kPassed = 0, kNotFired = 1, kFailed = 2 };
-Outcome RunCall(std::uint64_t nth) {
-  std::cout.flush();
-  const pid_t child = fork();
-  if (child == 0) {
-    Outcome outcome = Outcome::kFailed;
-    {
-      Walk walk(nth);
-      walk.Run();
-      SCOPED_TRACE("call " + std::to_string(nth) + " failed: " + walk.call());
-      walk.Check();
-      outcome = walk.fired() ? Outcome::kPassed : Outcome::kNotFired;
-    }
-    std::cout.flush();
-    _exit(static_cast<int>(::testing::Test::HasFailure() ? Outcome::kFailed : outcome));
-  }
-  int status = 0;
-  if (child < 0 || waitpid(child, &status, 0) != child || !WIFEXITED(status)) {
-    return Outcome::kFailed;
-  }
-  return static_cast<Outcome>(std::min(WEXITSTATUS(status), 2));
-}
-
 class FaultWalkTest : public ::testing::TestWithParam<int> {};
 
-// Each shard takes every 32nd call: a failure names the call, and its number is enough to
-// repeat the run.
+// Each shard takes every 32nd call.
 TEST_P(FaultWalkTest, SurvivesTheFailureOfEachCallInTurn) {
-  std::uint64_t nth = static_cast<std::uint64_t>(GetParam()) + 1;
-  // Collected first: a process inherits the failures that were noted before it began.
-  std::vector<std::uint64_t> failed;
-  for (Outcome outcome = Outcome::kPassed; outcome != Outcome::kNotFired; nth += kShards) {
-    ASSERT_LT(nth, 20000U) << "the job does not end";
-    outcome = RunCall(nth);
-    if (outcome == Outcome::kFailed) failed.push_back(nth);
-  }
-  EXPECT_THAT(failed, ::testing::IsEmpty());
-  RecordProperty("calls", static_cast<int>(nth));
+  const auto first = static_cast<std::uint64_t>(GetParam()) + 1;
+  EXPECT_THAT(test::WalkCalls<Walk>(first, kShards), ::testing::IsEmpty());
 }
 
 INSTANTIATE_TEST_SUITE_P(EveryThirtySecond, FaultWalkTest, ::testing::Range(0, kShards));

@@ -228,16 +228,6 @@ TEST_F(GetTest, GivesUpWhenTheFileCannotBeOpened) {
   EXPECT_THAT(StatusLines(), ElementsAre("file open error", "\\no folder\\a.bin"));
 }
 
-TEST_F(GetTest, GivesUpOnARamFileWhileThereIsNoRamStore) {
-  client_.SetDestination(TEXT("RAM:os.bin"));
-  server().Add(Served("hello"));
-
-  EXPECT_FALSE(Get());
-
-  EXPECT_THAT(LogLines(), Contains("Orvenix - OpenForWriting - error, RAM:os.bin"));
-  EXPECT_FALSE(File("RAM:os.bin").has_value());
-}
-
 TEST_F(GetTest, GivesUpOnADestinationThatIsTooLongInsteadOfCuttingIt) {
   const std::u16string path = u"\\" + std::u16string(259, u'a');
   client_.SetDestination(path.c_str());

@@ -2,9 +2,13 @@
 #include <memory>
 
 #include "device/device.h"
+#include "device/flash/ram_file.h"
+#include "driver/drivers.h"
+#include "driver/flash_driver.h"
+#include "faults/faults.h"
 #include "mcftp/client/client_test.h"
-#include "mcftp/client/ram_store.h"
 #include "memory/memory.h"
+
 namespace {
 
 using std::chrono::milliseconds;
@@ -26,28 +30,41 @@ using ::testing::IsEmpty;
 class RamFileTest : public MulticastTest {
  protected:
   RamFileTest() {
-    test::ram_store = &store_;
+    device().drivers().SetLibrary(u"eflashdrv.dll", [this](sim::Device& on) {
+      driver_ = std::make_shared<sim::FlashDriver>(on);
+      return driver_;
+    });
+    device::SetRAMSize(1000);
     offer_.name = "ram:image.bin";
     offer_.size = 600;
   }
-  test::RamStore store_;
+  /// What the store holds of the file.
+  std::string Content(const std::string& name) {
+    const auto files = driver_->Files();
+    const auto found = files.find(name);
+    if (found == files.end()) return "(none)";
+    const auto& content = found->second.content;
+    return {content.begin(), content.begin() + found->second.written};
+  }
+
+  std::shared_ptr<sim::FlashDriver> driver_;
   Offer offer_;
 };
 
 TEST_F(RamFileTest, AreRefusedByADeviceWithoutAStore) {
+  device::SetRAMSize(0);
   Start();
 
   ToPublic(Announcement(offer_));
 
-  EXPECT_THAT(Log(), ElementsAre("Announcement on 239.1.1.1 for:", "ram:image.bin", "MCT mask(s): ",
-                                 "Data blocks: 2", "RAM image: ram:image.bin", kWaiting));
-  EXPECT_THAT(Status(), IsEmpty());
+  EXPECT_THAT(Log(), ElementsAre("Announcement on 239.1.1.1 for:", "ram:image.bin",
+                                 "MCT mask(s): ", "Data blocks: 2", "RAM image: ram:image.bin",
+                                 "Opening: image.bin (600)", "Error opening: image.bin", kWaiting));
   EXPECT_THAT(Frames(), IsEmpty());
   EXPECT_EQ(End(), 0);
 }
 
 TEST_F(RamFileTest, AreReceivedIntoTheStoreUnderTheirNameWithoutPrefix) {
-  owner().make_ram_file = &test::MakeRamFile;
   Start();
 
   ToPublic(Announcement(offer_));
@@ -55,23 +72,32 @@ TEST_F(RamFileTest, AreReceivedIntoTheStoreUnderTheirNameWithoutPrefix) {
                                  "MCT mask(s): ", "Data blocks: 2", "RAM image: ram:image.bin",
                                  "Opening: image.bin (600)", "Establishing session with 10.0.0.2",
                                  "RRQ sent to 10.0.0.2"));
-  EXPECT_EQ(store_.made, "ram:image.bin");
-  EXPECT_EQ(store_.opened, "image.bin");
-  EXPECT_EQ(store_.size, 600U);
+  EXPECT_EQ(driver_->Files().at("image.bin").content.size(), 600U) << "room for all of it";
   EXPECT_THAT(Status(), ElementsAre("01 00 00 00 00 00 00 00 00 00 02 58 ram:image.bin"));
   ToClient(kOackPassive);
   ToPrivate(Data(2, 88));
   ToClient(kOackAck);
   ToPrivate(Data(1, 512));
-  EXPECT_EQ(store_.content, std::string(512, 'A') + std::string(88, 'B'));
+  EXPECT_EQ(Content("image.bin"), std::string(512, 'A') + std::string(88, 'B'));
   EXPECT_EQ(End(), 0);
-  EXPECT_EQ(store_.files, 0);
+}
+
+TEST_F(RamFileTest, AreReceivedIntoTheStoreThatTheJobHasMade) {
+  ASSERT_TRUE(device::InitRAMStore());
+  const auto made = driver_;
+  Start();
+  EstablishAsMaster(offer_);
+  ToPrivate(Data(1, 512));
+  ToPrivate(Data(2, 88));
+  EXPECT_EQ(driver_, made);
+  EXPECT_EQ(Content("image.bin"), std::string(512, 'A') + std::string(88, 'B'));
+  EXPECT_EQ(End(), 0);
 }
 
 TEST_F(RamFileTest, AreClosedAndDiscardedBeforeTheNextFile) {
-  owner().make_ram_file = &test::MakeRamFile;
   Start();
   EstablishAsMaster(offer_);
+  const std::size_t blocks = device().memory().live_blocks();
   ToPrivate(Data(1, 512));
   ToPrivate(Data(2, 88));
   EXPECT_THAT(
@@ -79,18 +105,17 @@ TEST_F(RamFileTest, AreClosedAndDiscardedBeforeTheNextFile) {
                          "1 files received (600 total bytes)", "0 file size mismatches",
                          "Failed to update timestamp", "Failed to update attributes",
                          "File closed: image.bin", "Dallying..."));
-  EXPECT_EQ(store_.files, 1);
+  EXPECT_EQ(device().memory().live_blocks(), blocks);
 
   ToPrivate(Data(2, 88));
 
-  EXPECT_EQ(store_.files, 0);
+  EXPECT_EQ(device().memory().live_blocks(), blocks - 1);
   EXPECT_EQ(End(), 0);
 }
 
 TEST_F(RamFileTest, ThatCannotBeOpenedMakeNoFolder) {
-  store_.refuses = true;
-  owner().make_ram_file = &test::MakeRamFile;
   offer_.name = "RAM:\\New\\image.bin";
+  offer_.size = 1001;
   Start();
 
   ToPublic(Announcement(offer_));
@@ -99,8 +124,20 @@ TEST_F(RamFileTest, ThatCannotBeOpenedMakeNoFolder) {
       Log(),
       ElementsAre("Announcement on 239.1.1.1 for:", "RAM:\\New\\image.bin",
                   "MCT mask(s): ", "Data blocks: 2", "RAM image: RAM:\\New\\image.bin",
-                  "Opening: \\New\\image.bin (600)", "Error opening: \\New\\image.bin", kWaiting));
-  EXPECT_EQ(store_.files, 0);
+                  "Opening: \\New\\image.bin (1001)", "Error opening: \\New\\image.bin", kWaiting));
+  EXPECT_FALSE(test::Exists("\\New"));
+  EXPECT_EQ(End(), 0);
+}
+
+TEST_F(RamFileTest, ThatTheStoreStopsTakingAreGivenUp) {
+  Start();
+  EstablishAsMaster(offer_);
+  device().faults().Add({"DeviceIoControl", 1, 0, ERROR_GEN_FAILURE});
+
+  ToPrivate(Data(1, 512));
+
+  EXPECT_THAT(Log(), Contains("WriteBlockToFile - SetFilePointer call failed"));
+  device().faults().Clear();
   EXPECT_EQ(End(), 0);
 }
 

@@ -10,6 +10,7 @@
 
 #include "ce/errors.h"
 #include "device/file.h"
+#include "device/flash/ram_file.h"
 #include "faults/faults.h"
 #include "http/job_client.h"
 #include "kernel/kernel.h"
@@ -432,6 +433,40 @@ TEST_F(ValidationTest, NotesThatAnImageComesWhenAFileInMemoryIsChecked) {
   RunOutOfMemory();
   ValidateFiles(run());
   EXPECT_TRUE(run().os_image);
+}
+
+TEST_F(ValidationTest, ComparesAFileInMemoryOverTheSizeThatTheJobNames) {
+  device::SetRAMSize(1000);
+  ASSERT_TRUE(device::InitRAMStore());
+  {
+    device::RAMFile file;
+    ASSERT_TRUE(file.OpenForWriting("os.bin", false, 100));
+    ASSERT_TRUE(file.Write("right and more", 14));
+  }
+  Expect({"os.bin", "RAM:os.bin", "*", test::CrcText("right"), "5"});
+  ValidateFiles(run());
+  EXPECT_TRUE(run().os_image);
+  EXPECT_EQ(run().validated_bytes, 5U);
+  EXPECT_THAT(server().received(), IsEmpty());
+}
+
+TEST_F(ValidationTest, FetchesAFileInMemoryThatIsWrongOrMissing) {
+  device::SetRAMSize(1000);
+  Expect({"os.bin", "RAM:os.bin", "*", server().Put("os.bin", "right"), "5"});
+  ValidateFiles(run());
+  EXPECT_THAT(ReadLog(), HasSubstr("Orvenix - ValidateFiles - crc error, no file, RAM:os.bin\r\n"));
+  std::uint32_t crc = 0;
+  EXPECT_EQ(device::RAMFILECRC32("os.bin", &crc, 5, "RAM:os.bin"), 0U);
+  EXPECT_EQ(std::to_string(crc), test::CrcText("right"));
+  EXPECT_EQ(run().validated_bytes, 0U);
+  {
+    device::RAMFile file;
+    ASSERT_TRUE(file.OpenForWriting("os.bin", true, 0));
+    ASSERT_TRUE(file.Write("w", 1));
+  }
+  ValidateFiles(run());
+  EXPECT_THAT(ReadLog(), HasSubstr("Orvenix - ValidateFiles - crc mismatch, RAM:os.bin, "));
+  EXPECT_EQ(server().RequestedPaths().size(), 2U);
 }
 
 TEST_F(ValidationTest, GoesOnWithTheNextFileWhenOneCannotBeFetched) {

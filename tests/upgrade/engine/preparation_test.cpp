@@ -8,7 +8,9 @@
 #include "ce/errors.h"
 #include "ce/files.h"
 #include "ce/system.h"
+#include "device/flash/ram_file.h"
 #include "faults/faults.h"
+#include "kernel/debug.h"
 #include "kernel/kernel.h"
 #include "product_support/jobs.h"
 #include "support/device_files.h"
@@ -28,6 +30,7 @@ using test::Exists;
 using test::GetFile;
 using test::PutFile;
 using ::testing::HasSubstr;
+using ::testing::Not;
 using ::testing::Optional;
 
 class PreparationTest : public DeviceTest {
@@ -313,6 +316,20 @@ TEST_F(MemoryTest, ForTheDriverIsTheFirstRequirementsAndALittleMore) {
   test::AddStore(job(), "RAM:b", "5");
   InitRam(job());
   EXPECT_EQ(Log(), "Orvenix - InitRAM - RAM needed = 16777216\r\n");
+  EXPECT_TRUE(device::HasRAMStore());
+  EXPECT_THAT(device().debug().KernelText(), HasSubstr("Allocated 16818176 Bytes!\r\n"));
+
+  InitRam(job());
+  EXPECT_THAT(Log(), Not(HasSubstr("error"))) << "the next job finds it";
+}
+
+TEST_F(MemoryTest, ForTheDriverMayNotBeThere) {
+  test::AddStore(job(), "RAM:a", "1000000000");
+  InitRam(job());
+  EXPECT_EQ(Log(),
+            "Orvenix - InitRAM - RAM needed = 1000000000\r\n"
+            "Orvenix - InitRAM - RAM init error = 1000000000\r\n");
+  EXPECT_FALSE(device::HasRAMStore());
 }
 
 TEST_F(MemoryTest, ForTheDriverIsNotSpokenOfWithoutARequirement) {
@@ -331,6 +348,9 @@ TEST_F(MemoryTest, ForAnImageIsThatOfTheFirstPackageThatNamesIt) {
   run.pass = 2;
   ReadRamAllocation(run);
   EXPECT_TRUE(run.os_image);
+  EXPECT_FALSE(device::HasRAMStore()) << "the first file makes it";
+  EXPECT_TRUE(device::InitRAMStore());
+  EXPECT_THAT(device().debug().KernelText(), HasSubstr("Allocated 40965 Bytes!\r\n"));
 }
 
 TEST_F(MemoryTest, ForAnImageMayBeAnyNumberButZero) {

@@ -1,0 +1,292 @@
+// Firmware: images that come into the flash driver's store and are written into the flash.
+#include <gmock/gmock.h>
+
+#include <algorithm>
+#include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "ce/errors.h"
+#include "ce/system.h"
+#include "device/flash/ram_file.h"
+#include "driver/drivers.h"
+#include "faults/faults.h"
+#include "kernel/debug.h"
+#include "memory/memory.h"
+#include "orvenix/configlet.h"
+#include "orvenix/upgrade_thread.h"
+#include "product_support/jobs.h"
+#include "scenario/scenario_test.h"
+#include "server/multicast_run.h"
+#include "tools/fleet/fleet.h"
+#include "tools/virtual_multicast.h"
+
+namespace {
+
+using std::chrono::seconds;
+using test::HostJob;
+using test::ReadLog;
+using ::testing::AllOf;
+using ::testing::Contains;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::IsSupersetOf;
+using ::testing::Not;
+
+constexpr char kOtherEnd[] = "(none)";
+
+class FirmwareTest : public test::ScenarioTest {
+ protected:
+  explicit FirmwareTest(const std::string& flash_start = "writes")
+      : ScenarioTest(ProfileFor(flash_start)) {
+    network().SetDefaultLink(fleet::Plan::DefaultLink());
+    job_.store = "RAM:";
+    job_.required_space = "1000000";
+  }
+  ~FirmwareTest() override { port_.reset(); }
+
+  static sim::Profile ProfileFor(const std::string& flash_start) {
+    sim::Profile profile;
+    profile.address = "10.0.0.1";
+    profile.flash_start = flash_start;
+    return profile;
+  }
+
+  /// What was written into the flash under this name.
+  std::string Flashed(const std::string& name) {
+    const auto path = device().folder() / "flash" / name;
+    if (!std::filesystem::exists(path)) return kOtherEnd;
+    std::ifstream file(path, std::ios::binary);
+    return {std::istreambuf_iterator<char>(file), {}};
+  }
+  std::size_t FlashedFiles() {
+    const auto folder = device().folder() / "flash";
+    if (!std::filesystem::exists(folder)) return 0;
+    const std::filesystem::directory_iterator begin(folder);
+    return static_cast<std::size_t>(std::distance(begin, {}));
+  }
+
+  /// Lists the image for the job and puts it on the HTTP server.
+  void List(const std::string& name, const std::string& image) {
+    const std::string crc = server().Put("fw/" + name, image);
+    list_ += "fw/" + name + ",RAM:" + name + ",TQ5*," + crc + "," + std::to_string(image.size()) +
+             "\r\n";
+    const std::string list_crc = server().Put("fw/list.txt", list_);
+    job_.list = test::HostFile{"fw/list.txt", "\\list.txt", "*", list_crc};
+  }
+  void Announce(const std::string& name, const std::string& image) {
+    files_.push_back({name, "", 0x20, "2006-03-01 14:05:09", server::MemoryContent(image)});
+  }
+  void StartMulticast() {
+    job_.multicast = "-A=239.1.1.1 -P=7000 -HV=TQ52";
+    server::MulticastOptions options;
+    options.start.expected = 1;
+    run_ = std::make_unique<server::MulticastRun>(options, files_);
+    port_ =
+        std::make_unique<tools::VirtualMulticast>(world(), sim::Endpoint{0x0A000002, 7001}, *run_);
+    After(seconds(10), [this] { port_->Start(); });
+  }
+  void RunJob() {
+    EXPECT_EQ(Start(job_), ICFG_OK);
+    ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  }
+  std::size_t Count(const std::string& line) const {
+    const std::string text = device_text();
+    std::size_t count = 0;
+    for (std::size_t at = text.find(line); at != std::string::npos; at = text.find(line, at + 1)) {
+      ++count;
+    }
+    return count;
+  }
+
+  HostJob job_;
+  std::string list_;
+  std::vector<server::MulticastFile> files_;
+  std::unique_ptr<server::MulticastRun> run_;
+  std::unique_ptr<tools::VirtualMulticast> port_;
+
+ private:
+  std::string device_text() const {
+    return const_cast<FirmwareTest*>(this)->device().debug().KernelText();
+  }
+};
+
+TEST_F(FirmwareTest, ComesByHttpIntoTheStoreAndIsFlashed) {
+  const std::string image = fleet::Noise(200000, 1);
+  List("os.nb0", image);
+
+  RunJob();
+
+  EXPECT_EQ(Flashed("os.nb0"), image);
+  EXPECT_EQ(FlashedFiles(), 1U);
+  EXPECT_EQ(Count("EFL_Helper_Start_EFLASH:: SUCCESS!."), 1U);
+  EXPECT_THAT(device().debug().KernelText(), HasSubstr("Allocated 1040960 Bytes!"));
+  EXPECT_THAT(ShownLines(),
+              IsSupersetOf({"InitRAM = 1040960", "Validating, RAM:os.nb0", "Starting EFlash...",
+                            "This may take several minutes..."}));
+  EXPECT_THAT(ShownLines(), Not(Contains("RAMFile::Init - ok"))) << "the job has made it";
+  EXPECT_THAT(ReadLog(), AllOf(HasSubstr("Orvenix - InitRAM - RAM needed = 1000000\r\n"),
+                               HasSubstr("Orvenix - after Ramfile::Init - opening, os.nb0\r\n"),
+                               HasSubstr("Orvenix - RAMFILECRC32\r\n"),
+                               HasSubstr("Starting Eflash...After Eflash...Local Upgrade "
+                                         "Executing\r\n")));
+}
+
+TEST_F(FirmwareTest, ComesByMulticastAndNeedsNoHttp) {
+  const std::string image = fleet::Noise(150000, 2);
+  List("os.nb0", image);
+  Announce("\\list.txt", list_);
+  Announce("ram:os.nb0", image);
+  StartMulticast();
+
+  RunJob();
+
+  EXPECT_EQ(Flashed("os.nb0"), image);
+  EXPECT_EQ(FlashedFiles(), 1U);
+  EXPECT_THAT(server().RequestedPaths(), IsEmpty());
+  EXPECT_FALSE(test::Exists("\\os.nb0"));
+  EXPECT_EQ(run_->figures().files.back().Count(server::DeviceState::kProven), 1U);
+}
+
+TEST_F(FirmwareTest, ThatMulticastSpoiltIsRepairedByHttp) {
+  const std::string image = fleet::Noise(150000, 3);
+  const std::string loader = fleet::Noise(20000, 4);
+  List("os.nb0", image);
+  List("loader.nb0", loader);
+  std::string spoilt = image;
+  spoilt[77777] ^= 1;
+  Announce("RAM:os.nb0", spoilt);
+  Announce("RAM:loader.nb0", loader);
+  StartMulticast();
+
+  RunJob();
+
+  EXPECT_EQ(Flashed("os.nb0"), image);
+  EXPECT_EQ(Flashed("loader.nb0"), loader);
+  EXPECT_THAT(server().RequestedPaths(), ElementsAre("fw/list.txt:1,1", "fw/os.nb0:2,1"));
+  EXPECT_THAT(ReadLog(), HasSubstr("Orvenix - ValidateFiles - crc mismatch, RAM:os.nb0, "));
+}
+
+TEST_F(FirmwareTest, IsFetchedIntoAStoreThatTheJobAsksForInItsPackage) {
+  const std::string image = fleet::Noise(100000, 5);
+  server().Put("fw/os.nb0", image);
+  auto* const job = new UpgradeConfig;
+  job->SetBaseURL(test::kServerUrl);
+  test::AddPackage(*job, {0, "os.nb0", "RAM:", "fw/", "", "RAMAllocSize=100000"});
+  CloseHandle(StartUpgradeThread(job, 1));
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_EQ(Flashed("os.nb0"), image);
+  EXPECT_THAT(ShownLines(), IsSupersetOf({"RAMSIZE From parms = 100000", "RAMFile::Init - ok"}));
+  EXPECT_THAT(device().debug().KernelText(), HasSubstr("Allocated 140960 Bytes!"));
+}
+
+TEST_F(FirmwareTest, IsNotFlashedWhenAPackageIsNotForMemory) {
+  server().Put("fw/os.nb0", "image");
+  auto* const job = new UpgradeConfig;
+  job->SetBaseURL(test::kServerUrl);
+  test::AddPackage(*job, {0, "os.nb0", "\\", "fw/", "", ""});
+  CloseHandle(StartUpgradeThread(job, 1));
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_EQ(FlashedFiles(), 0U);
+  EXPECT_THAT(ReadLog(), Not(HasSubstr("Eflash")));
+  EXPECT_EQ(device().debug().KernelText(), "");
+}
+
+TEST_F(FirmwareTest, AnnouncedInAPackageWithoutAFileFlashesNothing) {
+  auto* const job = new UpgradeConfig;
+  job->SetBaseURL(test::kServerUrl);
+  test::AddPackage(*job, {0, "", "RAM:", "fw/", "", "RAMAllocSize=100000"});
+  CloseHandle(StartUpgradeThread(job, 1));
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_THAT(ReadLog(), HasSubstr("Starting Eflash...After Eflash..."));
+  EXPECT_EQ(device().faults().Count("DeviceIoControl"), 0U) << "nothing was made to be flashed";
+}
+
+TEST_F(FirmwareTest, IsNotFlashedWhenATestOfTheDeviceFails) {
+  server().Put("fw/os.nb0", "image");
+  auto* const job = new UpgradeConfig;
+  job->SetBaseURL(test::kServerUrl);
+  test::AddStore(*job, "RAM:", "1000");
+  test::AddTest(*job, {"HKEY_LOCAL_MACHINE", "None", "None", "REG_SZ", "=", "x", "wrong device"});
+  test::AddPackage(*job, {0, "os.nb0", "RAM:", "fw/", "", "RAMAllocSize=1000"});
+  CloseHandle(StartUpgradeThread(job, 1));
+  ASSERT_TRUE(test::AwaitEndOfJobs(device()));
+  EXPECT_EQ(FlashedFiles(), 0U);
+  EXPECT_EQ(Count("Start_EFLASH"), 0U);
+}
+
+TEST_F(FirmwareTest, GoesIntoTheStoreAtTheSecondTryAfterADriverThatARestartTook) {
+  HKEY key = nullptr;
+  RegCreateKeyExW(HKEY_LOCAL_MACHINE, u"Drivers\\Eflashdrv", 0, nullptr, 0, KEY_ALL_ACCESS, nullptr,
+                  &key, nullptr);
+  const DWORD gone = 0x55;
+  RegSetValueExW(key, u"HDEVICE", 0, REG_DWORD, reinterpret_cast<const BYTE*>(&gone), 4);
+  RegCloseKey(key);
+  List("os.nb0", "image");
+
+  RunJob();
+
+  EXPECT_EQ(Flashed("os.nb0"), "image");
+  EXPECT_THAT(ReadLog(), HasSubstr("Orvenix - InitRAM - RAM init error = 1000000\r\n"));
+  EXPECT_THAT(ShownLines(), Contains("RAMFile::Init - ok"));
+}
+
+TEST_F(FirmwareTest, OfTheNextJobGoesIntoTheSameStore) {
+  List("os.nb0", "the first image");
+  RunJob();
+  list_.clear();
+  List("os.nb0", "the second");
+
+  RunJob();
+
+  EXPECT_EQ(Flashed("os.nb0"), "the second");
+  EXPECT_EQ(Count("Allocated"), 1U);
+  EXPECT_THAT(ReadLog(), Not(HasSubstr("RAM init error")));
+}
+
+TEST_F(FirmwareTest, IsGivenBackWhole) {
+  List("os.nb0", fleet::Noise(100000, 6));
+  const test::Holdings before = test::HoldingsOf(device());
+  const std::uint64_t used = device().memory().ram().figures().used;
+  RunJob();
+  device::FreeRAMStore();
+  EXPECT_EQ(test::HoldingsOf(device()), before);
+  EXPECT_EQ(device().memory().ram().figures().used, used);
+}
+
+class FailingFlashTest : public FirmwareTest {
+ protected:
+  FailingFlashTest() : FirmwareTest("fails") {}
+};
+
+TEST_F(FailingFlashTest, LeavesTheJobASuccess) {
+  List("os.nb0", "image");
+  RunJob();
+  EXPECT_EQ(Count("EFL_Helper_Start_EFLASH::DeviceIoControl Failed."), 1U);
+  EXPECT_EQ(FlashedFiles(), 0U);
+  EXPECT_EQ(server().Device().report->error, "");
+  EXPECT_THAT(ReadLog(), HasSubstr("After Eflash...Local Upgrade Executing\r\n"));
+}
+
+class RestartingFlashTest : public FirmwareTest {
+ protected:
+  RestartingFlashTest() : FirmwareTest("restarts") {}
+};
+
+TEST_F(RestartingFlashTest, EndsTheJobWhereTheDeviceRestarts) {
+  List("os.nb0", "image");
+  EXPECT_EQ(Start(job_), ICFG_OK);
+  for (int i = 0; i < 600 && !device().drivers().restart_requested(); ++i) Sleep(1000);
+  ASSERT_TRUE(device().drivers().restart_requested());
+  EXPECT_EQ(Flashed("os.nb0"), "image");
+  EXPECT_TRUE(server().Device().report.has_value()) << "it was told before";
+  const std::string log = ReadLog();
+  EXPECT_THAT(log, HasSubstr("Starting Eflash..."));
+  EXPECT_THAT(log, Not(HasSubstr("After Eflash...")));
+}
+
+}  // namespace
