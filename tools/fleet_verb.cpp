@@ -5,7 +5,10 @@
 #include <iostream>
 #include <memory>
 #include <nlohmann/json.hpp>
+#include <stdexcept>
+#include <string>
 
+#include "server/capture.h"
 #include "tools/cli.h"
 #include "tools/failure.h"
 #include "tools/fleet/fleet.h"
@@ -27,6 +30,7 @@ struct FleetOptions {
   std::uint32_t die = 0;
   std::uint32_t roam = 0;
   std::uint32_t seeds = 1;
+  std::string pcap;
   bool json = false;
 };
 
@@ -64,12 +68,30 @@ fleet::Plan PlanOf(const FleetOptions& options, std::uint64_t seed) {
                   "raise --devices");
   }
   plan.seed = seed;
+  plan.capture = !options.pcap.empty();
   plan.link.bytes_per_second = static_cast<std::uint64_t>(options.link_mbit * 125000);
   plan.link.delay = sim::Micros(options.delay_us);
   plan.server.rate = static_cast<std::uint64_t>(options.rate_mbit * 1e6);
   plan.files = {{kFileOnDevice, "", fleet::Noise(options.size, seed)}};
   AddAbsences(options, plan);
   return plan;
+}
+
+/// Each frame once, as it was sent, whoever received it.
+void WriteCapture(const std::string& file, const fleet::Outcome& outcome) {
+  try {
+    server::CaptureFile capture(file);
+    for (const sim::Frame& frame : outcome.frames) {
+      if (frame.kind != sim::FrameKind::kDatagram) continue;
+      capture.Add(frame.when, {frame.from.address, frame.from.port},
+                  {frame.to.address, frame.to.port}, frame.bytes);
+    }
+    capture.Flush();
+    if (capture.good()) return;
+  } catch (const std::runtime_error& error) {
+    throw Failure(ExitCode::kCannotWrite, file, error.what());
+  }
+  throw Failure(ExitCode::kCannotWrite, file, "not all of it could be written", "make room");
 }
 
 /// @return whether every device has what it should.
@@ -79,6 +101,7 @@ bool RunOne(const FleetOptions& options, std::uint64_t seed) {
   const Clock::time_point began = Clock::now();
   const fleet::Outcome outcome = fleet::Run(plan);
   const std::chrono::duration<double> took = Clock::now() - began;
+  if (plan.capture) WriteCapture(options.pcap, outcome);
   if (options.json) {
     std::cout << fleet::JsonReport(plan, outcome).dump() << std::endl;
   } else if (options.seeds == 1 || !outcome.all_right()) {
@@ -141,6 +164,7 @@ void AddFleetVerb(CLI::App& app, Action& action) {
   verb->add_flag("--encrypt", options->plan.server.encrypt, "encipher every frame");
   verb->add_option("--die", options->die, "so many devices die soon after the first block");
   verb->add_option("--roam", options->roam, "so many devices are away for three seconds");
+  verb->add_option("--pcap", options->pcap, "write every datagram to this file; of the last run");
   AddJsonOption(*verb, options->json, "print one JSON object a run; equal runs print equal bytes");
   verb->footer("Example:\n  orvenix fleet --devices 1000 --loss 0.02 --size 10485760 --seed 7");
   verb->callback([options, &action] { action = [options] { return RunFleet(*options); }; });

@@ -45,7 +45,7 @@ TEST_F(CommandLineTest, HasTheExitCodesThatItsDocumentLists) {
 
 TEST_F(CommandLineTest, ShowsAnExampleForEveryVerb) {
   for (const char* verb : {"bundle make", "job lint", "serve", "device new", "device show",
-                           "device screen", "run", "explain"}) {
+                           "device screen", "run", "explain", "fleet"}) {
     const Ended help = Run(std::string(verb) + " --help");
     EXPECT_EQ(help.code, 0) << verb;
     EXPECT_THAT(help.output, HasSubstr("Example:\n  orvenix " + std::string(verb))) << verb;
