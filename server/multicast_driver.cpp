@@ -61,6 +61,7 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
   Sending Send();
   void WaitToSend();
   void WaitToReceive();
+  void RestFromReceiving();
   void SetTimer();
   void Again();
 
@@ -74,6 +75,7 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
   const Outgoing* kept_ = nullptr;  ///< what did not fit the socket's buffer
   bool full_ = false;               ///< waiting for room
   bool listening_ = false;          ///< waiting for a datagram
+  bool resting_ = false;            ///< looks for datagrams again in a moment
   bool again_ = false;              ///< Pump will come back by itself
   bool closed_ = false;
   bool timer_set_ = false;
@@ -158,8 +160,11 @@ bool MulticastDriver::Socket::Receive() {
     ErrorCode error;
     const std::size_t size = socket_.receive_from(asio::buffer(buffer_), from, 0, error);
     if (error == asio::error::would_block || error == asio::error::try_again) return false;
-    // Anything else is a device's system that refused a datagram: its datagrams count, that not.
-    if (error) continue;
+    if (error) {
+      // A device's system has refused a datagram; or the road is gone, which fails at once again.
+      RestFromReceiving();
+      return false;
+    }
     const std::string_view bytes(buffer_.data(), size);
     if (tap_) tap_(ToPeer(from), local_, bytes);
     run_.OnDatagram(ToPeer(from), bytes, NowMicros());
@@ -198,8 +203,17 @@ void MulticastDriver::Socket::WaitToSend() {
   });
 }
 
+void MulticastDriver::Socket::RestFromReceiving() {
+  if (std::exchange(resting_, true)) return;
+  auto pause = std::make_shared<asio::steady_timer>(socket_.get_executor(), kRefusedPause);
+  pause->async_wait([self = shared_from_this(), pause](const ErrorCode& /*error*/) {
+    self->resting_ = false;
+    self->Pump();
+  });
+}
+
 void MulticastDriver::Socket::WaitToReceive() {
-  if (listening_ || closed_) return;
+  if (listening_ || closed_ || resting_) return;
   listening_ = true;
   socket_.async_wait(udp::socket::wait_read, [self = shared_from_this()](const ErrorCode& error) {
     self->listening_ = false;
