@@ -431,6 +431,42 @@ TEST_F(MulticastRulesTest, GivesUpADeviceThatNamesTheSameBlockAgainAndAgain) {
   EXPECT_LT(Figures().repair_frames, 40U);
 }
 
+TEST_F(MulticastRulesTest, EndsWhateverDevicesGoOnSaying) {
+  for (const std::uint32_t window : {1U, 64U}) {
+    for (const std::size_t size : {100U, 1000U, 2500U, 60'000U}) {
+      const auto count = static_cast<unsigned>((size + 511) / 512);
+      for (const std::string& word :
+           {Ack(0), Ack(1), Ack(count), Ack(count > 1 ? count - 1 : 1), Nak(1), Nak(count)}) {
+        for (const std::vector<Peer>& devices :
+             {std::vector<Peer>{kA}, std::vector<Peer>{kA, kB}}) {
+          files_.clear();
+          contents_.clear();
+          sent_.clear();
+          now_ = Micros(0);
+          options_.window = window;
+          BeginWith(devices, size);
+          seen_ = 0;
+          for (int step = 0; step < 20'000 && !run_->finished(); ++step) {
+            if (seen_ == sent_.size()) {
+              Pass(Ms(250));
+              continue;
+            }
+            // Everybody says the same to everything but announcements.
+            const Peer to = sent_[seen_++].first;
+            if (to == kPublic) continue;
+            for (const Peer& device : devices) {
+              if (to == kPrivate || to == device) Say(device, word);
+            }
+          }
+          ASSERT_TRUE(run_->finished()) << "window " << window << ", " << size << " bytes, "
+                                        << devices.size() << " devices: " << Hex(word);
+          ASSERT_LT(now_, std::chrono::minutes(5)) << window << " " << size << " " << Hex(word);
+        }
+      }
+    }
+  }
+}
+
 TEST_F(MulticastRulesTest, DoesNotPlayPingPongWithADeviceThatAcknowledgesEverything) {
   BeginWith({kA, kB}, 102400);
   Acknowledge(kA, 0, 120);
