@@ -328,7 +328,7 @@ std::vector<BundleFile> AnnouncedFiles(const Bundle& bundle) {
   std::stable_sort(
       announced.begin(), announced.end(),
       [&depth](const BundleFile& a, const BundleFile& b) { return depth(a) < depth(b); });
-  if (bundle.list.by_multicast) announced.insert(announced.begin(), bundle.list);
+  if (bundle.list.by_multicast) announced.push_back(bundle.list);
   return announced;
 }
 

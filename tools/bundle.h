@@ -82,8 +82,9 @@ Bundle MakeBundle(const BundleOptions& options);
 /// and the file is fetched in every run, where the server's own CRC decides.
 [[nodiscard]] std::uint32_t ListedCrc(const BundleFile& file);
 
-/// The files that go to the group, the list file first, folders before what lies in them: a device
-/// makes the last folder of a path, but none above it.
+/// The files that go to the group. Folders come before what lies in them: a device makes the last
+/// folder of a path, but none above it. The list file comes last, because every device can make it:
+/// one that cannot make the last file of a run waits 300 s for another one.
 [[nodiscard]] std::vector<BundleFile> AnnouncedFiles(const Bundle& bundle);
 
 /// The job that makes a device fetch and check the bundle.

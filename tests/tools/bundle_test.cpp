@@ -189,7 +189,7 @@ TEST_F(BundleTest, SaysNothingOfMulticastUnlessItIsWanted) {
   EXPECT_THAT(Read("out/bundle.json"), Not(HasSubstr("multicast")));
 }
 
-TEST_F(BundleTest, AnnouncesTheListFirstAndFoldersBeforeWhatLiesInThem) {
+TEST_F(BundleTest, AnnouncesFoldersBeforeWhatLiesInThemAndTheListLast) {
   scratch_.Write("in/a/b/deep", "1");
   scratch_.Write("in/a/file", "2");
   scratch_.Write("in/top", "3");
@@ -206,8 +206,8 @@ TEST_F(BundleTest, AnnouncesTheListFirstAndFoldersBeforeWhatLiesInThem) {
   }
 
   EXPECT_THAT(announced,
-              ::testing::ElementsAre("\\Orvenix\\bundle.lst", "\\Application\\top",
-                                     "\\Application\\a\\file", "\\Application\\a\\b\\deep"));
+              ::testing::ElementsAre("\\Application\\top", "\\Application\\a\\file",
+                                     "\\Application\\a\\b\\deep", "\\Orvenix\\bundle.lst"));
 }
 
 TEST_F(BundleTest, GivesFilesMasksOfTheirOwn) {

@@ -49,11 +49,58 @@ class RunTest : public ServerProcessTest {
     ASSERT_EQ(Run("device new device " + settings).code, 0);
   }
   /// A bundle for a server that listens on the port of the running one.
-  void MakeBundleFor(int port) const {
-    ASSERT_EQ(Run("bundle make files out --address 127.0.0.2 --port " + std::to_string(port)).code,
-              0);
+  void MakeBundleFor(int port, const std::string& more = "") const {
+    const Ended made = Run("bundle make files out --address 127.0.0.2 --port " +
+                           std::to_string(port) + " " + more);
+    ASSERT_EQ(made.code, 0) << made.errors;
   }
 };
+
+bool HasReceived(const std::vector<nlohmann::json>& events, const std::string& file) {
+  return std::any_of(events.begin(), events.end(), [&file](const nlohmann::json& event) {
+    return event.at("event") == "multicast" && event.at("step") == "received" &&
+           event.at("file") == file;
+  });
+}
+
+TEST_F(RunTest, TakesFromTheGroupWhatIsAnnouncedForItAndTheRestByHttp) {
+  MakeFiles();
+  scratch_.Write("files/top.bin", "makes the folder");
+  scratch_.Write("files/other.bin", "for somebody else");
+  const std::string more = "--multicast 239.1.1.1:" + std::to_string(7000 + ::getpid() % 2000) +
+                           " --device-text TQ52 --encrypt --http-only '*.txt' "
+                           "--masks-for 'other.bin=MV41*'";
+  MakeBundleFor(8080, more);
+  Start({"out", "--port", "0", "--json", "--expect", "1", "--wait", "5", "--report", "report.json",
+         "--pcap", "server.pcap"});
+  MakeBundleFor(port_, more);
+  MakeDevice("--set network.datagram_loss_percent=5");
+
+  const Ended run = Run("run out/job.xml --device device --json --pcap device.pcap");
+
+  ASSERT_EQ(run.code, 0) << run.errors;
+  const auto events = Events(run.output);
+  EXPECT_TRUE(HasReceived(events, "\\Orvenix\\bundle.lst"));
+  EXPECT_TRUE(HasReceived(events, "\\Application\\sub\\data.bin"));
+  EXPECT_FALSE(HasReceived(events, "\\Application\\read me.txt"));
+  EXPECT_FALSE(HasReceived(events, "\\Application\\other.bin"));
+  EXPECT_EQ(ReadWholeFile(scratch_.path() / "device/storage/Application/sub/data.bin"),
+            std::string(200'000, 'd'));
+  EXPECT_EQ(ReadWholeFile(scratch_.path() / "device/storage/Application/read me.txt"), "hello\n");
+  EXPECT_FALSE(fs::exists(scratch_.path() / "device/storage/Application/other.bin"));
+  EXPECT_EQ(events.back().at("multicast").at("files"), 3);
+  ::kill(process_, SIGINT);
+  EXPECT_EQ(Wait(), 0);
+  const auto report = nlohmann::json::parse(ReadWholeFile(scratch_.path() / "report.json"));
+  const auto& files = report.at("multicast").at("files");
+  ASSERT_EQ(files.size(), 4U) << report.dump(2);
+  for (const auto& file : files) {
+    const bool foreign = file.at("path") == "\\Application\\other.bin";
+    EXPECT_EQ(file.at("proven"), foreign ? 0 : 1) << file.dump(2);
+  }
+  EXPECT_GT(fs::file_size(scratch_.path() / "server.pcap"), 200'000U);
+  EXPECT_GT(fs::file_size(scratch_.path() / "device.pcap"), 200'000U);
+}
 
 TEST_F(RunTest, BringsEveryFileToTheDeviceAndTellsWhatHappens) {
   MakeFiles();

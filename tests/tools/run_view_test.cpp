@@ -94,6 +94,47 @@ TEST(RunViewTest, PassesNoControlCharacterToTheTerminal) {
   EXPECT_EQ(shown("\xC2\xA0 \xC3\x9F \xC2"), "\xC2\xA0 \xC3\x9F \xC2\n") << "letters stay";
 }
 
+Reception HalfOfAFile() {
+  Reception reception;
+  reception.file = "\\a.bin";
+  reception.blocks = 4;
+  reception.held = 2;
+  reception.role = mcftp::Role::kNakMaster;
+  reception.map = "#.#.";
+  reception.under_way = true;
+  return reception;
+}
+
+TEST(RunViewTest, ShowsTheBlockMapBesideTheUpperBarWhileAFileComes) {
+  sim::ProgressView progress;
+  progress.overall = sim::BarView{19, 38};
+  progress.file = sim::BarView{0, 48};
+  const std::string shown = Printed(RunView::Style::kTerminal, [&progress](RunView& view) {
+    view.ShowProgress(progress);
+    view.ShowBlocks(HalfOfAFile());
+    view.ShowBlocks(HalfOfAFile());
+    view.ShowBlocks({});
+  });
+
+  const std::string overall = "\r\x1b[Koverall [##########..........]  50%   ";
+  EXPECT_EQ(shown, overall + "file [....................]   0%" + overall +
+                       "nak master [#.#.] 2/4" + overall + "file [....................]   0%");
+}
+
+TEST(RunViewTest, TellsOfAMulticastInLinesOrInJson) {
+  const auto show = [](RunView& view) {
+    view.ShowMulticast({ReceptionStep::kRequested, HalfOfAFile(), {}});
+    view.ShowBlocks(HalfOfAFile());
+  };
+
+  EXPECT_EQ(Printed(RunView::Style::kPlain, show), "multicast: asked for \\a.bin\n");
+  EXPECT_EQ(Printed(RunView::Style::kJson, show),
+            "{\"event\":\"multicast\",\"step\":\"requested\",\"file\":\"\\\\a.bin\","
+            "\"role\":\"nak master\",\"held\":2,\"blocks\":4,\"twice\":0,\"map\":\"#.#.\"}\n"
+            "{\"event\":\"blocks\",\"file\":\"\\\\a.bin\",\"role\":\"nak master\",\"held\":2,"
+            "\"blocks\":4,\"map\":\"#.#.\"}\n");
+}
+
 TEST(RunViewTest, ShowsNothingOfTheDeviceAfterTheUpgradesEnd) {
   for (const auto style : {RunView::Style::kPlain, RunView::Style::kJson}) {
     EXPECT_EQ(Printed(style,
@@ -103,6 +144,8 @@ TEST(RunViewTest, ShowsNothingOfTheDeviceAfterTheUpgradesEnd) {
                         sim::ProgressView progress;
                         progress.status_lines = {"late"};
                         view.ShowProgress(progress);
+                        view.ShowMulticast({});
+                        view.ShowBlocks(HalfOfAFile());
                       }),
               "");
   }
