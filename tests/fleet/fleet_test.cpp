@@ -94,8 +94,8 @@ constexpr Trouble kTroubles[] = {
     {"Loss", [](Plan& plan) { plan.link.loss = 0.1; }},
     {"BurstLoss",
      [](Plan& plan) {
-       plan.link.burst_begin = 0.02;
-       plan.link.burst_end = 0.2;
+       plan.link.burst_begin = 0.05;
+       plan.link.burst_end = 0.5;  // counted in frames: a burst must not outlast ten announcements
      }},
     {"Duplication",
      [](Plan& plan) {

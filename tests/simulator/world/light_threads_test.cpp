@@ -18,13 +18,13 @@ namespace {
 using std::chrono::milliseconds;
 
 /// A device in a world of light threads, with the test's thread attached.
-class LightThreadsTest : public ::testing::Test {
+class LightThreadTest : public ::testing::Test {
  protected:
-  LightThreadsTest()
+  LightThreadTest()
       : world_(sim::World::MakeVirtual(1, sim::ThreadKind::kLight)),
         device_(std::make_unique<sim::Device>(*world_, sim::Profile{}, folder_.path())),
         host_(std::in_place, *device_) {}
-  ~LightThreadsTest() override {
+  ~LightThreadTest() override {
     host_.reset();
     device_.reset();
   }
@@ -46,7 +46,7 @@ class LightThreadsTest : public ::testing::Test {
   std::optional<sim::AttachedThread> host_;
 };
 
-TEST_F(LightThreadsTest, TakeTurnsWithTheAttachedThread) {
+TEST_F(LightThreadTest, TakeTurnsWithTheAttachedThread) {
   std::string order;
   Spawn([&] {
     for (int i = 0; i < 3; ++i) {
@@ -62,7 +62,7 @@ TEST_F(LightThreadsTest, TakeTurnsWithTheAttachedThread) {
   EXPECT_EQ(order, "ababab");
 }
 
-TEST_F(LightThreadsTest, ShareOneThreadOfTheHost) {
+TEST_F(LightThreadTest, ShareOneThreadOfTheHost) {
   std::vector<std::thread::id> ids(2);
   sim::SimThread& first = Spawn([&] {
     ids[0] = std::this_thread::get_id();
@@ -80,7 +80,7 @@ TEST_F(LightThreadsTest, ShareOneThreadOfTheHost) {
   EXPECT_NE(ids[0], std::this_thread::get_id());
 }
 
-TEST_F(LightThreadsTest, KnowWhoTheyAreBehindEveryWait) {
+TEST_F(LightThreadTest, KnowWhoTheyAreBehindEveryWait) {
   for (int i = 0; i < 20; ++i) {
     Spawn([&] {
       const DWORD id = GetCurrentThreadId();
@@ -96,7 +96,7 @@ TEST_F(LightThreadsTest, KnowWhoTheyAreBehindEveryWait) {
   Sleep(1000);
 }
 
-TEST_F(LightThreadsTest, GiveTheirExitCodes) {
+TEST_F(LightThreadTest, GiveTheirExitCodes) {
   std::vector<sim::SimThread*> threads;
   for (std::uint32_t i = 0; i < 2000; ++i) {
     threads.push_back(&Spawn([i] {
@@ -107,7 +107,7 @@ TEST_F(LightThreadsTest, GiveTheirExitCodes) {
   for (std::uint32_t i = 0; i < 2000; ++i) EXPECT_EQ(Await(*threads[i]), i);
 }
 
-TEST_F(LightThreadsTest, AreTerminatedInTheirWaits) {
+TEST_F(LightThreadTest, AreTerminatedInTheirWaits) {
   bool returned = false;
   sim::SimThread& thread = Spawn([&] {
     Sleep(INFINITE);
@@ -123,7 +123,7 @@ TEST_F(LightThreadsTest, AreTerminatedInTheirWaits) {
   EXPECT_FALSE(returned);
 }
 
-TEST_F(LightThreadsTest, MayBeTerminatedBeforeTheirFirstStep) {
+TEST_F(LightThreadTest, MayBeTerminatedBeforeTheirFirstStep) {
   sim::SimThread& thread = Spawn([] { return 1U; }, true);
   {
     const auto lock = world_->Acquire();
@@ -132,7 +132,7 @@ TEST_F(LightThreadsTest, MayBeTerminatedBeforeTheirFirstStep) {
   EXPECT_EQ(Await(thread), 5U);
 }
 
-TEST_F(LightThreadsTest, KeepTheirExceptionsApart) {
+TEST_F(LightThreadTest, KeepTheirExceptionsApart) {
   int caught = 0;
   for (int i = 0; i < 2; ++i) {
     Spawn([&caught, i] {
@@ -160,7 +160,7 @@ TEST_F(LightThreadsTest, KeepTheirExceptionsApart) {
   EXPECT_EQ(caught, 2);
 }
 
-TEST_F(LightThreadsTest, CanPlayAnotherDevice) {
+TEST_F(LightThreadTest, CanPlayAnotherDevice) {
   const test::TemporaryFolder folder;
   sim::Device other(*world_, sim::Profile{}, folder.path());
   sim::SimThread& thread = Spawn([&] {
@@ -177,7 +177,7 @@ TEST_F(LightThreadsTest, CanPlayAnotherDevice) {
   EXPECT_EQ(Await(thread), 3U);
 }
 
-TEST_F(LightThreadsTest, RunOnWhenNoHostThreadIsAttached) {
+TEST_F(LightThreadTest, RunOnWhenNoHostThreadIsAttached) {
   Spawn([] {
     Sleep(1000);
     return 0U;
@@ -188,7 +188,7 @@ TEST_F(LightThreadsTest, RunOnWhenNoHostThreadIsAttached) {
   Sleep(1);
 }
 
-TEST_F(LightThreadsTest, EndWithTheirDevice) {
+TEST_F(LightThreadTest, EndWithTheirDevice) {
   for (int i = 0; i < 10; ++i) {
     Spawn([] {
       Sleep(INFINITE);
@@ -201,7 +201,7 @@ TEST_F(LightThreadsTest, EndWithTheirDevice) {
   EXPECT_EQ(world_->now(), milliseconds(1));
 }
 
-TEST_F(LightThreadsTest, HaveRoomForDeepCalls) {
+TEST_F(LightThreadTest, HaveRoomForDeepCalls) {
   struct Deep {
     static int Dive(int depth) {
       volatile char room[4096] = {};
