@@ -92,7 +92,7 @@ class Drivers {
   [[nodiscard]] std::u16string FreeName(const Description& description) const;
 
   Device& device_;
-  std::map<std::u16string, Factory> libraries_;  ///< by lower-case name
+  std::map<std::u16string, Factory> libraries_;  ///< by name in capitals
   std::vector<std::shared_ptr<Loaded>> built_in_;
   std::map<HANDLE, std::shared_ptr<Loaded>> activated_;
   bool restart_requested_ = false;
