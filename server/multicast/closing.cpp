@@ -9,13 +9,16 @@ using mcftp::Role;
 using State = Device::Closing;
 
 constexpr Micros kLeastWait = std::chrono::milliseconds(10);
+/// No frame that arrives at all is so much later than others.
+constexpr Micros kLateness = std::chrono::milliseconds(150);
 constexpr Micros kFirstWait = std::chrono::milliseconds(200);
 /// Who lets so many questions pass makes room for others.
 constexpr std::uint32_t kSilentTries = 2;
 
 }  // namespace
 
-void Closing::Begin(Micros now) {
+void Closing::Begin(std::optional<Micros> last_question_at, Micros now) {
+  if (last_question_at) quiet_until_ = *last_question_at + kLateness;
   NextGroup(now);
 }
 
@@ -90,11 +93,17 @@ void Closing::AskClosed(Device& device, Micros now) {
 }
 
 void Closing::OnAck(Device& device, std::uint32_t block, Micros now) {
+  // Also of a device that waits for its turn again: it may have taken the role without our hearing.
+  if (block == log_.guard() && log_.sent_at(block) != BlockLog::kNever) device.has_guard = true;
   if (!InGroup(device)) return;
   if (block == log_.count()) {
     const bool to_block = device.closing == State::kUncertain && device.tries == 0;
-    const bool in_dally = device.closing == State::kClosed;
-    if (to_block || in_dally) {
+    // In its dally it has the last block; that it has the guard, too, it must have said before.
+    const bool in_dally = device.closing == State::kClosed && (device.has_guard || device.recalled);
+    if (device.closing == State::kClosed && !in_dally) {
+      Bury(device, "has closed the file, nobody knows whether with every block", now);
+      Go(now);
+    } else if (to_block || in_dally) {
       desk_.SetProven(device, now);
       Go(now);
     } else {
@@ -128,7 +137,10 @@ void Closing::OnJoin(Device& device, Micros now) {
 void Closing::Answered(Device& device, State state, Micros now) {
   device.closing = state;
   device.tries = 0;
-  if (state == State::kHasGuard) device.sends = 0;
+  if (state == State::kHasGuard) {
+    device.sends = 0;
+    device.has_guard = true;  // with one block there is none to lack
+  }
   Go(now);
 }
 
@@ -257,8 +269,9 @@ void Closing::OnTime(Micros now) {
   if (!group_.empty()) Go(now);
 }
 
-std::optional<Micros> Closing::deadline() const {
+std::optional<Micros> Closing::deadline(Micros now) const {
   std::optional<Micros> earliest;
+  if (to_send_ != 0) return now < quiet_until_ ? std::optional(quiet_until_) : std::nullopt;
   for (const Device* device : group_) earliest = Earlier(earliest, DueAt(*device));
   return earliest;
 }

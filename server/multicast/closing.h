@@ -27,16 +27,20 @@ class Closing {
  public:
   Closing(TransferDesk& desk, BlockLog& log) : desk_(desk), log_(log) {}
 
-  void Begin(Micros now);
+  /// @param last_question_at  when a device was last asked to name what it lacks. Should that reach
+  /// it
+  ///   late, with the guard already there and the last block not, it would complete without: so the
+  ///   guard waits until nothing can be so late.
+  void Begin(std::optional<Micros> last_question_at, Micros now);
   void OnAck(Device& device, std::uint32_t block, Micros now);
   void OnNak(Device& device, std::uint32_t block, Micros now);
   /// A device that is being closed asks for the file again.
   void OnJoin(Device& device, Micros now);
   void OnGivenUp(Device& device, Micros now);
   void OnTime(Micros now);
-  [[nodiscard]] bool HasBlock() const { return to_send_ != 0; }
+  [[nodiscard]] bool HasBlock(Micros now) const { return to_send_ != 0 && now >= quiet_until_; }
   std::uint32_t TakeBlock(Micros now);
-  [[nodiscard]] std::optional<Micros> deadline() const;
+  [[nodiscard]] std::optional<Micros> deadline(Micros now) const;
   [[nodiscard]] bool done() const { return done_; }
 
  private:
@@ -63,6 +67,7 @@ class Closing {
   std::vector<Device*> group_;  ///< those that are not settled
   std::uint32_t to_send_ = 0;
   Micros sent_at_{0};
+  Micros quiet_until_{0};
   std::uint32_t sendings_ = 0;  ///< of the guard, in this group
   bool done_ = false;
 };

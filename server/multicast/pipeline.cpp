@@ -37,7 +37,7 @@ void Pipeline::Go(Micros now) {
   if (step_ == Step::kRepair && repair_.done()) {
     step_ = Step::kClosing;
     desk_.SetPhase(FilePhase::kClosing, now);
-    closing_.Begin(now);
+    closing_.Begin(repair_.last_question_at(), now);
   }
   if (step_ == Step::kClosing && closing_.done()) step_ = Step::kDone;
 }
@@ -110,7 +110,7 @@ bool Pipeline::HasBlock(Micros now) {
   switch (step_) {
     case Step::kFirstPass: return first_pass_.HasBlock();
     case Step::kRepair: return repair_.HasBlock(now);
-    case Step::kClosing: return closing_.HasBlock();
+    case Step::kClosing: return closing_.HasBlock(now);
     case Step::kDone: return false;
   }
   return false;
@@ -132,7 +132,7 @@ std::optional<Micros> Pipeline::deadline(Micros now) {
   switch (step_) {
     case Step::kFirstPass: return first_pass_.deadline();
     case Step::kRepair: return repair_.deadline(now);
-    case Step::kClosing: return closing_.deadline();
+    case Step::kClosing: return closing_.deadline(now);
     case Step::kDone: return std::nullopt;
   }
   return std::nullopt;

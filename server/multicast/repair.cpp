@@ -62,6 +62,7 @@ void Repair::Fill(Micros now) {
 
 void Repair::Ask(Device& device, Micros now) {
   desk_.GiveRole(device, Role::kNakMaster, now);
+  last_question_at_ = now;
   device.asked_at = now;
   if (++device.tries == 1) device.unanswered_since = now;
 }

@@ -31,6 +31,8 @@ class Repair {
   std::uint32_t TakeBlock(Micros now);
   [[nodiscard]] std::optional<Micros> deadline(Micros now);
   [[nodiscard]] bool done() const { return done_; }
+  /// When anybody was last asked to name what it lacks; nothing when nobody was.
+  [[nodiscard]] std::optional<Micros> last_question_at() const { return last_question_at_; }
 
  private:
   void Fill(Micros now);
@@ -56,6 +58,7 @@ class Repair {
   std::uint32_t window_limit_ = 1;
   std::deque<Micros> on_way_;  ///< when the blocks that may be on their way will have arrived
   Micros alone_since_{0};
+  std::optional<Micros> last_question_at_;
   bool done_ = false;
 };
 

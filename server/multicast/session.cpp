@@ -187,6 +187,7 @@ void MulticastSession::Resume(const FileMemory& memory, Micros now) {
     Device& device = AddDevice(known.peer, Micros(0));
     device.figures.state = known.state;
     device.figures.late = memory.phase != FilePhase::kAnnounced;
+    device.recalled = true;
     // While a file is being closed nobody lacks anything else, and nobody may be asked to name it.
     device.whole = known.whole || memory.phase == FilePhase::kClosing;
   }

@@ -59,7 +59,9 @@ struct Device {
     kClosed,     ///< says that it has closed the file, and is asked whether with every block
   };
   Closing closing = Closing::kAsked;
-  bool deferred = false;  ///< it did not answer while others did
+  bool deferred = false;   ///< it did not answer while others did
+  bool has_guard = false;  ///< has acknowledged the block before the last
+  bool recalled = false;   ///< known from an earlier server, to which it may have said so
 
   [[nodiscard]] bool settled() const { return figures.state != DeviceState::kJoined; }
 };
