@@ -95,7 +95,7 @@ constexpr Trouble kTroubles[] = {
     {"BurstLoss",
      [](Plan& plan) {
        plan.link.burst_begin = 0.05;
-       plan.link.burst_end = 0.5;  // counted in frames: a burst must not outlast ten announcements
+       plan.link.burst_end = 0.7;  // counted in frames: a burst must not outlast eight requests
      }},
     {"Duplication",
      [](Plan& plan) {
