@@ -19,7 +19,7 @@ constexpr std::uint32_t kSilentTries = 2;
 
 void Closing::Begin(std::optional<Micros> last_question_at, Micros now) {
   if (last_question_at) quiet_until_ = *last_question_at + kLateness;
-  NextGroup(now);
+  OnTime(now);
 }
 
 void Closing::NextGroup(Micros now) {
@@ -150,6 +150,7 @@ void Closing::OnGivenUp(Device& /*device*/, Micros now) {
 
 /// Goes as far as what is known of the group allows.
 void Closing::Go(Micros now) {
+  if (!begun_) return;
   group_.erase(std::remove_if(group_.begin(), group_.end(),
                               [](const Device* device) { return device->settled(); }),
                group_.end());
@@ -248,6 +249,12 @@ std::optional<Micros> Closing::DueAt(const Device& device) const {
 }
 
 void Closing::OnTime(Micros now) {
+  if (!begun_) {
+    // Roles are given when no late question can take them back any more.
+    begun_ = now >= quiet_until_;
+    if (begun_) NextGroup(now);
+    return;
+  }
   bool guard_due = false;
   for (Device* device : group_) {
     const auto due = DueAt(*device);
@@ -269,9 +276,10 @@ void Closing::OnTime(Micros now) {
   if (!group_.empty()) Go(now);
 }
 
-std::optional<Micros> Closing::deadline(Micros now) const {
+std::optional<Micros> Closing::deadline(Micros /*now*/) const {
   std::optional<Micros> earliest;
-  if (to_send_ != 0) return now < quiet_until_ ? std::optional(quiet_until_) : std::nullopt;
+  if (!begun_) return quiet_until_;
+  if (to_send_ != 0) return std::nullopt;
   for (const Device* device : group_) earliest = Earlier(earliest, DueAt(*device));
   return earliest;
 }

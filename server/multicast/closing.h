@@ -28,9 +28,8 @@ class Closing {
   Closing(TransferDesk& desk, BlockLog& log) : desk_(desk), log_(log) {}
 
   /// @param last_question_at  when a device was last asked to name what it lacks. Should that reach
-  /// it
-  ///   late, with the guard already there and the last block not, it would complete without: so the
-  ///   guard waits until nothing can be so late.
+  ///   it late, it would take back the role that it is given here, and complete without the last
+  ///   block: so roles are given when nothing can be so late any more.
   void Begin(std::optional<Micros> last_question_at, Micros now);
   void OnAck(Device& device, std::uint32_t block, Micros now);
   void OnNak(Device& device, std::uint32_t block, Micros now);
@@ -69,6 +68,7 @@ class Closing {
   Micros sent_at_{0};
   Micros quiet_until_{0};
   std::uint32_t sendings_ = 0;  ///< of the guard, in this group
+  bool begun_ = false;
   bool done_ = false;
 };
 
