@@ -31,7 +31,11 @@ const char* NameOf(const char* destination) noexcept {
 /// The store may have been made for the job; whoever comes first makes it.
 void PrepareRamStore() noexcept {
   if (device::HasRAMStore()) return;
-  ShowStatus(device::InitRAMStore() ? texts::kShowRamReady : texts::kShowNoRam);
+  if (device::InitRAMStore()) {
+    ShowStatus(texts::kShowRamReady);
+  } else {
+    ShowStatus(texts::kShowNoRam);
+  }
 }
 
 /// What writes to `destination`. @return empty when there is no memory for it.
