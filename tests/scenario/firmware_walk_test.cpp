@@ -53,9 +53,10 @@ class Walk {
   Walk& operator=(const Walk&) = delete;
 
   void Run() {
-    device_->faults().Add({"*", nth_, 1, 0});
     IcfgInitialize();
     test::WalkJob(job_);
+    // The calls until here are those of any job, whose failures have a walk of their own.
+    device_->faults().Add({"*", nth_, 1, 0});
     test::EndJob();
     ended_ = test::AwaitEndOfJobs(*device_, test::kWalkLimit);
     call_ = device_->faults().last_fired();
