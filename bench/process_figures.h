@@ -4,6 +4,7 @@
 
 #include <sys/resource.h>
 
+#include <cstdio>
 #include <cstdlib>
 #include <fstream>
 #include <string>
@@ -27,6 +28,11 @@ inline long PeakKib() {
     if (line.rfind("VmHWM:", 0) == 0) return std::atol(line.c_str() + 6);
   }
   return 0;
+}
+
+/// Shows what was printed so far. The names that this takes mean the device's console later on.
+inline void FlushConsole() {
+  std::fflush(stdout);
 }
 
 }  // namespace bench

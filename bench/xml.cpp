@@ -10,6 +10,8 @@
 // makes no tree: it only calls back. All write into memory, a line for each element; pugixml
 // appends to a string that has the room already. Times are processor times, the best of interleaved
 // rounds: others share the machine.
+#include "process_figures.h"
+// The platform's names come after the host's.
 #include <expat.h>
 #include <libxml/parser.h>
 #include <libxml/tree.h>
@@ -158,7 +160,7 @@ void Print(const char* what, const std::vector<Side>& sides, std::size_t bytes) 
     std::printf("  %-28s%8.0f MB/s%8.2f\n", side.name, static_cast<double>(bytes) / 1e6 / side.best,
                 side.best / sides.front().best);
   }
-  std::fflush(stdout);
+  bench::FlushConsole();
 }
 
 // ---- memory of the trees ----
