@@ -11,23 +11,11 @@
 namespace upgrade {
 namespace {
 
-// A report: two bytes of no interest, the percentage, four more of no interest, the size, the name;
-// numbers in network order.
-constexpr std::size_t kPercentAt = 2;
-constexpr std::size_t kSizeAt = 8;
-constexpr std::size_t kNameAt = 12;
-
 constexpr int kBufferSize = 2048;
 constexpr std::uint32_t kFirstPort = 5655;
 constexpr std::uint32_t kLastPort = 65535;
 constexpr DWORD kNewFilePauseMs = 10;
 constexpr DWORD kEndWaitMs = 2000;
-
-std::uint32_t BigEndian(const std::uint8_t* bytes, std::size_t count) noexcept {
-  std::uint32_t number = 0;
-  for (std::size_t i = 0; i < count; ++i) number = number << 8U | bytes[i];
-  return number;
-}
 
 /// @return the datagram's length, negative when the socket is of no more use.
 int ReceiveInto(SOCKET socket, std::uint8_t* buffer) noexcept {
@@ -52,8 +40,8 @@ void ShowReports(SOCKET socket, std::uint8_t* buffer) noexcept {
       report::Log("Orvenix - MCStatusThread - recvfrom got error\r\n");
       return;
     }
-    MulticastStatus status;
-    if (ReadStatus(buffer, static_cast<std::size_t>(length), &status)) display.Show(status);
+    mcftp::StatusDatagram status;
+    if (mcftp::DecodeStatus(buffer, static_cast<std::size_t>(length), status)) display.Show(status);
   }
 }
 
@@ -65,24 +53,11 @@ DWORD WINAPI StatusThread(void* argument) {
 
 }  // namespace
 
-bool ReadStatus(const std::uint8_t* bytes, std::size_t length, MulticastStatus* status) noexcept {
-  if (length < kNameAt) return false;
-  status->percent = static_cast<std::uint16_t>(BigEndian(bytes + kPercentAt, 2));
-  status->file_size = BigEndian(bytes + kSizeAt, 4);
-  const auto* const name = reinterpret_cast<const char*>(bytes + kNameAt);
-  const void* const end = std::memchr(name, 0, length - kNameAt);
-  const std::size_t name_length =
-      end == nullptr ? length - kNameAt
-                     : static_cast<std::size_t>(static_cast<const char*>(end) - name);
-  status->file_name.Assign({name, name_length});
-  return true;
-}
-
-void StatusDisplay::Show(const MulticastStatus& status) noexcept {
-  if (status.file_name.view() != shown_name_.view()) {
+void StatusDisplay::Show(const mcftp::StatusDatagram& status) noexcept {
+  if (status.file_name != shown_name_.view()) {
     report::SetFileProgress(0);
     Sleep(kNewFilePauseMs);
-    shown_name_.Assign(status.file_name.view());
+    shown_name_.Assign(status.file_name);
     report::ShowStatus("%s", shown_name_.c_str());
   }
   report::SetFileProgress(status.percent);

@@ -3,35 +3,23 @@
 
 #include <coredll.h>
 
-#include <cstddef>
 #include <cstdint>
 
 #include "base/text.h"
 #include "device/handle.h"
 #include "mcftp/udp_socket/udp_socket.h"
+#include "mcftp/wire/status_datagram.h"
 
 namespace upgrade {
-
-/// One report of the multicast client.
-struct MulticastStatus {
-  std::uint16_t percent = 0;    ///< of the current file; 100 at its end
-  std::uint32_t file_size = 0;  ///< bytes
-  base::FixedText<260> file_name;
-};
-
-/// Reads a datagram that anyone may have sent. A name that is too long is cut.
-/// @return false for one that is too short to be a report.
-[[nodiscard]] bool ReadStatus(const std::uint8_t* bytes, std::size_t length,
-                              MulticastStatus* status) noexcept;
 
 /// Shows reports one after another: each new file's name as a status line, its percentage in the
 /// lower bar, and each finished file in the upper one. One thread uses an object.
 class StatusDisplay {
  public:
-  void Show(const MulticastStatus& status) noexcept;
+  void Show(const mcftp::StatusDatagram& status) noexcept;
 
  private:
-  base::FixedText<260> shown_name_;
+  base::FixedText<mcftp::kMaxStatusName + 1> shown_name_;
 };
 
 /// A UDP port of the device, and a thread that shows every report that comes to it. The upgrade

@@ -39,42 +39,6 @@ std::string Report(std::uint32_t percent, std::uint32_t size, const std::string&
   return bytes + name + '\0';
 }
 
-MulticastStatus Read(const std::string& bytes) {
-  MulticastStatus status;
-  EXPECT_TRUE(
-      ReadStatus(reinterpret_cast<const std::uint8_t*>(bytes.data()), bytes.size(), &status));
-  return status;
-}
-
-TEST(MulticastStatusTest, HoldsPercentageSizeAndName) {
-  const MulticastStatus status = Read(Report(0x1234, 0x89ABCDEF, "\\Temp\\a.bin"));
-  EXPECT_EQ(status.percent, 0x1234);
-  EXPECT_EQ(status.file_size, 0x89ABCDEFU);
-  EXPECT_EQ(status.file_name.view(), "\\Temp\\a.bin");
-}
-
-TEST(MulticastStatusTest, IsTwelveBytesLongAtLeast) {
-  const std::string bytes = Report(50, 1, "a");
-  MulticastStatus status;
-  for (std::size_t length = 0; length < 12; ++length) {
-    const std::vector<std::uint8_t> exact(bytes.begin(), bytes.begin() + length);
-    EXPECT_FALSE(ReadStatus(exact.data(), length, &status)) << length;
-  }
-  EXPECT_EQ(Read(bytes.substr(0, 12)).file_name.view(), "");
-}
-
-TEST(MulticastStatusTest, MayHaveANameWithoutAnEnd) {
-  EXPECT_EQ(Read(Report(1, 1, "abc").substr(0, 15)).file_name.view(), "abc");
-  EXPECT_EQ(Read(Report(1, 1, std::string("abc\0def", 7))).file_name.view(), "abc");
-}
-
-TEST(MulticastStatusTest, KeepsTwoHundredAndFiftyNineCharactersOfAName) {
-  for (const std::size_t length : {258U, 259U, 260U, 261U, 2036U}) {
-    const std::string name(length, 'n');
-    EXPECT_EQ(Read(Report(1, 1, name)).file_name.view(), name.substr(0, 259)) << length;
-  }
-}
-
 /// A listener on the test's device, and a sender somewhere else.
 class StatusListenerTest : public DeviceTest {
  protected:
