@@ -2,12 +2,9 @@
 
 #include <algorithm>
 #include <cmath>
-#include <cstdlib>
-#include <filesystem>
 #include <memory>
 #include <numeric>
 #include <stdexcept>
-#include <system_error>
 
 #include "base/crc32.h"
 #include "device/device.h"
@@ -15,6 +12,7 @@
 #include "server/multicast_run.h"
 #include "storage/storage.h"
 #include "tools/fleet/device_program.h"
+#include "tools/fleet/fleet_folder.h"
 #include "tools/virtual_multicast.h"
 #include "world/sim_thread.h"
 #include "world/world.h"
@@ -27,32 +25,6 @@ constexpr sim::Address kFirstDevice = 0x0A000101;   // 10.0.1.1
 constexpr std::uint32_t kMostDevices = 60000;
 /// Clients begin at the world's beginning; by then all of them wait.
 constexpr sim::Micros kServerStart = std::chrono::seconds(1);
-
-class Folder {
- public:
-  Folder() {
-    // In memory where there is such a folder: a device's files are small but for what is shared.
-    std::error_code none;
-    const std::filesystem::path parent = std::filesystem::is_directory("/dev/shm", none)
-                                             ? "/dev/shm"
-                                             : std::filesystem::temp_directory_path();
-    std::string pattern = (parent / "orvenix-fleet-XXXXXX").string();
-    if (mkdtemp(pattern.data()) == nullptr) {
-      throw std::system_error(errno, std::generic_category(), "no temporary folder");
-    }
-    path_ = pattern;
-  }
-  ~Folder() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-  }
-  Folder(const Folder&) = delete;
-  Folder& operator=(const Folder&) = delete;
-  [[nodiscard]] const std::filesystem::path& path() const { return path_; }
-
- private:
-  std::filesystem::path path_;
-};
 
 std::uint32_t CrcOf(const std::string& bytes) {
   base::Crc32 crc;
@@ -83,7 +55,7 @@ class Voyage {
   const Plan& plan_;
   std::vector<std::uint32_t> crcs_;
   std::uint64_t bytes_ = 0;  ///< of all files
-  Folder folder_;
+  FleetFolder folder_;
   std::unique_ptr<sim::World> world_;
   std::vector<std::unique_ptr<sim::Device>> devices_;
   std::unique_ptr<server::MulticastRun> run_;
