@@ -2,6 +2,7 @@
 // HTTP.
 #include <gmock/gmock.h>
 
+#include <fstream>
 #include <memory>
 #include <string>
 #include <vector>
@@ -60,6 +61,7 @@ class MulticastJobTest : public test::ScenarioTest {
     options.start.expected = 1;
     options.seed = 1;
     run_ = std::make_unique<server::MulticastRun>(options, files_);
+    run_->SetListener(listener_);
     port_ =
         std::make_unique<tools::VirtualMulticast>(world(), sim::Endpoint{0x0A000002, 7001}, *run_);
     After(seconds(10), [this] { port_->Start(); });
@@ -72,6 +74,7 @@ class MulticastJobTest : public test::ScenarioTest {
 
   HostJob job_;
   std::vector<server::MulticastFile> files_;
+  server::MulticastListener listener_;
   std::unique_ptr<server::MulticastRun> run_;
   std::unique_ptr<tools::VirtualMulticast> port_;
 };
@@ -107,6 +110,29 @@ TEST_F(MulticastJobTest, RepairsByHttpWhatIsMissingAndWhatIsSpoilt) {
               ElementsAre("files/missing.bin:1,1", "files/spoilt.bin:2,1"));
   EXPECT_EQ(server().Device().report->bundle_rx, 25000U);
   EXPECT_TRUE(server().Device().report->http_fallback);
+  EXPECT_EQ(server().Device().report->error, "");
+}
+
+TEST_F(MulticastJobTest, FetchesByHttpAFileThatWasSpoiltAfterItHadCome) {
+  const std::string first = AddToJob("first.bin", 20000);
+  const std::string second = AddToJob("second.bin", 30000);
+  AddToMulticast("first.bin", first);
+  AddToMulticast("second.bin", second);
+  listener_ = [this](const server::MulticastEvent& event) {
+    const bool first_came = event.kind == server::MulticastEventKind::kFileEnded &&
+                            event.file->device_path == "\\Data\\first.bin";
+    if (!first_came) return;
+    std::fstream file(device().folder() / "storage" / "Data" / "first.bin",
+                      std::ios::in | std::ios::out | std::ios::binary);
+    file.seekp(12345).put('?').put('!');
+    EXPECT_TRUE(file.good());
+  };
+  RunBoth();
+  EXPECT_EQ(run_->figures().files[0].Count(server::DeviceState::kProven), 1U);
+  EXPECT_THAT(GetFile("\\Data\\first.bin"), Optional(first));
+  EXPECT_THAT(GetFile("\\Data\\second.bin"), Optional(second));
+  EXPECT_THAT(server().RequestedPaths(), ElementsAre("files/first.bin:1,1"));
+  EXPECT_EQ(server().Device().report->bundle_rx, 20000U);
   EXPECT_EQ(server().Device().report->error, "");
 }
 
