@@ -11,6 +11,7 @@
 #include <stdexcept>
 #include <string>
 #include <system_error>
+#include <thread>
 #include <utility>
 
 namespace server {
@@ -25,6 +26,8 @@ constexpr int kReceiveBuffer = 4 * 1024 * 1024;
 constexpr int kAttempts = 16;
 /// After a refusal that no event ends: the system is short of memory for the network.
 constexpr std::chrono::milliseconds kRefusedPause{2};
+/// What a run that was stopped has still to say finds room in this time or not at all.
+constexpr std::chrono::seconds kLongestRest{1};
 
 void Check(const ErrorCode& error, const std::string& what) {
   if (error) throw std::system_error(error.value(), std::generic_category(), what);
@@ -47,6 +50,7 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
   void Open(const MulticastSocketOptions& options);
   void Start(std::function<void()> ended);
   void Pump();
+  void SendRest();
   void Close();
 
   [[nodiscard]] Peer local() const { return local_; }
@@ -184,11 +188,23 @@ MulticastDriver::Socket::Sending MulticastDriver::Socket::Send() {
       ++figures_.waits;
       return Sending::kFull;
     }
-    if (error) ++figures_.send_errors;
+    if (error) {
+      ++figures_.send_errors;
+      run_.OnRefused(error.value(), NowMicros());
+    }
     if (!error && tap_) tap_(local_, kept_->to, kept_->bytes);
     kept_ = nullptr;
   }
   return Sending::kMore;
+}
+
+void MulticastDriver::Socket::SendRest() {
+  const Micros end = NowMicros() + kLongestRest;
+  while (!closed_ && run_.ended() && NowMicros() < end) {
+    const Sending sending = Send();
+    if (sending == Sending::kIdle) return;
+    if (sending == Sending::kFull) std::this_thread::sleep_for(kRefusedPause);
+  }
 }
 
 void MulticastDriver::Socket::WaitToSend() {
@@ -272,6 +288,7 @@ void MulticastDriver::Wake() {
 }
 
 void MulticastDriver::Close() {
+  socket_->SendRest();
   socket_->Close();
 }
 

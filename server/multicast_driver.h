@@ -48,7 +48,8 @@ class MulticastDriver {
   /// To be called when the run has been told something beside the loop's own events (StartNow,
   /// SetRate, Stop).
   void Wake();
-  /// Closes the socket, so that the loop runs out of work.
+  /// Sends what a run that was stopped has still to say, and closes the socket, so that the loop
+  /// runs out of work.
   void Close();
 
   [[nodiscard]] Peer local() const;

@@ -40,6 +40,8 @@ std::string_view EventName(MulticastEventKind kind) {
     case MulticastEventKind::kReleased: return "released";
     case MulticastEventKind::kFileEnded: return "file-ended";
     case MulticastEventKind::kRunEnded: return "run-ended";
+    case MulticastEventKind::kRefused: return "refused";
+    case MulticastEventKind::kNotStored: return "not-stored";
   }
   return "";
 }

@@ -52,7 +52,20 @@ enum class FilePhase : std::uint8_t {
 /// "waiting", "announced", "streaming", "repairing", "closing", "lingering", "finished"
 [[nodiscard]] std::string_view PhaseName(FilePhase phase);
 
-struct FileFigures {
+/// What went out for one file.
+struct SentFrames {
+  std::uint64_t first_pass_frames = 0;  ///< blocks sent for the first time
+  std::uint64_t repair_frames = 0;      ///< blocks sent again
+  std::uint64_t farewell_frames = 0;    ///< a last block once more, which ends the devices' dallies
+  std::uint64_t control_frames = 0;     ///< OACK and ERROR
+  std::uint64_t frames = 0;             ///< all that was sent for this file
+  std::uint64_t wire_bytes = 0;         ///< of all these, Ethernet, IP and UDP headers included
+};
+
+/// One file of one round. A server that was started again counts on from what it knows of the one
+/// before; announcements and answers are its own.
+struct FileFigures : SentFrames {
+  std::size_t index = 0;  ///< in the run's list of files
   std::string device_path;
   std::string masks;
   std::uint32_t size = 0;
@@ -60,18 +73,13 @@ struct FileFigures {
   std::uint32_t block_count = 0;
   std::uint32_t transfer_id = 0;
   bool last_file = false;
+  std::uint32_t expected = 0;  ///< devices that its start waits for; 0: not known
   FilePhase phase = FilePhase::kWaiting;
   Micros began{0};       ///< first announcement
   Micros data_began{0};  ///< first block; 0: none yet
   Micros ended{0};       ///< last device settled; 0: not yet
 
   std::uint64_t announcements = 0;
-  std::uint64_t first_pass_frames = 0;  ///< blocks sent for the first time
-  std::uint64_t repair_frames = 0;      ///< blocks sent again
-  std::uint64_t farewell_frames = 0;    ///< a last block once more, which ends the devices' dallies
-  std::uint64_t control_frames = 0;     ///< OACK and ERROR
-  std::uint64_t frames = 0;             ///< all that was sent for this file
-  std::uint64_t wire_bytes = 0;         ///< of all these, Ethernet, IP and UDP headers included
   std::uint64_t acks = 0;
   std::uint64_t naks = 0;
   std::uint64_t errors = 0;
@@ -97,6 +105,7 @@ struct MulticastFigures {
   std::uint64_t strangers = 0;    ///< frames of nobody who has asked for the file
   std::uint64_t turned_away = 0;  ///< requests beyond the limit of devices
   std::uint64_t not_stored = 0;   ///< times the session file could not be written
+  std::uint64_t refused = 0;      ///< datagrams that counted as sent and that the system refused
   std::uint64_t rate = 0;         ///< bits per second allowed; 0: no limit
 };
 
@@ -118,6 +127,8 @@ enum class MulticastEventKind : std::uint8_t {
   kReleased,
   kFileEnded,
   kRunEnded,
+  kRefused,    ///< the system would not send a datagram, for the first time
+  kNotStored,  ///< the session file could not be written, for the first time
 };
 /// "announced", "joined", "started", "master", "overrun", ...
 [[nodiscard]] std::string_view EventName(MulticastEventKind kind);
@@ -125,9 +136,10 @@ enum class MulticastEventKind : std::uint8_t {
 struct MulticastEvent {
   MulticastEventKind kind{};
   Micros when{};
-  const FileFigures* file = nullptr;      ///< null for kRunEnded
+  const FileFigures* file = nullptr;      ///< null where no file is meant
   const DeviceFigures* device = nullptr;  ///< null where no device is meant
   std::string detail;                     ///< one line more, for people
+  int error = 0;                          ///< of kRefused: the system's number for it
 };
 
 using MulticastListener = std::function<void(const MulticastEvent&)>;

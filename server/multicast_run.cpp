@@ -7,6 +7,7 @@
 #include <set>
 #include <stdexcept>
 #include <string>
+#include <system_error>
 #include <utility>
 
 #include "mcftp/cipher/frame_cipher.h"
@@ -48,6 +49,8 @@ void CheckOptions(const MulticastOptions& options) {
   Require(options.announce_interval.count() > 0 && options.announce_max > 0,
           "a file has to be announced");
   Require(options.block_size > 0, "a block has to have a size");
+  Require(options.start.expected <= options.max_devices,
+          "more devices are expected than are kept apart");
   Require(options.poll_group > 0 && options.rounds > 0, "nobody would be served");
 }
 
@@ -72,11 +75,12 @@ class MulticastRun::Body {
         files_(std::move(files)),
         outbox_(options_.encrypt),
         pace_(options_.rate, LargestFrame(options_, files_)),
-        random_(options_.seed != 0 ? options_.seed : std::random_device{}()) {
+        random_(options_.seed != 0 ? options_.seed : std::random_device{}()),
+        journal_(options_.session_file) {
     figures_.rate = options_.rate;
-    remembers_ = !options_.session_file.empty();
-    if (remembers_) memory_.fingerprint = Fingerprint(options_, files_);
-    if (remembers_) recalled_ = Recall(options_.session_file);
+    if (!journal_.keeps()) return;
+    fingerprint_ = Fingerprint(options_, files_);
+    recalled_ = Recall(options_.session_file);
     if (recalled_ && !Fits(*recalled_)) recalled_.reset();
   }
 
@@ -88,7 +92,9 @@ class MulticastRun::Body {
   void StartNow(Micros now);
   void SetRate(std::uint64_t bits_per_second, Micros now);
   void Stop(Micros now);
+  void OnRefused(int error, Micros now);
 
+  [[nodiscard]] bool ended() const { return ended_; }
   [[nodiscard]] bool finished() const { return ended_ && outbox_.empty(); }
   [[nodiscard]] const MulticastFigures& figures() const { return figures_; }
   [[nodiscard]] const MulticastOptions& options() const { return options_; }
@@ -102,8 +108,12 @@ class MulticastRun::Body {
   [[nodiscard]] bool Fits(const RunMemory& recalled) const;
   bool Resume(Micros now);
   void Remember(Micros now);
+  void Store(Micros now);
+  [[nodiscard]] RunMemory RunNumbers() const;
+  [[nodiscard]] RunMemory Everything() const;
   void EndSession();
   void EndRun(Micros now);
+  void Tell(MulticastEventKind kind, std::string detail, Micros now);
   void Advance(Micros now);
   void Account(const Outgoing& outgoing, Micros now);
   [[nodiscard]] StartPolicy PolicyForFile() const;
@@ -125,9 +135,9 @@ class MulticastRun::Body {
   bool ended_ = false;
   int control_in_a_row_ = 0;
 
-  RunMemory memory_;  ///< its last file is the one under way
+  SessionJournal journal_;
+  std::uint64_t fingerprint_ = 0;
   std::optional<RunMemory> recalled_;
-  bool remembers_ = false;
   std::uint64_t stored_changes_ = 0;
   std::size_t stored_devices_ = 0;
   FilePhase stored_phase_ = FilePhase::kWaiting;
@@ -137,7 +147,6 @@ class MulticastRun::Body {
 
 void MulticastRun::Body::Start(const Peer& own, Micros now) {
   own_ = own;
-  memory_.port = own.port;
   if (files_.empty()) {
     EndRun(now);
   } else if (!Resume(now)) {
@@ -147,7 +156,7 @@ void MulticastRun::Body::Start(const Peer& own, Micros now) {
 
 /// Whether the session file speaks of these files.
 bool MulticastRun::Body::Fits(const RunMemory& recalled) const {
-  return recalled.fingerprint == memory_.fingerprint && !recalled.files.empty() &&
+  return recalled.fingerprint == fingerprint_ && !recalled.files.empty() &&
          std::all_of(recalled.files.begin(), recalled.files.end(),
                      [this](const FileMemory& file) { return file.index < files_.size(); });
 }
@@ -157,7 +166,7 @@ bool MulticastRun::Body::Resume(Micros now) {
   if (!recalled_) return false;
   const RunMemory recalled = std::move(*recalled_);
   recalled_.reset();
-  figures_.round = memory_.round = std::max(recalled.round, 1U);
+  figures_.round = std::max(recalled.round, 1U);
   for (const FileMemory& file : recalled.files) {
     if (session_ != nullptr) EndSession();
     index_ = file.index;
@@ -173,19 +182,42 @@ bool MulticastRun::Body::Resume(Micros now) {
 }
 
 void MulticastRun::Body::Remember(Micros now) {
-  if (!remembers_ || session_ == nullptr || session_->changes() == stored_changes_) return;
+  if (!journal_.keeps() || session_ == nullptr || session_->changes() == stored_changes_) return;
   const FileFigures& current = figures_.files.back();
   const bool urgent = current.devices.size() != stored_devices_ || current.phase != stored_phase_;
-  if (!urgent && now < stored_at_ + kStoreInterval) return;
+  if (urgent || now >= stored_at_ + kStoreInterval) Store(now);
+}
+
+void MulticastRun::Body::Store(Micros now) {
+  if (!journal_.keeps() || session_ == nullptr) return;
+  const FileFigures& current = figures_.files.back();
   stored_changes_ = session_->changes();
   stored_devices_ = current.devices.size();
   stored_phase_ = current.phase;
   stored_at_ = now;
-  FileMemory file;
-  file.index = memory_.files.back().index;
-  session_->Remember(file);
-  memory_.files.back() = std::move(file);
-  if (!Store(options_.session_file, memory_)) ++figures_.not_stored;
+  RunMemory changes = RunNumbers();
+  changes.files.push_back(session_->TakeChanges());
+  if (journal_.Add(changes) || journal_.Begin(Everything())) return;
+  if (figures_.not_stored++ == 0) {
+    Tell(MulticastEventKind::kNotStored, options_.session_file.string(), now);
+  }
+}
+
+RunMemory MulticastRun::Body::RunNumbers() const {
+  RunMemory memory;
+  memory.fingerprint = fingerprint_;
+  memory.round = figures_.round;
+  memory.port = own_.port;
+  return memory;
+}
+
+RunMemory MulticastRun::Body::Everything() const {
+  RunMemory memory = RunNumbers();
+  for (std::size_t i = 0; i + 1 < figures_.files.size(); ++i) {
+    memory.files.push_back(RememberFile(figures_.files[i]));
+  }
+  memory.files.push_back(session_->Remember());
+  return memory;
 }
 
 std::uint32_t MulticastRun::Body::NewTransferId() {
@@ -223,6 +255,7 @@ void MulticastRun::Body::MakeSession(std::uint32_t transfer_id) {
 
   FileFigures& figures = figures_.files.emplace_back();
   figures_.current = figures_.files.size() - 1;
+  figures.index = index_;
   figures.device_path = file.device_path;
   figures.masks = file.masks;
   figures.size = file.content->size();
@@ -230,12 +263,9 @@ void MulticastRun::Body::MakeSession(std::uint32_t transfer_id) {
   figures.block_count = plan.blocks.block_count;
   figures.transfer_id = plan.transfer_id;
   figures.last_file = plan.last_file;
+  figures.expected = plan.start.expected;
   session_ =
       std::make_unique<MulticastSession>(options_, plan, figures_, figures, outbox_, listener_);
-  FileMemory memory;
-  memory.index = static_cast<std::uint32_t>(index_);
-  memory.transfer_id = transfer_id;
-  memory_.files.push_back(std::move(memory));
   stored_changes_ = ~std::uint64_t{0};
   stored_devices_ = ~std::size_t{0};
 }
@@ -248,29 +278,27 @@ void MulticastRun::Body::EndSession() {
       known_.insert(device.peer);
     }
   }
-  FileMemory& memory = memory_.files.back();
-  memory.devices.clear();
-  session_->Remember(memory);
   session_.reset();
 }
 
 void MulticastRun::Body::NextFile(Micros now) {
   const bool for_all = files_[index_].masks.empty();
   const bool nobody = figures_.files.back().devices.empty();
+  Store(now);
   EndSession();
-  const bool round_over = ++index_ == files_.size() || (figures_.round > 1 && for_all && nobody);
+  // A round that nobody comes to is over. Those who have come wait for the last file, to end on it.
+  const bool in_vain = figures_.round > 1 && for_all && nobody && known_.empty();
+  const bool round_over = ++index_ == files_.size() || in_vain;
   if (!round_over) {
     BeginSession(now);
     return;
   }
   if (figures_.round >= options_.rounds || (figures_.round > 1 && known_.empty())) {
-    std::error_code ignored;
-    if (remembers_) std::filesystem::remove(options_.session_file, ignored);
+    if (journal_.keeps()) journal_.Remove();
     EndRun(now);
     return;
   }
   ++figures_.round;
-  memory_.round = figures_.round;
   index_ = 0;
   known_.clear();
   BeginSession(now);
@@ -278,10 +306,25 @@ void MulticastRun::Body::NextFile(Micros now) {
 
 void MulticastRun::Body::EndRun(Micros now) {
   ended_ = true;
+  Tell(MulticastEventKind::kRunEnded, "", now);
+}
+
+void MulticastRun::Body::Tell(MulticastEventKind kind, std::string detail, Micros now) {
   if (!listener_) return;
   MulticastEvent event;
-  event.kind = MulticastEventKind::kRunEnded;
+  event.kind = kind;
   event.when = now;
+  event.detail = std::move(detail);
+  listener_(event);
+}
+
+void MulticastRun::Body::OnRefused(int error, Micros now) {
+  if (figures_.refused++ > 0 || !listener_) return;
+  MulticastEvent event;
+  event.kind = MulticastEventKind::kRefused;
+  event.when = now;
+  event.error = error;
+  event.detail = std::generic_category().message(error);
   listener_(event);
 }
 
@@ -343,7 +386,7 @@ const Outgoing* MulticastRun::Body::Next(Micros now) {
 std::optional<Micros> MulticastRun::Body::deadline(Micros now) {
   if (session_ == nullptr) return std::nullopt;
   std::optional<Micros> earliest = session_->deadline(now);
-  if (remembers_ && session_->changes() != stored_changes_) {
+  if (journal_.keeps() && session_->changes() != stored_changes_) {
     earliest = Earlier(earliest, stored_at_ + kStoreInterval);
   }
   if (session_->HasBlock(now)) earliest = Earlier(earliest, pace_.ReadyAt(now));
@@ -363,10 +406,7 @@ void MulticastRun::Body::SetRate(std::uint64_t bits_per_second, Micros now) {
 void MulticastRun::Body::Stop(Micros now) {
   if (ended_) return;
   if (session_ != nullptr) {
-    // Whoever starts again goes on from here.
-    stored_at_ = now - kStoreInterval;
-    stored_changes_ = ~std::uint64_t{0};
-    Remember(now);
+    Store(now);  // whoever starts again goes on from here
     session_->Stop(now);
     EndSession();
   }
@@ -412,6 +452,14 @@ std::optional<Micros> MulticastRun::deadline(Micros now) const {
 
 bool MulticastRun::finished() const {
   return body_->finished();
+}
+
+bool MulticastRun::ended() const {
+  return body_->ended();
+}
+
+void MulticastRun::OnRefused(int error, Micros now) {
+  body_->OnRefused(error, now);
 }
 
 void MulticastRun::StartNow(Micros now) {

@@ -32,8 +32,9 @@ struct Outgoing {
 ///   while (const Outgoing* next = run.Next(now)) send it; set a timer for deadline(now);
 ///   until finished().
 ///
-/// Whatever arrives is survived. Memory is bounded by the device table and a few bytes a block.
-/// One thread.
+/// Whatever arrives is survived. Memory is bounded: by `max_devices` for each file of each round,
+/// whose figures are kept for the report, and a few bytes a block of the file under way. One
+/// thread.
 class MulticastRun {
  public:
   /// Throws std::invalid_argument when Objection() has something against a file, or the options
@@ -59,10 +60,14 @@ class MulticastRun {
   /// The next datagram, which counts as sent; null when there is none now. Valid until the next
   /// call of Next: a driver whose socket is full keeps what it was given and asks for no more.
   [[nodiscard]] const Outgoing* Next(Micros now);
+  /// The system has refused a datagram that Next has given; the listener is told of the first.
+  void OnRefused(int error, Micros now);
   /// When OnTime, and then Next, want to be called; nothing when only a datagram can change
   /// something.
   [[nodiscard]] std::optional<Micros> deadline(Micros now) const;
   [[nodiscard]] bool finished() const;
+  /// Nothing new is said any more; a few datagrams may still be due.
+  [[nodiscard]] bool ended() const;
 
   // While it runs:
 

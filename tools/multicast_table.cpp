@@ -21,6 +21,8 @@ using server::DeviceState;
 using server::FileFigures;
 using server::Micros;
 
+constexpr std::uint64_t kLeastRate = 10'000;
+
 double Seconds(Micros time) {
   return std::chrono::duration<double>(time).count();
 }
@@ -50,6 +52,13 @@ double RepairPercent(const FileFigures& file) {
          static_cast<double>(file.first_pass_frames);
 }
 
+/// On the wire, from the first block until the last device was settled; 0: not known.
+std::uint64_t BitsPerSecond(const FileFigures& file) {
+  const double seconds = Seconds(file.ended - file.data_began);
+  if (file.data_began.count() == 0 || seconds <= 0) return 0;
+  return static_cast<std::uint64_t>(static_cast<double>(file.wire_bytes) * 8 / seconds);
+}
+
 nlohmann::ordered_json ToJson(const DeviceFigures& device) {
   return {{"address", server::ToText(device.peer)},
           {"state", server::StateName(device.state)},
@@ -75,9 +84,12 @@ nlohmann::ordered_json ToJson(const FileFigures& file) {
                               {"blocks", file.block_count},
                               {"last_file", file.last_file},
                               {"seconds", Seconds(file.ended - file.began)},
+                              {"bits_per_second", BitsPerSecond(file)},
+                              {"expected", file.expected},
                               {"announcements", file.announcements},
                               {"first_frames", file.first_pass_frames},
                               {"repair_frames", file.repair_frames},
+                              {"farewell_frames", file.farewell_frames},
                               {"control_frames", file.control_frames},
                               {"frames", file.frames},
                               {"wire_bytes", file.wire_bytes},
@@ -145,7 +157,9 @@ nlohmann::ordered_json ToJson(const server::MulticastFigures& figures) {
                               {"garbage", figures.garbage},
                               {"strangers", figures.strangers},
                               {"turned_away", figures.turned_away},
-                              {"rate", figures.rate}};
+                              {"refused", figures.refused},
+                              {"not_stored", figures.not_stored},
+                              {"rate_limit", figures.rate}};
   json["files"] = nlohmann::ordered_json::array();
   for (const FileFigures& file : figures.files) json["files"].push_back(ToJson(file));
   return json;
@@ -185,12 +199,11 @@ std::string ToLine(const server::MulticastEvent& event, Micros start) {
   return line;
 }
 
-std::string FormatMulticast(const server::MulticastFigures& figures,
-                            const server::MulticastOptions& options, std::size_t sessions,
+std::string FormatMulticast(const server::MulticastFigures& figures, std::size_t sessions,
                             std::uint64_t measured, std::size_t rows) {
   const FileFigures* const file = Current(figures);
   if (file == nullptr) return "";
-  const std::uint32_t expected = options.start.expected;
+  const std::uint32_t expected = file->expected;
   const double percent = file->block_count == 0
                              ? 0
                              : 100 * static_cast<double>(file->first_pass_frames) /
@@ -266,9 +279,17 @@ std::string FormatMulticastReport(const server::MulticastFigures& figures) {
       if (device.state == DeviceState::kProven) continue;
       text += Format("    %s %s: %s, last heard %s\n", server::ToText(device.peer).c_str(),
                      std::string(server::StateName(device.state)).c_str(),
-                     device.reason.empty() ? "the run ended" : device.reason.c_str(),
+                     device.reason.empty() ? "the run was ended" : device.reason.c_str(),
                      device.last_heard.c_str());
     }
+  }
+  if (figures.refused > 0) {
+    text += "  " + Plural(figures.refused, "datagram") +
+            " of these did not go out: the system refused to send\n";
+  }
+  if (figures.not_stored > 0) {
+    text += "  the session file could not be written " + Plural(figures.not_stored, "time") +
+            ": a server that is started again knows less\n";
   }
   return Format("multicast: %zu of %zu transfers proven, %llu frames sent, %llu of them repairs\n",
                 proven, joined, static_cast<unsigned long long>(figures.frames_sent),
@@ -290,7 +311,12 @@ std::uint64_t ParseRate(const std::string& text) {
     throw Failure(ExitCode::kUsage, "rate", "\"" + text + "\" is no rate",
                   "give bits per second as 800k, 10M or 1.5G; 0 is no limit");
   }
-  return static_cast<std::uint64_t>(std::llround(value * factor));
+  const auto rate = static_cast<std::uint64_t>(std::llround(value * factor));
+  if (value > 0 && rate < kLeastRate) {
+    throw Failure(ExitCode::kUsage, "rate", "\"" + text + "\" is too slow",
+                  "devices give up when no block comes for half a minute: 10k is the least");
+  }
+  return rate;
 }
 
 std::string FormatRate(std::uint64_t bits_per_second) {

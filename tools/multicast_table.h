@@ -24,7 +24,6 @@ namespace tools {
 /// @param sessions  files of all rounds
 /// @param measured  bits per second on the wire
 [[nodiscard]] std::string FormatMulticast(const server::MulticastFigures& figures,
-                                          const server::MulticastOptions& options,
                                           std::size_t sessions, std::uint64_t measured,
                                           std::size_t rows);
 
@@ -37,7 +36,8 @@ namespace tools {
 /// How it ended: a line a file, and a line for each device that has not proved that it has all.
 [[nodiscard]] std::string FormatMulticastReport(const server::MulticastFigures& figures);
 
-/// "10M", "1.5G", "800k", "64000": bits per second; 0 is no limit. Throws Failure kUsage.
+/// "10M", "1.5G", "800k", "64000": bits per second; 0 is no limit. Throws Failure kUsage, also for
+/// a rate at which devices would give up.
 [[nodiscard]] std::uint64_t ParseRate(const std::string& text);
 /// "10.0 Mbit/s", "no limit" for 0
 [[nodiscard]] std::string FormatRate(std::uint64_t bits_per_second);

@@ -265,13 +265,16 @@ class ServeRun {
                                   {"turned_away", figures.turned_away},
                                   {"bad_requests", ledger_.bad_requests()},
                                   {"devices", devices}};
+    const bool captured = multicast_ == nullptr || multicast_->captured();
     if (multicast_ != nullptr) report["multicast"] = ToJson(multicast_->figures());
+    if (!captured) report["multicast"]["capture"] = "cut";
     if (!options_.report.empty()) WriteWholeFile(options_.report, report.dump(2) + "\n");
     if (options_.json) Print(report);
     if (!options_.json) {
       std::cout << "ended: " << devices.size() << " devices, " << reports_ << " reports, "
                 << figures.most_connections << " connections at once at most" << std::endl;
       if (multicast_ != nullptr) std::cout << FormatMulticastReport(multicast_->figures());
+      if (!captured) std::cout << "the capture is cut: it could not be written to its end\n";
       std::cout << std::flush;
     }
   }

@@ -128,6 +128,15 @@ class MulticastService::Body {
   /// Files of all rounds.
   [[nodiscard]] std::size_t sessions() const { return files_ * run_->options().rounds; }
 
+  [[nodiscard]] std::string Remedy(int error) const {
+    return RoadRemedy(error, network_, setup_.group);
+  }
+  [[nodiscard]] bool captured() const {
+    if (capture_ == nullptr) return true;
+    capture_->Flush();
+    return capture_->good();
+  }
+
   [[nodiscard]] std::string Headline() const {
     return "announcing " + std::to_string(files_) + " files on " + setup_.group + ":" +
            std::to_string(setup_.port) + " from " + server::ToText(driver_->local()) + " (" +
@@ -181,13 +190,17 @@ MulticastService::MulticastService(asio::io_context& loop, const Bundle& bundle,
 MulticastService::~MulticastService() = default;
 
 void MulticastService::Start(server::MulticastListener listener) {
-  body_->run().SetListener(std::move(listener));
+  body_->run().SetListener([this, listener](const server::MulticastEvent& event) {
+    if (event.kind != server::MulticastEventKind::kRefused) return listener(event);
+    server::MulticastEvent with_remedy = event;
+    with_remedy.detail += "; " + body_->Remedy(event.error);
+    listener(with_remedy);
+  });
   body_->driver().Start([] {});
 }
 
 void MulticastService::Stop() {
   body_->run().Stop(server::NowMicros());
-  body_->driver().Wake();
   body_->driver().Close();
 }
 
@@ -206,6 +219,10 @@ void MulticastService::ChangeRate(bool faster) {
   const std::uint64_t now = limit != 0 ? limit : body_->meter().bits_per_second();
   if (limit == 0 && faster) return;  // nothing holds it back
   SetRate(std::max(kLeastRate, faster ? now / 4 * 5 : now / 5 * 4));
+}
+
+bool MulticastService::captured() const {
+  return body_->captured();
 }
 
 const server::MulticastFigures& MulticastService::figures() const {
@@ -231,8 +248,7 @@ std::string MulticastService::ProgressLine() const {
 
 std::string MulticastService::Table(std::size_t rows) {
   body_->meter().See(figures().wire_bytes, server::NowMicros());
-  return FormatMulticast(figures(), body_->run().options(), body_->sessions(),
-                         body_->meter().bits_per_second(), rows);
+  return FormatMulticast(figures(), body_->sessions(), body_->meter().bits_per_second(), rows);
 }
 
 }  // namespace tools

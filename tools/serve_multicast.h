@@ -39,6 +39,8 @@ class MulticastService {
   void ChangeRate(bool faster);
 
   [[nodiscard]] const server::MulticastFigures& figures() const;
+  /// Whether the capture, if there is one, holds every datagram so far.
+  [[nodiscard]] bool captured() const;
   /// "announcing 12 files on 239.1.1.1:7000 from 127.0.0.2:40123 (lo), ttl 1, loop on"
   [[nodiscard]] std::string Headline() const;
   [[nodiscard]] nlohmann::ordered_json HeadlineJson() const;

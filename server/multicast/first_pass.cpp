@@ -224,8 +224,8 @@ void FirstPass::Acknowledged(std::uint32_t block, bool duplicate, Micros now) {
   const auto at = std::find_if(flight_.begin(), flight_.end(),
                                [block](const InFlight& flying) { return flying.block == block; });
   const bool expected = at != flight_.end() || was_lacking;
-  // What it has twice was sent in vain; a second acknowledgement that the network made was not.
-  if (duplicate && (at == flight_.end() || at->again)) ++wasted_;
+  // A block that it has twice was sent again in vain, unless it was the network that doubled it.
+  if (duplicate && again_.erase(block) > 0) ++wasted_;
   if (expected) {
     vain_elections_ = 0;
     vain_blocks_ = 0;
@@ -356,7 +356,10 @@ bool FirstPass::HasBlock() const {
 std::uint32_t FirstPass::TakeBlock(Micros now) {
   const bool again = MayRepeat();
   const std::uint32_t block = again ? *lacking_.begin() : next_++;
-  if (again) lacking_.erase(block);
+  if (again) {
+    lacking_.erase(block);
+    again_.insert(block);
+  }
   flight_.push_back({block, now, again, 0});
   log_.Sent(block, now);
   ++vain_blocks_;

@@ -91,6 +91,7 @@ class FirstPass {
   std::deque<InFlight> flight_;
   std::set<std::uint32_t> lacking_;  ///< not acknowledged by the master
   std::uint32_t lost_ = 0;           ///< sendings that the master did not acknowledge
+  std::set<std::uint32_t> again_;    ///< blocks sent again whose fate is not known
   std::uint32_t wasted_ = 0;         ///< blocks sent again that the master had
   unsigned backoff_ = 0;             ///< doublings of the patience
 

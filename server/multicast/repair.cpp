@@ -115,7 +115,7 @@ void Repair::OnNak(Device& device, std::uint32_t block, Micros now) {
       std::max(device.figures.loss, static_cast<double>(device.gaps) / device.position);
   if (block < log_.guard()) return;
   device.whole = true;
-  desk_.Changed();
+  desk_.Changed(device);
   desk_.GiveRole(device, Role::kPassive, now);
   Remove(device, now);
 }

@@ -11,26 +11,15 @@
 #include <vector>
 
 #include "mcftp/wire/frames.h"
+#include "server/multicast/announcer.h"
 #include "server/multicast/outbox.h"
+#include "server/multicast/session_plan.h"
 #include "server/multicast/session_store.h"
 #include "server/multicast/transfer.h"
 #include "server/multicast_figures.h"
-#include "server/multicast_file.h"
 #include "server/multicast_options.h"
 
 namespace server {
-
-/// What a session is made of, beside the run's options.
-struct SessionPlan {
-  const MulticastFile* file = nullptr;
-  Blocking blocks;
-  std::uint32_t transfer_id = 0;
-  bool last_file = false;
-  Peer own;           ///< where the server is
-  StartPolicy start;  ///< for this file
-  /// Whether a pause in the stream of requests is enough to begin, with fewer than expected.
-  bool begins_when_quiet = false;
-};
 
 /// Announces the file, keeps the table of those who ask for it, has it sent by a Transfer, and
 /// answers late requests for a while. Everything the run hands on has passed its header's checks.
@@ -61,8 +50,10 @@ class MulticastSession final : private TransferDesk {
   [[nodiscard]] bool finished() const { return figures_.phase == FilePhase::kFinished; }
   /// Changes with everything that a restarted server has to know.
   [[nodiscard]] std::uint64_t changes() const { return changes_; }
-  /// Fills in everything but the file's index.
-  void Remember(FileMemory& memory) const;
+  /// What a restarted server has to know, with every device.
+  [[nodiscard]] FileMemory Remember() const;
+  /// ... with the devices that have changed since the last call.
+  [[nodiscard]] FileMemory TakeChanges();
 
  private:
   [[nodiscard]] const MulticastOptions& options() const override { return options_; }
@@ -76,18 +67,18 @@ class MulticastSession final : private TransferDesk {
   void SetReleased(Device& device, const std::string& why, Micros now) override;
   void SetPhase(FilePhase phase, Micros now) override;
   void TellMaster(const Device& device, Micros now) override;
-  void Changed() override { ++changes_; }
+  void Changed(Device& device) override;
 
-  void Announce(Micros now);
-  [[nodiscard]] bool AnnouncedEnough(Micros now) const;
-  [[nodiscard]] Micros AnsweredAt() const;
-  [[nodiscard]] std::optional<Micros> AnnouncingEnds() const;
+  void CheckAnnounced(Micros now);
   void BeginTransfer(Micros now);
   void MakeTransfer(Micros now);
   Device& AddDevice(const Peer& peer, Micros now);
   void EndTransfer(Micros now);
   void CheckProgress(Micros now);
   void KeepAlive(Micros now);
+  void Recall(const DeviceMemory& known, FilePhase phase);
+  void RecallBlocks(const FileMemory& memory);
+  [[nodiscard]] FileMemory Progress() const;
 
   [[nodiscard]] bool OnRequest(const Peer& from, const mcftp::ReadRequest& request, Micros now);
   void Join(const Peer& from, Micros now);
@@ -111,6 +102,7 @@ class MulticastSession final : private TransferDesk {
   FileFigures& figures_;
   Outbox& outbox_;
   const MulticastListener& listener_;
+  Announcer announcer_;
 
   std::deque<Device> devices_;
   std::map<Peer, Device*> table_;
@@ -119,16 +111,12 @@ class MulticastSession final : private TransferDesk {
   std::uint32_t first_unsent_ = 1;
   std::uint32_t highest_sent_ = 0;
 
-  Micros copy_at_{0};    ///< when the next announcement is due
-  Micros last_copy_{0};  ///< when the latest went out
-  Micros last_join_{0};
-  Micros last_request_{0};  ///< the first two of each device count
-  bool start_now_ = false;
   Micros lingers_until_{0};
   bool farewell_ = false;   ///< the last block goes out once more
   Micros heard_by_all_{0};  ///< the latest block: it keeps everybody waiting on
   Micros keepalive_at_{0};
   std::uint64_t changes_ = 0;
+  std::vector<Device*> changed_;  ///< since they were last stored
   Micros turning_since_{0};
   std::uint32_t turned_away_ = 0;  ///< since then
 };

@@ -63,6 +63,8 @@ struct Device {
   bool has_guard = false;  ///< has acknowledged the block before the last
   bool recalled = false;   ///< known from an earlier server, to which it may have said so
 
+  bool changed = false;  ///< since it was last stored
+
   [[nodiscard]] bool settled() const { return figures.state != DeviceState::kJoined; }
 };
 
@@ -85,8 +87,8 @@ class TransferDesk {
   virtual void SetDead(Device& device, const std::string& why, Micros now) = 0;
   virtual void SetReleased(Device& device, const std::string& why, Micros now) = 0;
   virtual void SetPhase(FilePhase phase, Micros now) = 0;
-  /// Something has changed that a restarted server has to know.
-  virtual void Changed() = 0;
+  /// Something has changed that a restarted server has to know of the device.
+  virtual void Changed(Device& device) = 0;
   virtual void TellMaster(const Device& device, Micros now) = 0;
 };
 

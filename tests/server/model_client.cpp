@@ -28,6 +28,7 @@ void ModelClient::Reset() {
   last_acked_ = 0;
   last_naked_ = 0;
   overrun_block_ = 0;
+  overrun_start_ = blocks_before_overrun;
 }
 
 void ModelClient::OnDatagram(const Peer& from, const Peer& /*to*/, std::string_view bytes,
@@ -79,12 +80,7 @@ void ModelClient::Announced(const mcftp::Announcement& announcement, Micros now)
       first_missing_ = 1;
       content_.assign(size_, '\0');
       files_.erase(name_);
-      requests_ = 0;
-      received_ = 0;
-      last_acked_ = 0;
-      last_naked_ = 0;
-      overrun_block_ = 0;
-      overrun_start_ = blocks_before_overrun;
+      requests_ = 0;  // what it has received and said last is only forgotten by a reset
       Request(now);
       break;
     case State::kAwaitOack: Request(now); break;

@@ -135,9 +135,30 @@ class MulticastScript : public ::testing::Test {
     Collect();
   }
 
+  /// Lets time pass until the server says something, a minute at most.
+  void Await() {
+    for (Micros waited{0}; seen_ == sent_.size() && waited < std::chrono::minutes(1);) {
+      const Micros before = now_;
+      const auto deadline = run_->deadline(now_);
+      ASSERT_TRUE(deadline) << "the server waits for a datagram";
+      Pass(std::max(*deadline - now_, Micros(1)));
+      waited += now_ - before;
+    }
+    ASSERT_LT(seen_, sent_.size()) << "the server is silent";
+  }
+  /// A new conversation with the same options.
+  void StartAnew() {
+    files_.clear();
+    contents_.clear();
+    sent_.clear();
+    seen_ = 0;
+    now_ = Micros(0);
+  }
+
   /// The next frame that went out.
   void Expect(const Peer& to, const std::string& bytes, const std::string& what = "") {
-    ASSERT_LT(seen_, sent_.size()) << "nothing was sent; expected " << Hex(bytes) << " " << what;
+    ASSERT_LT(seen_, sent_.size())
+        << "nothing was sent; expected " << Hex(bytes.substr(0, 80)) << " " << what;
     EXPECT_EQ(ToText(sent_[seen_].first), ToText(to)) << what;
     EXPECT_EQ(Hex(sent_[seen_].second.substr(0, 80)), Hex(bytes.substr(0, 80))) << what;
     EXPECT_TRUE(sent_[seen_].second == bytes) << what << ": behind the first 80 bytes";
@@ -183,6 +204,69 @@ class MulticastScript : public ::testing::Test {
     while (const Outgoing* next = run_->Next(now_)) {
       sent_.emplace_back(next->to, std::string(next->bytes));
     }
+  }
+};
+
+/// Lock-step with devices that ask for a file of 2,500 bytes, 5 blocks.
+class LockStepScript : public MulticastScript {
+ protected:
+  static constexpr char kName[] = "\\Temp\\r.bin";
+
+  void BeginWith(const std::vector<Peer>& devices, std::size_t size = 2500) {
+    Add(kName, SomeBytes(size));
+    options_.start.expected = static_cast<std::uint32_t>(devices.size());
+    Begin();
+    for (const Peer& device : devices) Say(device, Request(0x11, kName, true));
+    if (devices.size() > 1) Pass(Ms(1125));
+  }
+  void Acknowledge(const Peer& device, unsigned first, unsigned last) {
+    for (unsigned block = first; block <= last; ++block) Say(device, Ack(block));
+  }
+};
+
+/// Many blocks in flight. Blocks of 512 bytes. Of a file of n blocks, n - 1 is the guard.
+class PipelineScript : public MulticastScript {
+ protected:
+  static constexpr char kName[] = "\\Temp\\p.bin";
+
+  PipelineScript() { options_.window = 64; }
+
+  void BeginWith(const std::vector<Peer>& devices, unsigned blocks) {
+    Add(kName, SomeBytes(blocks * 512U));
+    options_.start.expected = static_cast<std::uint32_t>(devices.size());
+    Begin();
+    for (const Peer& device : devices) Say(device, Request(0x11, kName, true));
+    if (devices.size() > 1) Pass(Ms(1125));
+  }
+  /// A acknowledges the whole first pass. The others have heard what they will say.
+  void EndFirstPass(unsigned blocks) {
+    Say(kA, Ack(0));
+    while (PhaseName(Figures().phase) == "streaming") AnswerBlocks(kA);
+    EXPECT_EQ(Figures().first_pass_frames, blocks - 2);
+    SkipAll();
+    Pass(Ms(1));
+  }
+  /// The device acknowledges what has come in the last 20 ms, as they end.
+  void AnswerBlocks(const Peer& device) {
+    Pass(Ms(20));
+    const std::size_t end = sent_.size();
+    for (; seen_ < end; ++seen_) {
+      if (sent_[seen_].first != kPrivate) continue;
+      Say(device, Bytes("00 40 00 00") + sent_[seen_].second.substr(4, 2));
+    }
+  }
+  /// Every device lacks the last two blocks only, and has taken its role for the end.
+  void BeginClosing(const std::vector<Peer>& devices) {
+    Await();
+    for (const Peer& device : devices) ExpectHex(device, kAckMaster);
+    for (const Peer& device : devices) Say(device, Ack(0));
+  }
+  [[nodiscard]] std::size_t Count(const Peer& to, const std::string& bytes) const {
+    std::size_t count = 0;
+    for (std::size_t i = seen_; i < sent_.size(); ++i) {
+      count += sent_[i].first == to && sent_[i].second == bytes;
+    }
+    return count;
   }
 };
 

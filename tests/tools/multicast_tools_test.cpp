@@ -33,6 +33,13 @@ TEST(RateTest, IsReadWithItsUnitAndShownWithOne) {
   }
 }
 
+TEST(RateTest, IsAsLargeAsDevicesNeedIt) {
+  EXPECT_EQ(ParseRate("10k"), 10'000U);
+  for (const char* text : {"0.4", "300", "9.9k"}) {
+    EXPECT_THROW(static_cast<void>(ParseRate(text)), Failure) << text;
+  }
+}
+
 TEST(RateTest, IsMeasuredOverASecond) {
   using std::chrono::milliseconds;
   RateMeter meter;
@@ -110,6 +117,7 @@ server::MulticastFigures Figures() {
   file.size = 140'000;
   file.block_size = 1400;
   file.block_count = 100;
+  file.expected = 3;
   file.phase = server::FilePhase::kStreaming;
   file.first_pass_frames = 50;
   file.repair_frames = 5;
@@ -130,17 +138,14 @@ server::MulticastFigures Figures() {
 }
 
 TEST(MulticastTableTest, ShowsTheFileUnderWayAndItsDevices) {
-  server::MulticastOptions options;
-  options.start.expected = 3;
-
-  const std::string table = FormatMulticast(Figures(), options, 4, 9'400'000, 10);
+  const std::string table = FormatMulticast(Figures(), 4, 9'400'000, 10);
 
   EXPECT_THAT(table, HasSubstr("multicast file 1 of 4, round 1: \\a.bin, 136.7 KiB\n"));
   EXPECT_THAT(table, HasSubstr("streaming  50%  joined 2 of 3  window 32  rate 9.4 Mbit/s of "
                                "10.0 Mbit/s  repairs 10.0%\n"));
   EXPECT_THAT(table, HasSubstr("127.0.0.1:7000        dead      passive      25.0%"));
-  EXPECT_THAT(FormatMulticast(Figures(), options, 4, 0, 1), HasSubstr("... and 1 more\n"));
-  EXPECT_EQ(FormatMulticast({}, options, 4, 0, 10), "");
+  EXPECT_THAT(FormatMulticast(Figures(), 4, 0, 1), HasSubstr("... and 1 more\n"));
+  EXPECT_EQ(FormatMulticast({}, 4, 0, 10), "");
 }
 
 TEST(MulticastTableTest, ReportsEachFileAndWhoHasNotProvedIt) {
@@ -151,6 +156,28 @@ TEST(MulticastTableTest, ReportsEachFileAndWhoHasNotProvedIt) {
   EXPECT_THAT(report, HasSubstr("  \\a.bin: 1 of 2 devices proven, 70 frames, 5 repairs (10.0%)"));
   EXPECT_THAT(report, HasSubstr("127.0.0.1:7000 dead: silent for 10 s, last heard NAK 12\n"));
   EXPECT_THAT(report, Not(HasSubstr("127.0.0.3")));
+}
+
+TEST(MulticastTableTest, SaysWhatTheSystemRefused) {
+  server::MulticastFigures figures = Figures();
+  EXPECT_THAT(FormatMulticastReport(figures), Not(HasSubstr("refused")));
+  figures.refused = 7;
+  figures.not_stored = 1;
+  const std::string report = FormatMulticastReport(figures);
+  EXPECT_THAT(report,
+              HasSubstr("  7 datagrams of these did not go out: the system refused to send\n"));
+  EXPECT_THAT(report, HasSubstr("  the session file could not be written 1 time: "));
+  EXPECT_EQ(ToJson(figures).at("refused"), 7);
+  EXPECT_EQ(ToJson(figures).at("not_stored"), 1);
+}
+
+TEST(MulticastTableTest, MeasuresTheRateOfEachFile) {
+  server::MulticastFigures figures = Figures();
+  EXPECT_EQ(ToJson(figures).at("files").at(0).at("bits_per_second"), 0);
+  figures.files[0].data_began = std::chrono::seconds(2);
+  figures.files[0].ended = std::chrono::seconds(4);
+  figures.files[0].wire_bytes = 250'000;
+  EXPECT_EQ(ToJson(figures).at("files").at(0).at("bits_per_second"), 1'000'000);
 }
 
 TEST(MulticastTableTest, TellsTheSameInJson) {
