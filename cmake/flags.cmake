@@ -18,6 +18,10 @@ if(ORVENIX_SANITIZE)
   add_compile_options(-fsanitize=${ORVENIX_SANITIZE} -fno-sanitize-recover=all
                       -fno-omit-frame-pointer)
   add_link_options(-fsanitize=${ORVENIX_SANITIZE})
+  if(CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
+    # Compares the types of functions by their descriptions, of which each library has its own.
+    add_compile_options(-fno-sanitize=function)
+  endif()
   if(ORVENIX_SANITIZE STREQUAL "thread")
     # The event library's fences, which this sanitizer does not see, order nothing between threads
     # here: each loop has one.

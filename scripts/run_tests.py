@@ -8,6 +8,8 @@ import argparse
 import concurrent.futures
 import os
 import pathlib
+import re
+import shutil
 import subprocess
 import sys
 import time
@@ -61,47 +63,63 @@ def build(preset, *targets):
 
 
 def ctest(preset, *arguments):
-    """A step that counts each test of a build tree."""
+    """A step that counts each test of a build tree: those of a test program one by one."""
 
     def action(step, counts):
         report = LOGS / f"{step}.xml"
+        results = ROOT / "build" / preset / "results"
         report.unlink(missing_ok=True)
+        shutil.rmtree(results, ignore_errors=True)
+        results.mkdir(parents=True)
         run(step, ["ctest", "--preset", preset, "-j", JOBS, "--output-junit", str(report),
                    "--no-tests=error", *arguments])
         if not report.exists():
             counts.failed += 1
             show_log(step)
             return False
-        failed = ran = 0
-        for case in ElementTree.parse(report).getroot().iter("testcase"):
-            status = case.get("status")
-            ran += 1
-            if status == "run":
-                counts.passed += 1
-            elif status in ("notrun", "disabled") or case.find("skipped") is not None:
-                counts.skipped += 1
-                print(f"    skipped: {case.get('name')}: {skip_reason(case)}")
-            else:
-                failed += 1
-                print(f"    FAILED: {case.get('name')}")
-        if ran == 0:
-            failed = 1
+        found = [result for case in ElementTree.parse(report).getroot().iter("testcase")
+                 for result in results_of(case, results)]
+        for name, state, text in found:
+            setattr(counts, state, getattr(counts, state) + 1)
+            if state == "skipped":
+                print(f"    skipped: {name}: {skip_reason(text)}")
+            elif state == "failed":
+                print(f"    FAILED: {name}")
+        good = bool(found) and all(state != "failed" for _, state, _ in found)
+        if not found:
+            counts.failed += 1
             print("    FAILED: there was no test to run")
-        counts.failed += failed
-        if failed:
+        if not good:
             show_log(step, 80)
-        return failed == 0
+        return good
 
     return action
 
 
-def skip_reason(case):
-    skipped = case.find("skipped")
-    output = (case.findtext("system-out") or "").strip().splitlines()
-    reasons = [line.strip() for line in output if "kipped" not in line and line.strip()]
-    if reasons:
-        return reasons[-1]
-    return skipped.get("message", "no reason given") if skipped is not None else "no reason given"
+def results_of(case, results):
+    """What a test of ctest's came to: (name, state, output) of each test that its program ran."""
+    name = case.get("name")
+    passed = case.get("status") == "run"
+    own = results / (re.sub("[^A-Za-z0-9_]", "_", name) + ".xml")
+    if not own.exists():
+        skipped = case.get("status") in ("notrun", "disabled")
+        return [(name, "passed" if passed else "skipped" if skipped else "failed",
+                 case.findtext("system-out") or "")]
+    found = []
+    for test in ElementTree.parse(own).getroot().iter("testcase"):
+        states = [(part.tag, part.get("message")) for part in test]
+        state, text = states[0] if states else ("passed", "")
+        found.append((f"{name}: {test.get('classname')}.{test.get('name')}",
+                      {"failure": "failed"}.get(state, state), text))
+    if not found or not passed and all(state != "failed" for _, state, _ in found):
+        found.append((f"{name}: the program itself", "failed", ""))
+    return found
+
+
+def skip_reason(output):
+    reasons = [line.strip() for line in output.strip().splitlines()
+               if "kipped" not in line and line.strip() and not line.startswith(("[", "Note:"))]
+    return reasons[-1] if reasons else "no reason given"
 
 
 def fuzz(step, counts):

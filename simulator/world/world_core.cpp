@@ -15,6 +15,9 @@
 // Present only under the address sanitizer: abandoned frames leave marks on the stack.
 // NOLINTNEXTLINE(bugprone-reserved-identifier, readability-identifier-naming): the sanitizer's name
 extern "C" __attribute__((weak)) void __asan_handle_no_return();
+// NOLINTNEXTLINE(bugprone-reserved-identifier, readability-identifier-naming): the sanitizer's name
+extern "C" __attribute__((weak)) void __asan_unpoison_memory_region(const volatile void*,
+                                                                    std::size_t);
 
 namespace sim {
 namespace {
@@ -24,6 +27,16 @@ thread_local _Unwind_Exception abandon;
 
 /// How long, on the host's clock, threads may take to reach a blocking call when they are ended.
 constexpr std::chrono::seconds kEndPatience{30};
+
+// The marks that frames left by unwinding have put on the stack, down to those that the frames of
+// what comes next would meet.
+void ForgetMarks(const SimThread& thread) {
+  if (__asan_unpoison_memory_region == nullptr) return;
+  constexpr std::uintptr_t kBelow = 16 * 1024;
+  const auto low = reinterpret_cast<std::uintptr_t>(__builtin_frame_address(0)) - kBelow;
+  const auto high = reinterpret_cast<std::uintptr_t>(thread.first_frame);
+  __asan_unpoison_memory_region(reinterpret_cast<const void*>(low), high - low);
+}
 
 void AbandonCaught(_Unwind_Reason_Code /*reason*/, _Unwind_Exception* /*exception*/) {
   std::fputs("cesim: a catch (...) swallowed the termination of a simulated thread\n", stderr);
@@ -39,6 +52,7 @@ _Unwind_Reason_Code StopAtFirstFrame(int /*version*/, _Unwind_Action actions,
   auto& thread = *static_cast<SimThread*>(argument);
   const bool at_end = (actions & _UA_END_OF_STACK) != 0;
   if (at_end || _Unwind_GetCFA(context) > reinterpret_cast<std::uintptr_t>(thread.first_frame)) {
+    ForgetMarks(thread);
     std::longjmp(thread.way_out, 1);
   }
   return _URC_NO_REASON;

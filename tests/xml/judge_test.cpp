@@ -82,7 +82,7 @@ TEST_F(JudgeTest, WritesTextsThatAreReadHereAsTheSameTree) {
 /// Does the same random edits to both, and finds the same trees.
 class EditedTwice {
  public:
-  EditedTwice(XmlDocument& document, std::uint32_t seed) : dice_(seed), document_(document) {
+  EditedTwice(XmlDocument& document, std::uint32_t seed) : dice_(seed) {
     document.NewDocument("root");
     cursor_.Attach(&document);
     node_ = judge_.append_child("root");
@@ -152,7 +152,6 @@ class EditedTwice {
   }
 
   Dice dice_;
-  XmlDocument& document_;
   XmlCursor cursor_;
   pugi::xml_document judge_;
   pugi::xml_node node_;
