@@ -21,8 +21,7 @@ if(ORVENIX_SANITIZE)
   if(CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
     # Compares the types of functions by their descriptions, of which each library has its own.
     add_compile_options(-fno-sanitize=function)
-  endif()
-  if(ORVENIX_SANITIZE STREQUAL "thread")
+  elseif(ORVENIX_SANITIZE STREQUAL "thread")
     # The event library's fences, which this sanitizer does not see, order nothing between threads
     # here: each loop has one.
     add_compile_options(-Wno-tsan)
