@@ -1,5 +1,6 @@
 // Input: what devices, and strangers, say to a multicast server, and when. Checks every frame that
-// the server says, and that it comes to an end once nobody answers any more.
+// the server says, and that it comes to an end: once nobody answers any more, or though two devices
+// go on saying the same for ever.
 //
 // The first byte chooses options. Then come steps, a byte each and what it needs:
 //   0 t          t times 20 ms pass
@@ -8,13 +9,17 @@
 //   3 d hh ll    device d acknowledges a block, 4 d hh ll: ... with the duplicate flag
 //   5 d hh ll    device d misses a block
 //   6 d hh ll    device d reports an overrun at a block
-//   7 x          the server is told: 0 start now, 1 stop, else a rate
+//   7 x          the server is told: 0 start now, 1 stop, else a rate; 2 to 6: when the input is
+//                used up, two devices go on with ACK 0, the ACK of each block, of the last block,
+//                NAK 1, NAK of the last block
 #include "server/multicast_run.h"
 
 #include <algorithm>
 #include <cstdlib>
+#include <deque>
 #include <set>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "base/byte_reader.h"
@@ -29,7 +34,8 @@ using server::Peer;
 
 constexpr Peer kOwn{0x0A000002, 7001};
 constexpr std::size_t kMostFrames = 20000;      ///< while somebody answers
-constexpr std::size_t kMostLastFrames = 20000;  ///< once nobody does
+constexpr std::size_t kMostLastFrames = 20000;  ///< once nobody does, or two say always the same
+constexpr std::size_t kParrots = 2;
 constexpr int kMostDeadlines = 200000;
 
 void Require(bool holds) {
@@ -59,11 +65,16 @@ class Conversation {
   /// @return false when the input is used up.
   bool Step(base::ByteReader& in);
 
-  /// Nobody answers any more: the run ends, and soon enough.
+  /// Nobody says anything new any more: the run ends, and soon enough.
   void Finish() {
     limit_ = frames_ + kMostLastFrames;
+    finishing_ = true;
     for (int i = 0; !run_.finished(); ++i) {
       Require(i < kMostDeadlines && frames_ < limit_);
+      if (!unanswered_.empty()) {
+        AnswerAlways();
+        continue;
+      }
       const auto deadline = run_.deadline(now_);
       Require(deadline.has_value());
       now_ = std::max(now_, *deadline);
@@ -137,8 +148,29 @@ class Conversation {
     Say(device, frame, length);
   }
 
+  /// To one frame.
+  void AnswerAlways() {
+    const auto [to, block] = unanswered_.front();
+    unanswered_.pop_front();
+    std::size_t parrots = 0;
+    for (const Peer& device : std::set<Peer>(spoken_)) {
+      if (parrots++ == kParrots) return;
+      if (to != device && to.address != options_.private_group) continue;
+      const std::uint16_t words[] = {0, block, LastBlock(), 1, LastBlock()};
+      Answer(refrain_ < 5 ? 3 : 5, static_cast<std::uint8_t>(device.address - PeerOf(0).address),
+             words[refrain_ - 2U]);
+    }
+  }
+
+  [[nodiscard]] std::uint16_t LastBlock() const {
+    return block_size_ == 0 ? std::uint16_t{0}
+                            : static_cast<std::uint16_t>((size_ + block_size_ - 1) / block_size_);
+  }
+
   void Tell(std::uint8_t what) {
-    if (what == 0) {
+    if (what >= 2 && what <= 6) {
+      refrain_ = what;
+    } else if (what == 0) {
       run_.StartNow(now_);
     } else if (what == 1) {
       run_.Stop(now_);
@@ -154,12 +186,15 @@ class Conversation {
       if (next == nullptr) return;
       ++frames_;
       Check(next->to, next->bytes);
+      if (finishing_ && refrain_ != 0 && next->to != options_.public_group) {
+        unanswered_.emplace_back(next->to, block_);
+      }
     }
   }
 
   void Check(const Peer& to, std::string_view bytes);
   void CheckAnnouncement(const std::vector<std::uint8_t>& frame);
-  void CheckData(const std::vector<std::uint8_t>& frame) const;
+  void CheckData(const std::vector<std::uint8_t>& frame);
 
   const std::vector<std::string> contents_;
   const server::MulticastOptions options_;
@@ -172,7 +207,13 @@ class Conversation {
   std::string name_ = "x";
   std::uint32_t transfer_id_ = 0;
   std::uint16_t block_size_ = 0;
+  std::uint32_t size_ = 0;
   bool last_file_ = false;
+  std::uint16_t block_ = 0;  ///< that went out last
+
+  std::uint8_t refrain_ = 0;  ///< what two devices go on with; 0: nothing
+  bool finishing_ = false;
+  std::deque<std::pair<Peer, std::uint16_t>> unanswered_;
 };
 
 bool Conversation::Step(base::ByteReader& in) {
@@ -236,17 +277,19 @@ void Conversation::CheckAnnouncement(const std::vector<std::uint8_t>& frame) {
   transfer_id_ = announcement.transfer_id;
   block_size_ = announcement.block_size;
   last_file_ = announcement.last_file;
+  size_ = announcement.file_size;
   const auto number = static_cast<std::size_t>(name_.back() - '0');
   Require(number < contents_.size() && announcement.file_size == contents_[number].size());
   Require(announcement.last_file == (number + 1 == contents_.size()));
 }
 
 /// A block is what the announced file has there.
-void Conversation::CheckData(const std::vector<std::uint8_t>& frame) const {
+void Conversation::CheckData(const std::vector<std::uint8_t>& frame) {
   mcftp::DataFrame data;
   Require(mcftp::DecodeData(frame.data(), frame.size(), data));
   const std::string& content = contents_.at(static_cast<std::size_t>(name_.back() - '0'));
   Require(data.block >= 1 && data.length >= 1);
+  block_ = data.block;
   const std::size_t at = std::size_t{block_size_} * (data.block - 1U);
   Require(at < content.size());
   const std::string expected = content.substr(at, block_size_);

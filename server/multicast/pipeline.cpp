@@ -64,7 +64,7 @@ void Pipeline::OnRate(Micros now) {
 void Pipeline::OnAck(Device& device, const mcftp::AckFrame& ack, Micros now) {
   switch (step_) {
     case Step::kFirstPass: first_pass_.OnAck(device, ack, now); break;
-    case Step::kRepair: repair_.OnAck(device, now); break;
+    case Step::kRepair: repair_.OnAck(device, ack.block, now); break;
     case Step::kClosing: closing_.OnAck(device, ack.block, now); break;
     case Step::kDone: break;
   }

@@ -80,10 +80,14 @@ void Repair::OnGivenUp(Device& device, Micros now) {
 }
 
 /// A device in NAK mode that acknowledges has been sent into ACK mode by its own record of an
-/// overrun: it has to be asked again.
-void Repair::OnAck(Device& device, Micros now) {
+/// overrun: it has to be asked again. One that acknowledges a block that never went out has closed
+/// the file: it may do so when it had named its last block in a file of the same length before.
+void Repair::OnAck(Device& device, std::uint32_t block, Micros now) {
   if (!device.in_group || now - device.asked_at <= Bound(device)) return;
-  if (IsSilent(device, now)) {
+  if (block == log_.count() && log_.sent_at(block) == BlockLog::kNever) {
+    desk_.SetReleased(device, "has closed the file before it had every block", now);
+    Remove(device, now);
+  } else if (IsSilent(device, now)) {
     desk_.SetDead(device, "acknowledges instead of saying what it lacks", now);
     Remove(device, now);
   } else {

@@ -23,7 +23,7 @@ class Repair {
   /// @param window  blocks that may be on their way within one round trip
   void Begin(std::uint32_t window, Micros now);
   void OnJoin(Micros now);
-  void OnAck(Device& device, Micros now);
+  void OnAck(Device& device, std::uint32_t block, Micros now);
   void OnNak(Device& device, std::uint32_t block, Micros now);
   void OnGivenUp(Device& device, Micros now);
   void OnTime(Micros now);

@@ -24,7 +24,7 @@ class MulticastEfficiencyTest : public MulticastFleetTest,
 TEST_P(MulticastEfficiencyTest, NeedsHardlyMoreThanTheIdealNumberOfBytesForEightDevices) {
   Circumstances with;
   with.loss = GetParam();
-  with.size = 4 << 20;
+  with.size = 2 << 20;
   Make(with).Run();
   ExpectTruth(/*all=*/true);
   const double headers = static_cast<double>(WireBytes(1406)) / 1400;
@@ -187,7 +187,7 @@ TEST_F(MulticastFleetTest, KeepsALineFullWithoutDrowningIt) {
     for (const std::size_t queue : {24U, 1000U}) {  // 24 frames: what a device's buffer holds
       Circumstances with;
       with.devices = devices;
-      with.size = 4'000'000;
+      with.size = 2'000'000;
       with.window = 1000;
       with.link.bits_per_second = 10'000'000;
       with.link.queue = queue;
@@ -196,7 +196,7 @@ TEST_F(MulticastFleetTest, KeepsALineFullWithoutDrowningIt) {
       const double seconds =
           static_cast<double>((Figures().ended - Figures().data_began).count()) / 1e6;
       const double line = static_cast<double>(Figures().wire_bytes) * 8 / 10e6;
-      EXPECT_LT(seconds, line * 1.02 + 0.1) << devices << " devices, queue " << queue;
+      EXPECT_LT(seconds, line * 1.02 + 0.15) << devices << " devices, queue " << queue;
       EXPECT_LT(Figures().repair_frames, Figures().block_count / 50)
           << devices << " devices, queue " << queue;
     }

@@ -238,6 +238,19 @@ TEST_F(MulticastPipelineTest, GivesUpADeviceThatAcknowledgesInsteadOfNamingWhatI
   EXPECT_LT(now_, Ms(20'000));
 }
 
+TEST_F(MulticastPipelineTest, ReleasesADeviceThatHasClosedTheFileTooEarly) {
+  BeginWith({kA, kB}, 10);
+  EndFirstPass(10);
+  Say(kB, Ack(10));  // it may have been under way when B was asked
+  EXPECT_EQ(StateOf(1), "joined");
+  for (int i = 0; i < 10 && StateOf(1) == "joined"; ++i) {
+    Pass(Ms(300));
+    Say(kB, Ack(10));
+  }
+  EXPECT_EQ(StateOf(1), "released");
+  EXPECT_EQ(Figures().devices[1].reason, "has closed the file before it had every block");
+}
+
 TEST_F(MulticastPipelineTest, BeginsTheRepairWithAFewBlocksAndNoBurst) {
   BeginWith({kA}, 300);
   Say(kA, Ack(0));

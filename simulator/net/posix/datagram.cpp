@@ -17,6 +17,10 @@ namespace {
 // Older header sets lack the name: a socket hears the groups it joined, not the whole host's.
 constexpr int kMulticastAll = 49;
 
+/// Devices of one host share its processors: what comes from a group to one of them while others
+/// run waits here. A host that allows less gives what it allows.
+constexpr int kGroupBuffer = 1 << 20;
+
 /// The sender and size of the first datagram in line. @return false when there is none.
 bool PeekFirst(const SocketFile& file, Received& first) {
   char byte = 0;
@@ -204,8 +208,8 @@ int PosixDatagram::OpenGroup(Address group, SocketFile& file) {
   if (error == 0) error = opened.Set(SOL_SOCKET, SO_REUSEADDR, 1);
   if (error == 0) error = opened.Set(IPPROTO_IP, kMulticastAll, 0);
   if (error == 0) error = opened.Set(SOL_SOCKET, SO_TIMESTAMPNS, 1);
-  if (error == 0 && receive_buffer_ > 0) {
-    error = opened.Set(SOL_SOCKET, SO_RCVBUF, receive_buffer_);
+  if (error == 0) {
+    error = opened.Set(SOL_SOCKET, SO_RCVBUF, receive_buffer_ > 0 ? receive_buffer_ : kGroupBuffer);
   }
   if (error == 0) error = opened.Bind({group, port_});
   const ip_mreq request{{SwapOrder(group)}, {SwapOrder(device_.own)}};
