@@ -37,6 +37,10 @@ std::optional<HostEntry> StatEntry(int folder, const std::string& name) {
   struct stat status {};
   if (::fstatat(folder, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) != 0) return std::nullopt;
   if (!S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode)) return std::nullopt;
+  return EntryOf(status, name);
+}
+
+HostEntry EntryOf(const struct stat& status, const std::string& name) {
   HostEntry entry;
   entry.name = name;
   entry.folder = S_ISDIR(status.st_mode);

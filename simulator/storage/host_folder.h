@@ -4,6 +4,8 @@
 // open folder and refuses symbolic links, so that nothing leads out of the device's folder.
 #pragma once
 
+#include <sys/stat.h>
+
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -32,6 +34,9 @@ struct HostEntry {
 
 /// The entry with exactly this name on the host.
 [[nodiscard]] std::optional<HostEntry> StatEntry(int folder, const std::string& name);
+
+/// The entry of a file or folder of which the host has said this.
+[[nodiscard]] HostEntry EntryOf(const struct stat& status, const std::string& name);
 
 /// All names in `folder` that the device can say, in no order.
 [[nodiscard]] std::vector<std::u16string> ReadNames(int folder);

@@ -100,10 +100,7 @@ DWORD Storage::OpenHost(const OpenRequest& request, Location& location, UniqueFd
   if (!fd) return ErrorOfErrno(errno);
   struct stat status {};
   if (::fstat(fd.get(), &status) != 0 || !S_ISREG(status.st_mode)) return ERROR_ACCESS_DENIED;
-  if (creates) {
-    location.entry = StatEntry(location.folder, name);
-    if (!location.entry) return ERROR_ACCESS_DENIED;
-  }
+  if (creates) location.entry = EntryOf(status, name);
   location.entry->device = status.st_dev;
   location.entry->inode = status.st_ino;
   location.entry->size = static_cast<std::uint64_t>(status.st_size);

@@ -2,8 +2,11 @@
 
 #include <netinet/in.h>
 #include <netinet/tcp.h>
+#include <sys/uio.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <cstring>
 
 #include "ce/winsock.h"
 #include "net/posix/address.h"
@@ -15,7 +18,14 @@ namespace {
 // Lets the host choose the port when the connection is made, not before.
 constexpr int kBindAddressNoPort = 24;
 
+constexpr std::size_t kAhead = 64 * 1024;
+
 }  // namespace
+
+PosixStream::~PosixStream() {
+  // The host does so itself with the unread bytes that it knows of.
+  if (ahead_begin_ != ahead_end_) PosixStream::Abort();
+}
 
 int PosixStream::Bind(const Endpoint& local) {
   // A port whose last connections only wait for stragglers is free on the device.
@@ -72,12 +82,41 @@ int PosixStream::SendTo(const Endpoint& /*to*/, const char* /*bytes*/, std::size
   return WSAEOPNOTSUPP;
 }
 
+std::size_t PosixStream::TakeAhead(char* bytes, std::size_t size, bool peek) {
+  const std::size_t taken = std::min(size, ahead_end_ - ahead_begin_);
+  std::memcpy(bytes, ahead_.get() + ahead_begin_, taken);
+  if (!peek) ahead_begin_ += taken;
+  return taken;
+}
+
+int PosixStream::ReceiveFromHost(char* bytes, std::size_t size, Received& result) {
+  if (!ahead_) ahead_ = std::make_unique<char[]>(kAhead);
+  iovec parts[] = {{bytes, size}, {ahead_.get(), kAhead}};
+  const ssize_t got = readv(file_.get(), parts, 2);
+  if (got < 0) return ToWinsockError(errno);
+  const auto count = static_cast<std::size_t>(got);
+  result.size = std::min(count, size);
+  ahead_begin_ = 0;
+  ahead_end_ = count - result.size;
+  return 0;
+}
+
 int PosixStream::Receive(char* bytes, std::size_t size, bool peek, Received& result) {
   if (size == 0) return 0;
-  const ssize_t count = recv(file_.get(), bytes, size, peek ? MSG_PEEK : 0);
+  if (ahead_begin_ != ahead_end_) {
+    result.size = TakeAhead(bytes, size, peek);
+    return 0;
+  }
+  if (!peek) return ReceiveFromHost(bytes, size, result);
+  const ssize_t count = recv(file_.get(), bytes, size, MSG_PEEK);
   if (count < 0) return ToWinsockError(errno);
   result.size = static_cast<std::size_t>(count);
   return 0;
+}
+
+int PosixStream::Pending(std::uint32_t& bytes) {
+  bytes = static_cast<std::uint32_t>(ahead_end_ - ahead_begin_);
+  return bytes != 0 ? 0 : file_.Pending(bytes);
 }
 
 int PosixStream::ShutdownSend() {
@@ -108,12 +147,14 @@ int PosixStream::Tune(Tuning what, int value) {
 }
 
 unsigned PosixStream::Ready(unsigned interest) {
+  if (interest == kReadable && ahead_begin_ != ahead_end_) return kReadable;
   short events = 0;
   if ((interest & kReadable) != 0) events |= POLLIN;
   if ((interest & kWritable) != 0) events |= POLLOUT;
   const short found = file_.Poll(events);
   unsigned ready = 0;
-  if ((found & (POLLIN | POLLHUP | POLLERR)) != 0) ready |= kReadable;
+  const bool has_bytes = ahead_begin_ != ahead_end_;
+  if (has_bytes || (found & (POLLIN | POLLHUP | POLLERR)) != 0) ready |= kReadable;
   if ((found & (POLLOUT | POLLERR)) != 0) ready |= kWritable;
   return ready & interest;
 }

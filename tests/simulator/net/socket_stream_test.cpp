@@ -156,6 +156,20 @@ TYPED_TEST(SocketStreamTest, ResetsTheConnectionWhenUnreadBytesAreLeftAtTheClose
   EXPECT_EQ(ce_WSAGetLastError(), WSAECONNRESET);
 }
 
+TYPED_TEST(SocketStreamTest, ResetsTheConnectionWhenOnlySomeOfTheBytesHaveBeenRead) {
+  const auto [client, server] = ConnectedPair();
+  ASSERT_EQ(SendText(client, "unread"), 6);
+  ASSERT_EQ(Select(server, For::kRead, -1), 1);
+  char two[2];
+  ASSERT_EQ(ce_recv(server, two, 2, 0), 2);
+  EXPECT_EQ(Select(server, For::kRead, 0), 1);
+  EXPECT_EQ(Pending(server), 4U);
+  ce_closesocket(server);
+
+  EXPECT_EQ(Select(client, For::kRead, -1), 1);
+  EXPECT_EQ(ReceiveText(client), "error 10054");
+}
+
 TYPED_TEST(SocketStreamTest, ResetsTheConnectionWhenItDoesNotLinger) {
   const auto [client, server] = ConnectedPair();
   const ce_linger at_once{1, 0};
