@@ -30,6 +30,11 @@ void Kernel::SkipSleeps() {
   skips_sleeps_ = true;
 }
 
+void Kernel::ShortenSleeps(std::uint32_t divisor) {
+  const auto lock = device_.world().Acquire();
+  sleep_divisor_ = std::max<std::uint32_t>(divisor, 1);
+}
+
 std::size_t Kernel::LiveThreads() const {
   const auto lock = device_.world().Acquire();
   return device_.world().LiveThreads(device_);

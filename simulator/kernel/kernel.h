@@ -36,6 +36,9 @@ class Kernel {
   /// From now on Sleep notes its length and returns at once: for measuring what a program does
   /// between its pauses.
   void SkipSleeps();
+  /// From now on Sleep notes its length and takes `divisor`-th of it: for whoever watches a program
+  /// that pauses for a reader's sake. Waits with a time-out keep theirs.
+  void ShortenSleeps(std::uint32_t divisor);
   /// Threads of the device that have not ended, attached host threads included.
   [[nodiscard]] std::size_t LiveThreads() const;
   /// Names of the events, mutexes and semaphores that exist, sorted.
@@ -69,12 +72,16 @@ class Kernel {
 
   void NoteSleep(std::uint32_t thread, std::uint32_t length_ms);
   [[nodiscard]] bool skips_sleeps() const { return skips_sleeps_; }
+  [[nodiscard]] Micros SleepTime(std::uint32_t length_ms) const {
+    return Micros(std::chrono::milliseconds(length_ms)) / sleep_divisor_;
+  }
   [[nodiscard]] std::uint32_t TickCount() const;
 
  private:
   Device& device_;
   std::deque<SleepRecord> sleeps_;
   bool skips_sleeps_ = false;
+  std::uint32_t sleep_divisor_ = 1;
   std::uint32_t tick_base_ = 0;
   // Each kind has names of its own. A name lives as long as its object.
   mutable std::map<std::pair<Kind, std::u16string>, std::weak_ptr<KernelObject>> named_;

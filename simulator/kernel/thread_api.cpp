@@ -104,7 +104,7 @@ void Sleep(DWORD duration_ms) {
     return;
   }
   std::optional<sim::Micros> until;
-  if (duration_ms != INFINITE) until = world.now() + std::chrono::milliseconds(duration_ms);
+  if (duration_ms != INFINITE) until = world.now() + kernel.SleepTime(duration_ms);
   world.WaitUntil(lock, {}, until, [] { return false; });
 }
 

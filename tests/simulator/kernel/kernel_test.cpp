@@ -54,6 +54,17 @@ TEST_F(KernelTest, NotesSleepsThatItIsToldToSkip) {
   EXPECT_EQ(device().kernel().Sleeps()[0].length_ms, 3000U);
 }
 
+TEST_F(KernelTest, ShortensSleepsButNoOtherWaits) {
+  device().kernel().ShortenSleeps(20);
+  Sleep(3000);
+
+  EXPECT_EQ(world().now(), milliseconds(150));
+  EXPECT_EQ(device().kernel().Sleeps().back().length_ms, 3000U) << "as the program asked";
+  HANDLE event = CreateEventW(nullptr, TRUE, FALSE, nullptr);
+  EXPECT_EQ(WaitForSingleObject(event, 1000), WAIT_TIMEOUT);
+  EXPECT_EQ(world().now(), milliseconds(1150));
+}
+
 TEST_F(KernelTest, KnowsTheNamedObjectsThatExist) {
   HANDLE event = CreateEventW(nullptr, TRUE, FALSE, u"TW_UPGRADE_IN_PROGRESS");
   HANDLE mutex = CreateMutexW(nullptr, FALSE, u"A mutex");
