@@ -36,6 +36,7 @@ EMPTY = "settings/empty.ini"  # no list can say its checksum: fetched by HTTP in
 WHY = {RIGHT: "already right", CORRUPT: "damaged", SPOILT: "damaged", EMPTY: "missing"}
 GROUP, DEVICE_TEXT = "239.1.1.1", "TQ52"
 RUN_LIMIT_S = 600
+FIRMWARE = "firmware"  # a scenario of its own: demo_firmware.py
 
 BEGIN_TEXT, END_TEXT = "Demo upgrade", "Demo upgrade done"
 STOPPED = "scanner.exe"  # runs on the device, and the job stops it
@@ -210,6 +211,14 @@ class Server:
 
     def read(self):
         self.lines.extend(self.process.stdout)
+
+    def await_line(self, text):
+        """Waits until the server has said this."""
+        limit = time.monotonic() + 30
+        while not any(text in line for line in self.lines):
+            if time.monotonic() > limit or self.process.poll() is not None:
+                sys.exit(f"demo: the server never said {text}")
+            time.sleep(0.02)
 
     def stop(self):
         """Ends the server and keeps its live events."""
@@ -493,8 +502,9 @@ def run_devices(devices, job, scenario):
 
 def read_options():
     parser = argparse.ArgumentParser(prog="./demo", description=__doc__.splitlines()[0])
-    parser.add_argument("--scenario", choices=sorted(filter(None, SCENARIOS)), default="",
-                        help="a job that the device must refuse, or http: one without multicast")
+    parser.add_argument("--scenario", choices=sorted(filter(None, (*SCENARIOS, FIRMWARE))), default="",
+                        help="a job that the device must refuse; http: one without multicast; "
+                             "firmware: images, loaders, a package, two passes")
     parser.add_argument("--loss", type=float, default=2.0, metavar="P",
                         help="percent of the server's datagrams that a device does not hear (2)")
     parser.add_argument("--seed", type=int, default=1, metavar="N",
@@ -520,13 +530,20 @@ def make_bundle(files, bundle, port, scenario, options):
     must("orvenix job lint", "job", "lint", bundle)
 
 
+def fresh(out):
+    shutil.rmtree(out, ignore_errors=True)
+    return out
+
+
 def main():
     options = read_options()
-    scenario = SCENARIOS[options.scenario]
     print("building ...", flush=True)
     build()
-    out = scenario.folder
-    shutil.rmtree(out, ignore_errors=True)
+    if options.scenario == FIRMWARE:
+        import demo_firmware
+        return demo_firmware.main(fresh(ROOT / "out" / f"demo-{FIRMWARE}"))
+    scenario = SCENARIOS[options.scenario]
+    out = fresh(scenario.folder)
     files, bundle, evidence = out / "files", out / "bundle", out / "evidence"
     evidence.mkdir(parents=True)
     make_files(files)

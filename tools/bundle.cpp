@@ -85,7 +85,14 @@ bool GoesByMulticast(const InputFile& from, std::uint64_t size, const BundleOpti
       [&from](const std::string& pattern) { return Matches(pattern, from.relative); });
 }
 
-std::string OnDevice(const std::string& folder, std::string relative) {
+std::string OnDevice(std::string folder, std::string relative, const BundleOptions& options) {
+  for (const auto& [pattern, other] : options.destinations) {
+    if (!Matches(pattern, relative)) continue;
+    relative = relative.substr(relative.rfind('/') + 1);
+    if (other == "RAM:") return other + relative;
+    folder = other;
+    break;
+  }
   std::replace(relative.begin(), relative.end(), '/', '\\');
   const std::size_t end = folder.find_last_not_of('\\');
   return (end == std::string::npos ? "" : folder.substr(0, end + 1)) + "\\" + relative;
@@ -131,13 +138,13 @@ Bundle Plan(const std::vector<InputFile>& input, const BundleOptions& options) {
   bundle.list.source = options.name + ".lst";
   bundle.list.destination = "\\Orvenix\\" + bundle.list.source;
   bundle.list.masks = options.masks;
-  bundle.list.by_multicast = options.multicast.has_value();
+  bundle.list.by_multicast = options.multicast.has_value() && !input.empty();
   bundle.multicast = options.multicast;
   CheckBundleFile(bundle.list, "--name");
   for (const InputFile& from : input) {
     BundleFile file;
     file.source = options.name + "/" + from.relative;
-    file.destination = OnDevice(options.destination, from.relative);
+    file.destination = OnDevice(options.destination, from.relative, options);
     file.masks = MasksOf(from.relative, options);
     file.size = fs::file_size(from.path);
     file.by_multicast = GoesByMulticast(from, file.size, options);
@@ -148,6 +155,12 @@ Bundle Plan(const std::vector<InputFile>& input, const BundleOptions& options) {
   }
   CheckBundleAsAWhole(bundle);
   return bundle;
+}
+
+/// Nothing in a folder to upgrade from, and no other files either.
+void RefuseEmptyBundle(const Bundle& bundle, const ConfigurationPlan& plan) {
+  if (!bundle.files.empty() || !plan.Files().empty()) return;
+  throw Failure(ExitCode::kBadInput, bundle.name, "there is no file in the folder", "add files");
 }
 
 nlohmann::ordered_json ToJson(const BundleFile& file) {
@@ -186,6 +199,9 @@ std::string FormatManifest(const Bundle& bundle) {
                               {"address", bundle.address},       {"port", bundle.port},
                               {"total_size", bundle.total_size}, {"list", ToJson(bundle.list)}};
   if (bundle.multicast) json["multicast"] = ToJson(*bundle.multicast);
+  if (bundle.configured_files) {
+    json["configuration"] = {{"file", kBundleConfiguration}, {"files", *bundle.configured_files}};
+  }
   json["files"] = nlohmann::ordered_json::array();
   for (const BundleFile& file : bundle.files) json["files"].push_back(ToJson(file));
   return json.dump(2) + "\n";
@@ -226,6 +242,15 @@ fs::path PrepareOutput(const BundleOptions& options) {
   return beside;
 }
 
+void FillConfiguration(const fs::path& beside, const BundleOptions& options, const Bundle& bundle,
+                       const ConfigurationPlan& plan) {
+  if (!plan.wanted) return;
+  for (const ConfiguredFile& file : plan.Files()) {
+    CopyWithChecksum(file.from, beside / kBundleTree / file.source);
+  }
+  WriteWholeFile(beside / kBundleConfiguration, FormatConfiguration(bundle, options, plan));
+}
+
 void Fill(const fs::path& beside, const std::vector<InputFile>& input, const BundleOptions& options,
           Bundle& bundle) {
   bundle.total_size = 0;
@@ -235,6 +260,7 @@ void Fill(const fs::path& beside, const std::vector<InputFile>& input, const Bun
     std::tie(file.size, file.crc32) = CopyWithChecksum(input[i].path, to);
     bundle.total_size += file.size;
   }
+  if (input.empty()) return;
   const std::string list = FormatListFile(bundle);
   bundle.list.size = list.size();
   bundle.list.crc32 = ChecksumOf(list);
@@ -245,7 +271,6 @@ void Fill(const fs::path& beside, const std::vector<InputFile>& input, const Bun
   WriteWholeFile(beside / kBundleTree / bundle.list.source, list);
   fs::last_write_time(beside / kBundleTree / bundle.list.source, newest);
   WriteWholeFile(beside / kBundleJob, FormatBundleJob(bundle, options));
-  WriteWholeFile(beside / kBundleManifest, FormatManifest(bundle));
 }
 
 void AddMulticast(JobGroup& upgrade, const MulticastSetup& setup) {
@@ -263,6 +288,7 @@ std::string VolumeOf(const std::string& destination) {
     const std::string prefix = std::string(volume) + "\\";
     if (base::EqualIgnoringCase(destination.substr(0, prefix.size()), prefix)) return volume;
   }
+  if (base::StartsWith(destination, "RAM:")) return "RAM:";
   return "\\";
 }
 
@@ -309,6 +335,12 @@ std::string FormatBundleJob(const Bundle& bundle, const BundleOptions& options) 
     store.AddField("Name", volume);
     store.AddField("RequiredSpace", std::to_string(size));
   }
+  if (!options.program.empty()) {
+    JobGroup& start = upgrade.AddGroup("StartProcess");
+    start.AddField("Process", options.program);
+    start.AddField("Parameters", options.parameters);
+    start.AddField("Wait", options.wait ? "true" : "false");
+  }
   JobGroup& list = upgrade.AddGroup("FileList");
   list.AddField("Source", bundle.list.source);
   list.AddField("Dest", bundle.list.destination);
@@ -347,9 +379,14 @@ Bundle MakeBundle(const BundleOptions& options) {
   try {
     const std::vector<InputFile> input = FindInput(options.folder);
     Bundle bundle = Plan(input, options);
+    const ConfigurationPlan plan = PlanConfiguration(bundle, options);
+    RefuseEmptyBundle(bundle, plan);
+    if (plan.wanted) bundle.configured_files = plan.Files().size();
     const fs::path beside = PrepareOutput(options);
     try {
       Fill(beside, input, options, bundle);
+      FillConfiguration(beside, options, bundle, plan);
+      WriteWholeFile(beside / kBundleManifest, FormatManifest(bundle));
       const fs::path out = fs::weakly_canonical(options.out);
       fs::remove_all(out);
       fs::rename(beside, out);
@@ -379,6 +416,9 @@ Bundle ReadBundle(const fs::path& folder) {
     json.at("port").get_to(bundle.port);
     json.at("total_size").get_to(bundle.total_size);
     bundle.list = FileFromJson(json.at("list"));
+    if (json.contains("configuration")) {
+      bundle.configured_files = json.at("configuration").at("files").get<std::size_t>();
+    }
     if (json.contains("multicast")) bundle.multicast = SetupFromJson(json.at("multicast"));
     for (const auto& entry : json.at("files")) bundle.files.push_back(FileFromJson(entry));
     return bundle;

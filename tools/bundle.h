@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "tools/bundle_firmware.h"
 #include "tools/multicast_setup.h"
 
 namespace tools {
@@ -34,6 +35,17 @@ struct BundleOptions {
 
   std::optional<MulticastSetup> multicast;  ///< none: every file goes by HTTP
   std::vector<std::string> http_only;       ///< name patterns of files that no group gets
+
+  /// Other places by file name pattern, for the file itself without its sub-folders: a folder, or
+  /// "RAM:" for the flash store; the first that matches.
+  std::vector<std::pair<std::string, std::string>> destinations;
+  std::string program;     ///< started on the device at the end; empty: none
+  std::string parameters;  ///< its command line
+  bool wait = true;        ///< the device waits for its end
+
+  bool configuration = false;  ///< a configuration file also without firmware and INF file
+  std::vector<FirmwareOptions> firmware;
+  std::filesystem::path inf;  ///< an INF file, with what it names beside it; empty: none
 };
 
 /// One file of a bundle, as the list file, the server and the device know it.
@@ -55,16 +67,20 @@ struct Bundle {
   std::vector<BundleFile> files;
   std::uint64_t total_size = 0;  ///< of the files, without the list
   std::optional<MulticastSetup> multicast;
+  /// What the configuration file brings besides; none: there is no such file.
+  std::optional<std::size_t> configured_files;
 };
 
 /// The names inside a bundle's folder.
 inline constexpr const char* kBundleManifest = "bundle.json";
 inline constexpr const char* kBundleTree = "tree";
 inline constexpr const char* kBundleJob = "job.xml";
+inline constexpr const char* kBundleConfiguration = "upgrade.xml";
 
 /// Makes a bundle: <out>/tree is what a server serves, <out>/job.xml what a host sends to devices,
-/// <out>/bundle.json what this program reads again. The same folder and options give the same
-/// bundle, byte for byte; files keep their times.
+/// <out>/bundle.json what this program reads again. With firmware or an INF file there is also
+/// <out>/upgrade.xml, the configuration file; without files in the folder only that. The same
+/// folder and options give the same bundle, byte for byte; files keep their times.
 ///
 /// Throws Failure kBadInput for what devices could not take (names, lengths, sizes), before
 /// anything is written, and kCannotWrite. An earlier bundle at `out` is only replaced by a complete

@@ -111,6 +111,18 @@ void CheckBundleOptions(const BundleOptions& options) {
     usage("--dest", "\"" + options.destination + "\" is no folder on a device",
           "begin with a backslash, as in '\\Application'");
   }
+  for (const auto& [pattern, folder] : options.destinations) {
+    if (folder == "RAM:") continue;
+    if (folder.empty() || folder.front() != '\\' || folder.find('/') != std::string::npos) {
+      usage("--dest-for", "\"" + folder + "\" is no folder on a device",
+            "give RAM: or a folder, as in '*.nb0=\\'");
+    }
+  }
+  CheckLength("--program", options.program, kMaxPathField);
+  CheckLength("--parameters", options.parameters, kMaxPathField);
+  if (options.program.empty() && !options.parameters.empty()) {
+    usage("--parameters", "are given without a program", "add --program");
+  }
   CheckMasks("--masks", options.masks);
   for (const auto& [pattern, masks] : options.file_masks) CheckMasks("--masks-for", masks);
   in_addr parsed{};
@@ -125,8 +137,19 @@ void CheckBundleOptions(const BundleOptions& options) {
 }
 
 void CheckBundleFile(const BundleFile& file, const std::string& from) {
+  constexpr std::string_view kRam = "RAM:";
+  constexpr std::size_t kMaxRamName = 19;
   CheckPathText(file.source, "the published path", from);
-  CheckPathText(file.destination, "the path on the device", from);
+  if (base::StartsWith(file.destination, kRam)) {
+    const std::string name = file.destination.substr(kRam.size());
+    CheckPathText(name, "the name in the flash store", from);
+    if (name.size() > kMaxRamName) {
+      Refuse(from, "has a name of " + std::to_string(name.size()) + " characters",
+             "the flash store keeps 19; rename the file");
+    }
+  } else {
+    CheckPathText(file.destination, "the path on the device", from);
+  }
   if (file.source.find('\\') != std::string::npos) {
     Refuse(from, "the name holds a backslash", "devices take it for a folder; rename the file");
   }
@@ -150,7 +173,6 @@ void CheckBundleAsAWhole(const Bundle& bundle) {
              "devices take both for one file");
     }
   }
-  if (bundle.files.empty()) Refuse(bundle.name, "there is no file in the folder", "add files");
   if (bundle.total_size > kMaxBytes) {
     Refuse(bundle.name, "the files are larger than 2 GiB together",
            "devices count a job's bytes in 31 bits; divide the bundle");

@@ -18,6 +18,9 @@ struct MakeCommand {
   std::string syslog;
   std::vector<std::string> attributes;
   std::vector<std::string> masks_for;
+  std::vector<std::string> dest_for;
+  std::vector<std::string> firmware;
+  bool no_wait = false;
   std::string multicast;
   std::optional<std::string> private_group;
   MulticastSetup setup;
@@ -51,6 +54,13 @@ void Complete(MakeCommand& command) {
   for (const std::string& rule : command.masks_for) {
     command.options.file_masks.push_back(SplitAt(rule, '='));
   }
+  for (const std::string& rule : command.dest_for) {
+    command.options.destinations.push_back(SplitAt(rule, '='));
+  }
+  for (const std::string& package : command.firmware) {
+    command.options.firmware.push_back(ParseFirmware(package));
+  }
+  command.options.wait = !command.no_wait;
   if (!command.multicast.empty()) {
     MulticastSetup setup = ParseMulticastSetup(command.multicast);
     if (command.private_group) setup.private_group = *command.private_group;
@@ -84,6 +94,39 @@ void AddMulticastOptions(CLI::App& make, MakeCommand& command) {
       ->needs(multicast);
 }
 
+void AddFirmwareOptions(CLI::App& make, MakeCommand& command) {
+  const char* const group = "Firmware, and what follows it";
+  BundleOptions& options = command.options;
+  make.add_option("--dest-for", command.dest_for,
+                  "PATTERN=FOLDER: another folder for the files that match, without their "
+                  "sub-folders, or RAM: for images that are flashed; may be repeated, the first "
+                  "that matches counts")
+      ->allow_extra_args(false)
+      ->group(group);
+  make.add_option("--firmware", command.firmware,
+                  "FILE;KEY=VALUE;...: a package of the configuration file: one image, or the "
+                  "first of several parts, os001.zip. Keys: to (RAM: or a folder), hardware "
+                  "(patterns, divided by commas), flash, pass (1 to 9), cmd, ram, disk; may be "
+                  "repeated")
+      ->allow_extra_args(false)
+      ->group(group);
+  make.add_option("--inf", options.inf,
+                  "an INF file of the configuration; the files that it names lie beside it")
+      ->group(group);
+  make.add_flag("--configuration", options.configuration,
+                "make a configuration file, for devices without a management host, in any case")
+      ->group(group);
+  make.add_option("--program", options.program, "program that the device starts at the end")
+      ->group(group);
+  make.add_option("--parameters", options.parameters, "its command line")->group(group);
+  make.add_flag("--no-wait", command.no_wait, "the device does not wait for its end")->group(group);
+}
+
+std::string ConfiguredText(const Bundle& bundle) {
+  if (!bundle.configured_files) return "";
+  return ", " + std::to_string(*bundle.configured_files) + " more by the configuration file";
+}
+
 std::string AnnouncedText(const Bundle& bundle) {
   if (!bundle.multicast) return "";
   return ", " + std::to_string(AnnouncedFiles(bundle).size()) + " with the list announced on " +
@@ -95,20 +138,32 @@ ExitCode Make(MakeCommand& command) {
   const Bundle bundle = MakeBundle(command.options);
   const std::filesystem::path& out = command.options.out;
   if (command.json) {
-    const nlohmann::ordered_json json{{"event", "made"},
-                                      {"bundle", out.string()},
-                                      {"job", (out / kBundleJob).string()},
-                                      {"files", bundle.files.size()},
-                                      {"bytes", bundle.total_size},
-                                      {"list_crc32", bundle.list.crc32},
-                                      {"announced", AnnouncedFiles(bundle).size()}};
+    nlohmann::ordered_json json{{"event", "made"},
+                                {"bundle", out.string()},
+                                {"job", (out / kBundleJob).string()},
+                                {"files", bundle.files.size()},
+                                {"bytes", bundle.total_size},
+                                {"list_crc32", bundle.list.crc32},
+                                {"announced", AnnouncedFiles(bundle).size()}};
+    if (bundle.files.empty()) json.erase("job");
+    if (bundle.configured_files) {
+      json["configuration"] = (out / kBundleConfiguration).string();
+      json["configured_files"] = *bundle.configured_files;
+    }
     std::cout << json.dump() << std::endl;
     return ExitCode::kOk;
   }
   std::cout << bundle.files.size() << " files, " << FormatBytes(bundle.total_size) << ", for "
             << bundle.address << ":" << bundle.port << AnnouncedText(bundle)
-            << "\n  serve it:  orvenix serve " << out.string() << "\n  run it:    orvenix run "
-            << (out / kBundleJob).string() << " --device DIR" << std::endl;
+            << ConfiguredText(bundle) << "\n  serve it:  orvenix serve " << out.string() << "\n";
+  if (!bundle.files.empty()) {
+    std::cout << "  run it:    orvenix run " << (out / kBundleJob).string() << " --device DIR\n";
+  }
+  if (bundle.configured_files) {
+    std::cout << "  run it:    orvenix run " << (out / kBundleConfiguration).string()
+              << " --mode client --device DIR\n";
+  }
+  std::cout << std::flush;
   return ExitCode::kOk;
 }
 
@@ -146,11 +201,15 @@ void AddBundleVerb(CLI::App& app, Action& action) {
   make->add_option("--syslog", command->syslog, "ADDRESS:PORT that the device logs to");
   make->add_flag("--no-window", command->no_window, "show no progress window on the device");
   AddMulticastOptions(*make, *command);
+  AddFirmwareOptions(*make, *command);
   AddJsonOption(*make, command->json, "print what was made as one JSON object");
   make->footer(
       "Example:\n  orvenix bundle make ./files ./bundle --address 127.0.0.2 --port 8080 \\\n"
       "      --dest '\\Application' --attributes '*.ini=read-only,archive' \\\n"
-      "      --multicast 239.1.1.1:7000 --device-text TQ52 --http-only '*.ini'");
+      "      --multicast 239.1.1.1:7000 --device-text TQ52 --http-only '*.ini'\n"
+      "  orvenix bundle make ./files ./bundle --address 127.0.0.2 \\\n"
+      "      --firmware './os.nb0;to=RAM:;hardware=TQ52*;pass=1' \\\n"
+      "      --firmware './apps001.zip;to=\\SDMMC Disk;pass=2'");
   make->callback([command, &action] { action = [command] { return Make(*command); }; });
 }
 

@@ -4,6 +4,7 @@
 #include <CLI/CLI.hpp>
 #include <functional>
 
+#include "tools/command_line.h"
 #include "tools/exit_codes.h"
 
 namespace tools {
@@ -22,10 +23,5 @@ void AddFleetVerb(CLI::App& app, Action& action);
 
 /// Adds --json, with the verb's own words about what it changes.
 void AddJsonOption(CLI::App& verb, bool& json, const std::string& effect);
-
-/// Reads the command line and does what it says. @return the exit code of the program. Every
-/// failure is one line on the standard error output, and with --json one object on the standard
-/// output as well.
-int RunCommandLine(int argc, char** argv);
 
 }  // namespace tools

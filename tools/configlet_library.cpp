@@ -12,12 +12,6 @@ namespace {
 
 constexpr const char* kLibraryName = "liborvenix.so";
 
-std::filesystem::path UsualPlace() {
-  std::error_code error;
-  const auto program = std::filesystem::read_symlink("/proc/self/exe", error);
-  return program.parent_path().parent_path() / "lib" / kLibraryName;
-}
-
 template <typename Function>
 void Find(void* library, const std::string& file, const char* name, Function& function) {
   void* found = ::dlsym(library, name);
@@ -30,8 +24,15 @@ void Find(void* library, const std::string& file, const char* name, Function& fu
 
 }  // namespace
 
+std::filesystem::path LibraryFolder() {
+  std::error_code error;
+  const auto program = std::filesystem::read_symlink("/proc/self/exe", error);
+  return program.parent_path().parent_path() / "lib";
+}
+
 ConfigletLibrary LoadConfiglet(const std::filesystem::path& file) {
-  const std::string path = (file.empty() ? UsualPlace() : std::filesystem::absolute(file)).string();
+  const std::string path =
+      (file.empty() ? LibraryFolder() / kLibraryName : std::filesystem::absolute(file)).string();
   void* library = ::dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
   if (library == nullptr) {
     const char* reason = ::dlerror();

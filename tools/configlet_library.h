@@ -23,4 +23,7 @@ struct ConfigletLibrary {
 /// Failure kBadInput.
 [[nodiscard]] ConfigletLibrary LoadConfiglet(const std::filesystem::path& file);
 
+/// The folder lib/ beside the folder of this program.
+[[nodiscard]] std::filesystem::path LibraryFolder();
+
 }  // namespace tools

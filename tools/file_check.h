@@ -6,9 +6,13 @@
 #include <vector>
 
 #include "tools/job_file.h"
+#include "tools/lint/device_job.h"
 
+namespace server {
+class Site;
+}
 namespace sim {
-class Storage;
+class Device;
 }
 
 namespace tools {
@@ -17,7 +21,8 @@ enum class FileState : std::uint8_t {
   kRight,
   kWrong,  ///< another CRC or size than the list says
   kMissing,
-  kUnchecked,  ///< the list gives no CRC, so devices leave the file alone
+  kUnchecked,  ///< there is nothing to compare it with
+  kRemoved,    ///< a loader image for another chip, which the device has deleted
 };
 
 struct CheckedFile {
@@ -35,8 +40,14 @@ struct FileCheck {
 [[nodiscard]] const char* NameOf(FileState state);
 
 /// Reads the list file that `job` brings to the device, and looks at every file in it that is meant
-/// for a device with this configuration text. A job without a list file has nothing to check.
-[[nodiscard]] FileCheck CheckFiles(sim::Storage& storage, const Job& job,
-                                   const std::string& configuration);
+/// for this device. What goes to "RAM:" must have been flashed. A job without a list file has
+/// nothing to check.
+[[nodiscard]] FileCheck CheckFiles(sim::Device& device, const Job& job);
+
+/// The same for a configuration file, after this pass of the job: packages for the device, what its
+/// INF file names, and downloads. They are compared with what is served.
+/// @param site  the served folder; null: files only have to be there
+[[nodiscard]] FileCheck CheckConfiguredFiles(sim::Device& device, const DeviceJob& job, int pass,
+                                             server::Site* site);
 
 }  // namespace tools

@@ -89,4 +89,10 @@ nlohmann::ordered_json MessageMembers(const Message& message) {
   return members;
 }
 
+bool IsFailure(const Message& message) {
+  constexpr std::uint32_t kUpgradeFailed = 205180;
+  const auto event = ReadEvent(message.document);
+  return event && NumberIn<std::uint32_t>(FieldOf(*event, "msgNum")) == kUpgradeFailed;
+}
+
 }  // namespace tools

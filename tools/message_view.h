@@ -21,4 +21,7 @@ struct Message {
 /// "unique_id" and "detail".
 [[nodiscard]] nlohmann::ordered_json MessageMembers(const Message& message);
 
+/// Whether it is the device event of a failed upgrade.
+[[nodiscard]] bool IsFailure(const Message& message);
+
 }  // namespace tools

@@ -147,6 +147,20 @@ std::string Plural(std::size_t count, const char* what) {
   return std::to_string(count) + " " + what + (count == 1 ? "" : "s");
 }
 
+/// What went wrong at the server itself, a line each.
+std::string ServerTroubles(const server::MulticastFigures& figures) {
+  std::string text;
+  if (figures.refused > 0) {
+    text += "  " + Plural(figures.refused, "datagram") +
+            " of these did not go out: the system refused to send\n";
+  }
+  if (figures.not_stored > 0) {
+    text += "  the session file could not be written " + Plural(figures.not_stored, "time") +
+            ": a server that is started again knows less\n";
+  }
+  return text;
+}
+
 }  // namespace
 
 nlohmann::ordered_json ToJson(const server::MulticastFigures& figures) {
@@ -216,6 +230,7 @@ std::string FormatMulticast(const server::MulticastFigures& figures, std::size_t
                  file->devices.size(), expected == 0 ? "?" : std::to_string(expected).c_str(),
                  file->window, FormatRate(std::max<std::uint64_t>(measured, 1)).c_str(),
                  FormatRate(figures.rate).c_str(), RepairPercent(*file));
+  text += ServerTroubles(figures);
   text += Format("%-21s %-9s %-11s %6s %10s %6s %8s  %s\n", "DEVICE", "STATE", "ROLE", "LOSS",
                  "ROUND TRIP", "NAKS", "OVERRUNS", "LAST HEARD");
   const auto devices = InOrder(*file);
@@ -283,14 +298,7 @@ std::string FormatMulticastReport(const server::MulticastFigures& figures) {
                      device.last_heard.c_str());
     }
   }
-  if (figures.refused > 0) {
-    text += "  " + Plural(figures.refused, "datagram") +
-            " of these did not go out: the system refused to send\n";
-  }
-  if (figures.not_stored > 0) {
-    text += "  the session file could not be written " + Plural(figures.not_stored, "time") +
-            ": a server that is started again knows less\n";
-  }
+  text += ServerTroubles(figures);
   return Format("multicast: %zu of %zu transfers proven, %llu frames sent, %llu of them repairs\n",
                 proven, joined, static_cast<unsigned long long>(figures.frames_sent),
                 static_cast<unsigned long long>(repairs)) +

@@ -1,32 +1,42 @@
 #include "tools/run.h"
 
+#include <sys/prctl.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <atomic>
+#include <cerrno>
 #include <chrono>
+#include <csignal>
+#include <iostream>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <stdexcept>
+#include <system_error>
 #include <thread>
+#include <tuple>
 
+#include "base/number.h"
 #include "device/device.h"
+#include "driver/drivers.h"
 #include "kernel/kernel.h"
 #include "library/management_queue.h"
 #include "net/network.h"
 #include "process/processes.h"
 #include "server/capture.h"
 #include "storage/storage.h"
-#include "text/names.h"
-#include "tools/configlet_library.h"
 #include "tools/device_folder.h"
-#include "tools/device_table.h"
 #include "tools/failure.h"
 #include "tools/file_check.h"
 #include "tools/file_text.h"
-#include "tools/job_file.h"
-#include "tools/job_walk.h"
+#include "tools/lint/device_configuration.h"
 #include "tools/lint/lint.h"
 #include "tools/multicast_watch.h"
 #include "tools/run_view.h"
+#include "tools/upgrade.h"
+#include "window/image.h"
 #include "window/screen.h"
 #include "world/world.h"
 
@@ -39,6 +49,7 @@ using Clock = std::chrono::steady_clock;
 constexpr std::chrono::milliseconds kPoll{50};
 constexpr const char* kInProgressEvent = "TW_UPGRADE_IN_PROGRESS";
 constexpr const char16_t* kTransferLog = u"\\FileXfer.log";
+constexpr const char* kPassFile = "kvoupgclnt.txt";  ///< the device notes the last pass there
 
 RunView::Style StyleOf(const RunOptions& options) {
   if (options.json) return RunView::Style::kJson;
@@ -49,44 +60,53 @@ RunView::Style StyleOf(const RunOptions& options) {
 struct Outcome {
   ExitCode code = ExitCode::kOk;
   bool ended = false;
+  bool failed = false;     ///< the device has told so
+  bool restarted = false;  ///< the device's flash asked for it
   double seconds = 0;
   FileCheck check;
 };
 
+std::unique_ptr<Upgrade> MakeUpgrade(const RunOptions& options, RunView& view) {
+  return options.mode == RunMode::kClient ? MakeClientUpgrade(options, view)
+                                          : MakeConfigletUpgrade(options, view);
+}
+
+/// The file, or one of this start's own.
+fs::path OfThisStart(const RunOptions& options, const fs::path& path) {
+  if (path.empty() || !options.again) return path;
+  return path.string() + ".pass" + std::to_string(options.pass);
+}
+
+/// One start of the device.
 class UpgradeRun {
  public:
   explicit UpgradeRun(const RunOptions& options)
       : options_(options),
-        job_(ReadJob(options.job)),
+        view_(StyleOf(options), options.events, options.again),
+        upgrade_(MakeUpgrade(options, view_)),
         profile_(ReadDeviceFolder(options.device)),
-        configlet_(LoadConfiglet(options.library)),
-        view_(StyleOf(options), options.events),
         world_(sim::World::MakeReal()),
         device_(MakeDevice()) {
-    callbacks_.set_data = &TakeDocument;
+    device_->kernel().ShortenSleeps(options.hurry);
   }
 
   ExitCode Run() {
     if (!options_.force) RefuseBadJob();
     const sim::AttachedThread host(*device_, "host");
     Watch();
-    view_.ShowEvent({{"event", "started"},
-                     {"job", options_.job.string()},
-                     {"device", options_.device.string()}});
-    configlet_.initialize();
-    if (options_.callbacks) {
-      configlet_.set_callbacks(reinterpret_cast<std::uintptr_t>(&view_), &callbacks_);
-    }
+    TellStart();
     ShowProcesses();
-    Walk();
+    Start();
     Outcome outcome;
     outcome.ended = WaitForEnd();
-    configlet_.uninitialize();
+    outcome.restarted = device_->drivers().restart_requested();
+    upgrade_->Finish();
     device_->network().ListenToDatagrams({});
     ShowMulticast();
     ShowProcesses();
     outcome.seconds = Seconds();
-    outcome.check = CheckFiles(device_->storage(), job_, profile_.configuration);
+    outcome.failed = failed_;
+    outcome.check = upgrade_->Check(*device_);
     Judge(outcome);
     device_->screen().OnPaint({});
     view_.EndUpgrade();
@@ -98,10 +118,22 @@ class UpgradeRun {
  private:
   void RefuseBadJob() {
     const std::string name = options_.job.string();
-    const Findings findings = LintJob(job_, name);
+    const Findings findings = upgrade_->Lint();
     if (findings.Count(Level::kError) == 0) return;
     view_.ShowEvent(FindingsJson(name, findings));
     RefuseErrors(name, findings, "see 'orvenix job lint', or run it all the same with --force");
+  }
+
+  void TellStart() {
+    nlohmann::ordered_json event{
+        {"event", "started"}, {"job", options_.job.string()}, {"device", options_.device.string()}};
+    if (options_.passes > 1) {
+      event["pass"] = options_.pass;
+      event["passes"] = options_.passes;
+      view_.ShowRemark("pass " + std::to_string(options_.pass) + " of " +
+                       std::to_string(options_.passes));
+    }
+    view_.ShowEvent(event);
   }
 
   std::unique_ptr<sim::Device> MakeDevice() {
@@ -112,14 +144,6 @@ class UpgradeRun {
     }
   }
 
-  static int TakeDocument(std::uintptr_t context, const char* text, std::int32_t length,
-                          const IcfgCallbacks*) {
-    if (text == nullptr || length <= 0) return 0;
-    reinterpret_cast<RunView*>(context)->ShowMessage(
-        {"host", std::string(text, static_cast<std::size_t>(length - 1))});
-    return 0;
-  }
-
   void Watch() {
     if (!options_.pcap.empty()) OpenCapture();
     device_->network().ListenToDatagrams([this](const sim::SeenDatagram& datagram) {
@@ -128,22 +152,26 @@ class UpgradeRun {
     });
     device_->messages().Listen([this](const sim::QueuedMessage& message) {
       const std::string at = message.master.empty() ? "" : "@" + message.master;
-      view_.ShowMessage({message.destination + at, message.text});
+      const Message shown{message.destination + at, message.text};
+      failed_ = failed_ || IsFailure(shown);
+      view_.ShowMessage(shown);
     });
     sim::Screen& screen = device_->screen();
-    if (!options_.screens.empty()) screen.SavePaints(options_.screens);
+    if (!options_.screens.empty()) screen.SavePaints(OfThisStart(options_, options_.screens));
     screen.OnPaint([this, &screen](const sim::FinishedPaint&) {
       const auto view = sim::ReadProgress(screen);
       if (!view) return;
       view_.ShowProgress(*view);
-      std::string ignored;  // a screen that cannot be kept spoils no upgrade
-      static_cast<void>(screen.SavePng(options_.device / kDeviceScreen, ignored));
+      // Written at the end: a picture a paint would keep the device busy.
+      sim::Image picture = screen.Snapshot();
+      const std::lock_guard<std::mutex> hold(picture_mutex_);
+      picture_ = std::move(picture);
     });
   }
 
   void OpenCapture() {
     try {
-      capture_.emplace(options_.pcap);
+      capture_.emplace(OfThisStart(options_, options_.pcap));
     } catch (const std::runtime_error& error) {
       throw Failure(ExitCode::kCannotWrite, options_.pcap.string(), error.what(),
                     "is the folder there and writable?");
@@ -157,10 +185,9 @@ class UpgradeRun {
                   peer(datagram.to), datagram.bytes);
   }
 
-  void Walk() {
+  void Start() {
     try {
-      WalkJob(configlet_, job_, options_.job.string(),
-              [this](const WalkedCall& call) { ShowCall(call); });
+      upgrade_->Start(*device_);
     } catch (const Failure&) {
       ShowProcesses();  // a refused job may have stopped some
       throw;
@@ -174,20 +201,14 @@ class UpgradeRun {
     view_.ShowEvent({{"event", "processes"}, {"names", names}});
   }
 
-  void ShowCall(const WalkedCall& call) {
-    nlohmann::ordered_json event{
-        {"event", "call"}, {"function", call.function}, {"name", call.name}};
-    if (!call.value.empty()) event["value"] = call.value;
-    event["result"] = call.result;
-    view_.ShowEvent(event);
-  }
-
   [[nodiscard]] double Seconds() const {
     return std::chrono::duration<double>(Clock::now() - start_).count();
   }
 
-  /// The upgrade's event is gone and its threads have ended: only the host is left.
+  /// The upgrade's event is gone and its threads have ended, so that only the host is left; or the
+  /// device goes no further without a restart.
   [[nodiscard]] bool Ended() const {
+    if (device_->drivers().restart_requested()) return true;
     if (device_->kernel().LiveThreads() > 1) return false;
     for (const std::string& name : device_->kernel().NamedObjects()) {
       if (name == kInProgressEvent) return false;
@@ -221,15 +242,24 @@ class UpgradeRun {
   void Judge(Outcome& outcome) const {
     if (!outcome.ended) {
       outcome.code = ServerWasReached() ? ExitCode::kTimeout : ExitCode::kUnreachable;
+    } else if (outcome.failed) {
+      outcome.code = ExitCode::kTestFailed;
     } else if (!outcome.check.list_found || !outcome.check.all_right()) {
       outcome.code = ExitCode::kFilesWrong;
     }
   }
 
   /// Keeps what the screen said last, for `orvenix device screen`.
-  void KeepScreen() const {
+  void KeepScreen() {
     const auto last = view_.last();
     if (!last) return;
+    std::string ignored;  // a screen that cannot be kept spoils no upgrade
+    {
+      const std::lock_guard<std::mutex> hold(picture_mutex_);
+      if (picture_) {
+        static_cast<void>(WritePng(*picture_, options_.device / kDeviceScreen, ignored));
+      }
+    }
     nlohmann::ordered_json json{{"lines", last->status_lines}};
     if (last->overall) json["overall"] = Percent(*last->overall);
     if (last->file) json["file"] = Percent(*last->file);
@@ -244,12 +274,18 @@ class UpgradeRun {
                                  {"outcome", row.name},
                                  {"code", static_cast<int>(row.code)},
                                  {"seconds", outcome.seconds},
+                                 {"restarted", outcome.restarted},
                                  {"list_found", outcome.check.list_found},
                                  {"paints", device_->screen().finished_paints()}};
     const ReceptionTotals received = multicast_.totals();
     event["multicast"] = {
         {"files", received.files}, {"blocks", received.blocks}, {"twice", received.twice}};
     event["datagrams_lost"] = device_->network().datagrams_lost();
+    event["launched"] = nlohmann::ordered_json::array();
+    for (const auto& launch : device_->processes().Launches()) {
+      event["launched"].push_back(
+          {{"program", launch.program}, {"command_line", launch.command_line}});
+    }
     event["files"] = nlohmann::ordered_json::array();
     std::size_t right = 0;
     for (const CheckedFile& file : outcome.check.files) {
@@ -260,8 +296,14 @@ class UpgradeRun {
       }
     }
     view_.ShowEvent(event);
+    if (outcome.code == ExitCode::kOk && options_.pass < options_.passes) {
+      view_.ShowEvent({{"event", "restart"},
+                       {"cause", outcome.restarted ? "flash" : "next pass"},
+                       {"pass", options_.pass + 1}});
+    }
     char seconds[32];
     std::snprintf(seconds, sizeof seconds, "%.1f", outcome.seconds);
+    if (outcome.restarted) view_.ShowRemark("the device's flash has restarted it");
     view_.ShowRemark(std::string(row.name) + ": " + std::to_string(right) + " of " +
                      std::to_string(outcome.check.files.size()) + " files right after " + seconds +
                      " s");
@@ -275,27 +317,81 @@ class UpgradeRun {
       const auto log = device_->storage().HostPath(kTransferLog);
       return "see its log: orvenix explain " + (log ? *log : options_.device).string();
     }
-    return "is the server running at " + FindField(job_, "HTTPServer", "BaseURL") + ":" +
-           FindField(job_, "HTTPServer", "HTTPPort") + "?";
+    return "is the server running at " + upgrade_->Server() + "?";
   }
 
   const RunOptions options_;
-  const Job job_;
+  RunView view_;  // the device's threads use these to their end
+  std::unique_ptr<Upgrade> upgrade_;
   const sim::Profile profile_;
-  const ConfigletLibrary configlet_;
-  IcfgCallbacks callbacks_{};
-  RunView view_;  // the device's threads use these three to their end
   MulticastWatch multicast_;
   std::optional<server::CaptureFile> capture_;
+  std::mutex picture_mutex_;
+  std::optional<sim::Image> picture_;  ///< of the screen as it was painted last
+  std::atomic<bool> failed_{false};
   std::unique_ptr<sim::World> world_;
   std::unique_ptr<sim::Device> device_;
   const Clock::time_point start_ = Clock::now();
 };
 
+/// The pass that the device has noted, 0 when it has none.
+int NotedPass(const fs::path& device) {
+  for (const char* folder : {"storage/Flash File Store", "storage"}) {
+    const fs::path file = device / folder / kPassFile;
+    std::error_code error;
+    if (!fs::is_regular_file(file, error)) continue;
+    return static_cast<int>(base::LeadingNumber(ReadWholeFile(file)));
+  }
+  return 0;
+}
+
+/// The first pass that this device is still to run, and the last one of the job.
+std::pair<int, int> PassesOf(const RunOptions& options) {
+  Findings unused;
+  const std::string text = ReadWholeFile(options.job);
+  const DeviceJob job = ReadConfiguration(text, options.job.string(), unused);
+  const auto packages = PackagesFor(job, ReadDeviceFolder(options.device).configuration);
+  return {IsMultiPass(packages) ? NotedPass(options.device) + 1 : 1, LastPass(packages)};
+}
+
+/// Runs one start in a process of its own. @return the program's exit code in this process; in the
+/// new one the code of the start.
+ExitCode RunApart(const RunOptions& options) {
+  std::cout << std::flush;
+  const pid_t parent = ::getpid();
+  const pid_t child = ::fork();
+  if (child < 0) throw std::system_error(errno, std::generic_category(), "no further process");
+  if (child == 0) {
+    // Whoever ends this program ends the device too.
+    if (::prctl(PR_SET_PDEATHSIG, SIGKILL) != 0 || ::getppid() != parent) ::_exit(1);
+    return UpgradeRun(options).Run();
+  }
+  int status = 0;
+  while (::waitpid(child, &status, 0) < 0 && errno == EINTR) {
+  }
+  if (!WIFEXITED(status)) {
+    throw Failure(ExitCode::kInternal, options.device.string(),
+                  "the device's process was ended by signal " + std::to_string(WTERMSIG(status)));
+  }
+  return static_cast<ExitCode>(WEXITSTATUS(status));
+}
+
 }  // namespace
 
 ExitCode Run(const RunOptions& options) {
-  return UpgradeRun(options).Run();
+  if (options.mode == RunMode::kConfiglet) return UpgradeRun(options).Run();
+  const Clock::time_point begin = Clock::now();
+  RunOptions start = options;
+  std::tie(start.pass, start.passes) = PassesOf(options);
+  if (start.pass >= start.passes) return UpgradeRun(start).Run();
+  const pid_t self = ::getpid();
+  for (;; ++start.pass, start.again = true) {
+    const auto passed = std::chrono::duration_cast<std::chrono::seconds>(Clock::now() - begin);
+    const auto left = static_cast<std::int64_t>(options.timeout_s) - passed.count();
+    start.timeout_s = static_cast<std::uint32_t>(std::max<std::int64_t>(left, 0));
+    const ExitCode code = RunApart(start);
+    if (::getpid() != self || code != ExitCode::kOk || start.pass >= start.passes) return code;
+  }
 }
 
 }  // namespace tools

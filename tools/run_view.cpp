@@ -55,9 +55,9 @@ std::string FormatBar(const sim::BarView& bar, int width) {
   return text + std::string(4 - number.size(), ' ') + number + "%";
 }
 
-RunView::RunView(Style style, const std::filesystem::path& record) : style_(style) {
+RunView::RunView(Style style, const std::filesystem::path& record, bool append) : style_(style) {
   if (record.empty()) return;
-  record_.open(record, std::ios::binary | std::ios::trunc);
+  record_.open(record, std::ios::binary | (append ? std::ios::app : std::ios::trunc));
   if (!record_) {
     throw Failure(ExitCode::kCannotWrite, record.string(), "cannot be written",
                   "is the folder there and writable?");

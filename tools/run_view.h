@@ -33,8 +33,9 @@ class RunView {
   enum class Style : std::uint8_t { kTerminal, kPlain, kJson };
 
   /// @param record  file that gets every event as JSON does, whatever the style; empty: none
+  /// @param append  it goes on behind what is there
   /// Throws Failure kCannotWrite.
-  explicit RunView(Style style, const std::filesystem::path& record = {});
+  explicit RunView(Style style, const std::filesystem::path& record = {}, bool append = false);
   /// Ends the line of the bars.
   ~RunView();
   RunView(const RunView&) = delete;

@@ -33,7 +33,8 @@ constexpr std::size_t kTableRows = 30;
 /// What is to be served, and what its bundle says about where.
 struct Source {
   fs::path root;
-  fs::path job;  ///< of a bundle that has one
+  fs::path job;            ///< of a bundle that has one
+  fs::path configuration;  ///< the same
   std::string address = "127.0.0.1";
   std::uint16_t port = 8080;
   std::optional<Bundle> bundle;  ///< none: any folder of files
@@ -58,6 +59,9 @@ Source FindSource(const fs::path& named) {
   source.bundle = ReadBundle(folder);
   source.root = folder / kBundleTree;
   if (fs::exists(folder / kBundleJob)) source.job = folder / kBundleJob;
+  if (fs::exists(folder / kBundleConfiguration)) {
+    source.configuration = folder / kBundleConfiguration;
+  }
   source.address = source.bundle->address;
   source.port = source.bundle->port;
   return source;
@@ -88,6 +92,7 @@ class ServeRun {
     if (source_.bundle) SetAttributes(*source_.bundle);
     inventory_ = site_.Warm();
     if (!options_.force && !source_.job.empty()) RefuseBadJob();
+    if (!options_.force && !source_.configuration.empty()) RefuseBadConfiguration();
     server::RaiseDescriptorLimit();
     ledger_.SetListener([this](const server::Event& event) { OnEvent(event); });
     Listen();
@@ -113,7 +118,13 @@ class ServeRun {
   /// After Warm(), so that no file is read twice for its checksum.
   void RefuseBadJob() {
     const std::string name = source_.job.string();
-    const Findings findings = LintJob(ReadJob(source_.job), name, &site_);
+    Refuse(name, LintJob(ReadJob(source_.job), name, &site_));
+  }
+  void RefuseBadConfiguration() {
+    const std::string name = source_.configuration.string();
+    Refuse(name, LintConfiguration(ReadWholeFile(source_.configuration), name, &site_));
+  }
+  void Refuse(const std::string& name, const Findings& findings) const {
     if (options_.json && findings.Count(Level::kError) > 0) Print(FindingsJson(name, findings));
     RefuseErrors(name, findings, "see 'orvenix job lint', or serve it all the same with --force");
   }

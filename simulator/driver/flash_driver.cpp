@@ -87,6 +87,10 @@ FlashDriver::~FlashDriver() {
   device_.memory().ram().Release(capacity_);
 }
 
+std::filesystem::path FlashDriver::ImageFile(const Device& device, std::string_view name) {
+  return device.folder() / "flash" / HostName(name);
+}
+
 std::map<std::string, FlashDriver::File> FlashDriver::Files() const {
   const Hold hold(mutex_);
   return files_;
@@ -241,7 +245,7 @@ bool FlashDriver::WriteFlash() const {
   std::filesystem::create_directories(folder, error);
   std::ofstream record(device_.folder() / "flash.record", std::ios::app);
   for (const auto& [name, file] : files_) {
-    std::ofstream image(folder / HostName(name), std::ios::binary | std::ios::trunc);
+    std::ofstream image(ImageFile(device_, name), std::ios::binary | std::ios::trunc);
     image.write(reinterpret_cast<const char*>(file.content.data()), file.written);
     image.close();
     std::string line = R"({"us":)" + std::to_string(device_.world().now().count()) + R"(,"name":)";

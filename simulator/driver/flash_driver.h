@@ -5,9 +5,11 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <filesystem>
 #include <map>
 #include <mutex>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "driver/drivers.h"
@@ -49,6 +51,8 @@ class FlashDriver final : public StreamDriver {
     std::vector<std::uint8_t> content;  ///< as large as the file may become
     std::uint32_t written = 0;          ///< where what was written ends
   };
+  /// Where an image of this name lies once it is flashed.
+  [[nodiscard]] static std::filesystem::path ImageFile(const Device& device, std::string_view name);
   /// A copy of the store.
   [[nodiscard]] std::map<std::string, File> Files() const;
 

@@ -8,7 +8,7 @@
 #include "device/local_memory.h"
 #include "report/log/log.h"
 #include "upgrade_config/list_keeper.h"
-#include "upgrade_config/package_selection.h"
+#include "upgrade_config/selection/package_selection.h"
 
 namespace orvenix {
 namespace {

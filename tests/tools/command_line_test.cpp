@@ -46,7 +46,7 @@ TEST_F(CommandLineTest, HasTheExitCodesThatItsDocumentLists) {
 TEST_F(CommandLineTest, ShowsAnExampleForEveryVerb) {
   for (const char* verb : {"bundle make", "job lint", "serve", "device new", "device show",
                            "device screen", "run", "explain", "fleet"}) {
-    const Ended help = Run(std::string(verb) + " --help");
+    const Ended help = Call(std::string(verb) + " --help");
     EXPECT_EQ(help.code, 0) << verb;
     EXPECT_THAT(help.output, HasSubstr("Example:\n  orvenix " + std::string(verb))) << verb;
     EXPECT_THAT(help.output, HasSubstr("--json")) << verb;
@@ -68,7 +68,7 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
       {"serve . --wings", ExitCode::kUsage, "--wings"},
       {"bundle make nowhere out", ExitCode::kBadInput, "nowhere: is not a folder"},
       {"serve nowhere", ExitCode::kBadInput, "nowhere: there is no such bundle"},
-      {"serve errors.txt", ExitCode::kBadInput, "errors.txt: does not belong to a bundle"},
+      {"serve empty.txt", ExitCode::kBadInput, "empty.txt: does not belong to a bundle"},
       {"serve . --address 203.0.113.1 --port 8080", ExitCode::kCannotListen, "203.0.113.1:8080: "},
       {"device", ExitCode::kUsage, "subcommand is required"},
       {"device new . --set width=3", ExitCode::kCannotWrite, ".: is there already"},
@@ -79,19 +79,19 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
       {"device show nowhere", ExitCode::kBadInput, "nowhere: is not a device"},
       {"device screen nowhere", ExitCode::kBadInput, "nowhere: is not a device"},
       {"run nowhere.xml --device d", ExitCode::kBadInput, "nowhere.xml: there is no such file"},
-      {"run errors.txt --device d", ExitCode::kBadInput, "errors.txt:1: not well-formed XML"},
+      {"run empty.txt --device d", ExitCode::kBadInput, "empty.txt:1: not well-formed XML"},
       {"run nowhere.xml", ExitCode::kUsage, "--device is required"},
       {"job", ExitCode::kUsage, "subcommand is required"},
       {"job lint nowhere.xml", ExitCode::kBadInput, "nowhere.xml: there is no such file"},
       {"job lint .", ExitCode::kBadInput, ".: there is no job.xml in the folder"},
-      {"job lint errors.txt", ExitCode::kBadInput, "errors.txt:1: not well-formed XML"},
-      {"job lint errors.txt --bundle nowhere", ExitCode::kBadInput,
+      {"job lint empty.txt", ExitCode::kBadInput, "empty.txt:1: not well-formed XML"},
+      {"job lint empty.txt --bundle nowhere", ExitCode::kBadInput,
        "nowhere: there is no such bundle"},
       {"explain", ExitCode::kUsage, "WHAT is required"},
       {"explain 4000000000", ExitCode::kBadInput, "the system has no such number"},
       {"explain nonsense", ExitCode::kBadInput, "is no file, no number and no text of the system"},
       {"explain ./nowhere.log", ExitCode::kBadInput, "./nowhere.log: there is no such file"},
-      {"explain errors.txt", ExitCode::kBadInput, "errors.txt: holds no line of this system"},
+      {"explain empty.txt", ExitCode::kBadInput, "empty.txt: holds no line of this system"},
       {"serve . --address elsewhere", ExitCode::kCannotListen, "elsewhere:8080: "},
       {"serve . --expect 3 --address 127.0.0.2 --port 0", ExitCode::kUsage,
        "multicast: the bundle is not made for it; make it with 'orvenix bundle make"},
@@ -102,7 +102,7 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
       {"run nowhere.xml --device d --pcap no/folder", ExitCode::kBadInput, "nowhere.xml"},
   };
   for (const MistakeCase& c : kCases) {
-    const Ended ended = Run(c.words);
+    const Ended ended = Call(c.words);
     EXPECT_EQ(ended.code, static_cast<int>(c.code)) << c.words;
     EXPECT_THAT(ended.errors, HasSubstr(c.complaint)) << c.words;
     EXPECT_THAT(ended.errors, StartsWith("orvenix: ")) << c.words;
@@ -111,7 +111,7 @@ TEST_F(CommandLineTest, AnswersAMistakeWithOneLineAndItsCode) {
 }
 
 TEST_F(CommandLineTest, SaysAMistakeInJsonToo) {
-  const Ended ended = Run("bundle make nowhere out --json");
+  const Ended ended = Call("bundle make nowhere out --json");
 
   const auto json = nlohmann::json::parse(ended.output);
   EXPECT_EQ(json.at("event"), "error");
@@ -123,7 +123,7 @@ TEST_F(CommandLineTest, SaysAMistakeInJsonToo) {
 TEST_F(CommandLineTest, MakesABundle) {
   scratch_.Write("files/with blank.txt", "12345");
 
-  const Ended ended = Run("bundle make files out --attributes '*.txt=read-only' --json");
+  const Ended ended = Call("bundle make files out --attributes '*.txt=read-only' --json");
 
   EXPECT_EQ(ended.code, 0) << ended.errors;
   const auto json = nlohmann::json::parse(ended.output);
@@ -134,75 +134,84 @@ TEST_F(CommandLineTest, MakesABundle) {
 
 TEST_F(CommandLineTest, RefusesAMulticastThatCannotWorkFromHere) {
   scratch_.Write("files/a.txt", "12345");
-  ASSERT_EQ(Run("bundle make files out --multicast 239.1.1.1:7000").code, 0);
+  ASSERT_EQ(Call("bundle make files out --multicast 239.1.1.1:7000").code, 0);
   const std::string serve = "serve out --address 127.0.0.2 --port 0 ";
 
-  const Ended interface = Run(serve + "--interface wlan17");
+  const Ended interface = Call(serve + "--interface wlan17");
   EXPECT_EQ(interface.code, static_cast<int>(ExitCode::kCannotListen));
   EXPECT_THAT(interface.errors, HasSubstr("no interface \"wlan17\"; choose one of 127.0.0.1 (lo)"));
-  const Ended rate = Run(serve + "--rate fast");
+  const Ended rate = Call(serve + "--rate fast");
   EXPECT_EQ(rate.code, static_cast<int>(ExitCode::kUsage));
   EXPECT_THAT(rate.errors, HasSubstr("\"fast\" is no rate; give bits per second as 800k"));
   scratch_.Write("out/tree/bundle/a.txt", "");
   std::filesystem::remove(scratch_.path() / "out/tree/bundle/a.txt");
-  const Ended gone = Run(serve + "--force");
+  const Ended gone = Call(serve + "--force");
   EXPECT_EQ(gone.code, static_cast<int>(ExitCode::kBadInput));
   EXPECT_THAT(gone.errors, HasSubstr("a.txt: No such file or directory; make the bundle anew"));
 }
 
 TEST_F(CommandLineTest, ChecksABundleBeforeItIsSent) {
   scratch_.Write("files/a.txt", "12345");
-  ASSERT_EQ(Run("bundle make files out").code, 0);
+  ASSERT_EQ(Call("bundle make files out").code, 0);
 
-  const Ended good = Run("job lint out");
+  const Ended good = Call("job lint out");
   EXPECT_EQ(good.code, 0) << good.errors;
   EXPECT_EQ(good.output, "out/job.xml: nothing found\n");
 
   scratch_.Write("out/tree/bundle/a.txt", "54321");
-  const Ended bad = Run("job lint out/job.xml --json");
+  const Ended bad = Call("job lint out/job.xml --json");
   EXPECT_EQ(bad.code, 3);
   EXPECT_THAT(bad.errors, HasSubstr("out/job.xml: 1 error in the job: file-crc; mend them"));
   const auto json = nlohmann::json::parse(bad.output.substr(0, bad.output.find('\n')));
   EXPECT_EQ(json.at("event"), "linted");
   EXPECT_EQ(json.at("findings").at(0).at("where"), "bundle.lst:1");
 
-  EXPECT_EQ(Run("job lint out/job.xml --bundle out").code, 3);
+  EXPECT_EQ(Call("job lint out/job.xml --bundle out").code, 3);
   scratch_.Write("alone.xml", ReadWholeFile(scratch_.path() / "out/job.xml"));
-  EXPECT_EQ(Run("job lint alone.xml").code, 0) << "there is no server to look at";
-  EXPECT_EQ(Run("job lint alone.xml --bundle out/tree").code, 3);
-  EXPECT_THAT(Run("serve out").errors, HasSubstr("serve it all the same with --force"));
+  EXPECT_EQ(Call("job lint alone.xml").code, 0) << "there is no server to look at";
+  EXPECT_EQ(Call("job lint alone.xml --bundle out/tree").code, 3);
+  EXPECT_THAT(Call("serve out").errors, HasSubstr("serve it all the same with --force"));
 }
 
 TEST_F(CommandLineTest, ExplainsCodesTextsAndLogs) {
-  const Ended code = Run("explain 0xC4111002");
+  const Ended code = Call("explain 0xC4111002");
   EXPECT_EQ(code.code, 0) << code.errors;
   EXPECT_EQ(
       code.output,
       "3289452546 = 0xC4111002 = -1005514750\n\nresult  no-space\n"
       "  the last storage requirement of the job is not met, or the job has none\n"
       "  remedy: make room on the device, lower RequiredSpace, or add a storage requirement\n");
-  EXPECT_EQ(Run("explain -- -1005514750").output, code.output);
+  EXPECT_EQ(Call("explain -- -1005514750").output, code.output);
   EXPECT_EQ(
-      nlohmann::json::parse(Run("explain 10061 --json").output).at("meanings").at(0).at("name"),
+      nlohmann::json::parse(Call("explain 10061 --json").output).at("meanings").at(0).at("name"),
       "WSAECONNREFUSED");
 
-  const Ended text = Run("explain 'Orvenix - CSocketIO::Connect - Error !10061%'");
+  const Ended text = Call("explain 'Orvenix - CSocketIO::Connect - Error !10061%'");
   EXPECT_THAT(text.output, HasSubstr("WSAECONNREFUSED: no server listens"));
-  EXPECT_THAT(Run("explain 'No MCT on device'").output, HasSubstr("a line of the screen"));
-  EXPECT_EQ(nlohmann::json::parse(Run("explain 'Orvenix - good CRC' --json").output).at("where"),
+  EXPECT_THAT(Call("explain 'No MCT on device'").output, HasSubstr("a line of the screen"));
+  EXPECT_EQ(nlohmann::json::parse(Call("explain 'Orvenix - good CRC' --json").output).at("where"),
             "log");
 
   scratch_.Write("log", "Orvenix thread - Started\r\nOrvenix - UpgradeThread - Exiting\r\n");
-  EXPECT_THAT(Run("explain log").output, HasSubstr("outcome  complete"));
-  EXPECT_EQ(nlohmann::json::parse(Run("explain log --json").output).at("outcome"), "complete");
-  EXPECT_EQ(Run("explain log --job 2").code, 3);
+  EXPECT_THAT(Call("explain log").output, HasSubstr("outcome  complete"));
+  EXPECT_EQ(nlohmann::json::parse(Call("explain log --json").output).at("outcome"), "complete");
+  EXPECT_EQ(Call("explain log --job 2").code, 3);
+
+  scratch_.Write("mcast.log",
+                 "Command line parsed and multicast client instantiated\n"
+                 "Client configured NOT to load!\n");
+  EXPECT_THAT(Call("explain mcast.log").output,
+              HasSubstr("outcome  switched-off\n         the registry forbids the client"));
+  EXPECT_EQ(nlohmann::json::parse(Call("explain mcast.log --json").output).at("runs"), 1);
+  EXPECT_THAT(Call("explain mcast.log --job 2").errors,
+              HasSubstr("holds 1 runs of the multicast client"));
 }
 
 using ServeTest = ServerProcessTest;
 
 TEST_F(ServeTest, ServesABundleToAClientThatNobodyHereWrote) {
   scratch_.Write("files/read me.txt", "hello\n");
-  ASSERT_EQ(Run("bundle make files out --address 127.0.0.2 --attributes '*.txt=read-only'").code,
+  ASSERT_EQ(Call("bundle make files out --address 127.0.0.2 --attributes '*.txt=read-only'").code,
             0);
   Start({"out", "--port", "0", "--json"});
 
@@ -216,7 +225,7 @@ TEST_F(ServeTest, ServesABundleToAClientThatNobodyHereWrote) {
 
 TEST_F(ServeTest, WritesEventsAndAtTheEndARecordOfEveryDevice) {
   scratch_.Write("files/a.txt", "12345");
-  ASSERT_EQ(Run("bundle make files out --address 127.0.0.2").code, 0);
+  ASSERT_EQ(Call("bundle make files out --address 127.0.0.2").code, 0);
   Start({"out", "--port", "0", "--json", "--report", "report.json"});
   Fetch("bundle/a.txt:2,3", "-H 'Core-name: MR1' -H 'Model: TQ52'");
   EXPECT_EQ(ReadLine().at("event"), "request");

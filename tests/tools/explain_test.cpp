@@ -8,6 +8,7 @@
 #include <sstream>
 
 #include "server/scratch_folder.h"
+#include "tools/explain/client_log.h"
 #include "tools/failure.h"
 
 namespace tools {
@@ -289,6 +290,65 @@ TEST(StoryViewTest, TellsTheSameInJson) {
   EXPECT_EQ(json.at("cause").at("remedy"), "start the server, or correct BaseURL and HTTPPort");
   EXPECT_EQ(json.at("phases").size(), 3U);
   EXPECT_THAT(json.at("text").get<std::string>(), HasSubstr("the log ends in the phase start"));
+}
+
+const Lines kClientStart = {"Command line parsed and multicast client instantiated",
+                            "Initializing callbacks",
+                            "Starting the client protocol engine (state machine)",
+                            "Registry - creating keys and loading values", "Registry updated"};
+const Lines kClientRuns = {"Initializing the multicast client", "Socket API initialized",
+                           "Creating state machine thread", "State machine thread created"};
+
+ClientRunStory TellClient(const Lines& lines, std::size_t wanted = 0) {
+  ClientLog log(wanted);
+  for (const std::string& line : lines) log.Line(line);
+  return log.Finish();
+}
+
+TEST(ClientLogTest, TellsHowEachRunOfTheClientWent) {
+  const Lines log =
+      kClientStart + Lines{"Client configured NOT to load!"} + kClientStart +
+      Lines{"Initializing the multicast client", "Failed to initialize the multicast client!"} +
+      kClientStart + kClientStart + kClientRuns +
+      Lines{"Last file flag is set, shutting down state machine", "who wrote this?"};
+
+  const ClientRunStory last = TellClient(log);
+  EXPECT_EQ(last.number, 4U);
+  EXPECT_EQ(last.end, ClientEnd::kRan);
+  EXPECT_EQ(last.first, 19U);
+  EXPECT_EQ(last.last, 28U);
+  EXPECT_EQ(last.unknown, 1U);
+  const ClientRunStory off = TellClient(log, 1);
+  EXPECT_EQ(off.end, ClientEnd::kSwitchedOff);
+  ASSERT_TRUE(off.failed);
+  EXPECT_EQ(off.lines[*off.failed].first, 6U);
+  EXPECT_EQ(TellClient(log, 2).end, ClientEnd::kNotStarted);
+  EXPECT_EQ(TellClient(log, 3).end, ClientEnd::kBroken);
+  EXPECT_EQ(TellClient(log, 5).number, 0U);
+  EXPECT_EQ(TellClient({"", "something else"}).number, 0U);
+}
+
+TEST(ClientLogTest, CountsWhatAClientToldALogServer) {
+  Lines log = {"2006-03-01 14:05:09 Waiting for a Multicast MCFTP Server to announce a file..."};
+  for (int block = 1; block < 500; ++block) {
+    log.push_back("2006-03-01 14:05:10 NAKing block " + std::to_string(block) + " of 600");
+  }
+  log.emplace_back("2006-03-01 14:05:11 WRQ Timeout");
+
+  const ClientRunStory run = TellClient(log);
+
+  EXPECT_EQ(run.end, ClientEnd::kRan);
+  ASSERT_EQ(run.lines.size(), 3U);
+  EXPECT_EQ(run.lines[1].count, 499U);
+  std::ostringstream out;
+  PrintClientRun(out, "syslog", run, 1);
+  EXPECT_THAT(out.str(), HasSubstr("syslog: run 1 of 1 of the multicast client, lines 1 to 501\n"));
+  EXPECT_THAT(out.str(), HasSubstr("\ntroubles\n  1 x  line 501  WRQ Timeout\n        no file was "
+                                   "announced in 300 s"));
+  EXPECT_THAT(out.str(), HasSubstr("  499 x  lines 2 to 500  NAKing block 1 of 600\n"));
+  const auto json = ClientRunJson("syslog", run, 1);
+  EXPECT_EQ(json.at("troubles").at(0).at("text"), "WRQ Timeout");
+  EXPECT_EQ(json.at("steps").at(1).at("count"), 499);
 }
 
 }  // namespace

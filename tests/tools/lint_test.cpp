@@ -8,11 +8,11 @@
 #include <set>
 #include <sstream>
 
-#include "server/scratch_folder.h"
 #include "server/site.h"
 #include "tools/failure.h"
 #include "tools/file_text.h"
 #include "tools/job_file.h"
+#include "tools/lint_jobs.h"
 
 namespace tools {
 namespace {
@@ -22,63 +22,7 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 
-std::string Field(const std::string& name, const std::string& value) {
-  return "<Field Name='" + name + "'>" + value + "</Field>";
-}
-std::string Group(const std::string& name, const std::string& content) {
-  return "<Group Name='" + name + "'>" + content + "</Group>";
-}
-
-const std::string kUrl = Field("BaseURL", "http://10.0.0.2");
-const std::string kServer = Group("HTTPServer", Field("HTTPPort", "8080") + kUrl);
-const std::string kStore = Group("Store", Field("Name", "\\") + Field("RequiredSpace", "6"));
-const std::string kList =
-    Group("FileList", Field("Source", "bundle.lst") + Field("Dest", "\\bundle.lst") +
-                          Field("CRC", "12") + Field("MCTMask", "*"));
-
-std::string Test(const std::string& fields) {
-  return Group("Registry", fields);
-}
-std::string GoodTestWithout(const std::string& left_out, const std::string& instead = "") {
-  std::string fields = instead;
-  for (const auto& [name, value] :
-       std::vector<std::pair<std::string, std::string>>{{"Key", "Software"},
-                                                        {"ValueName", "V"},
-                                                        {"Type", "REG_DWORD"},
-                                                        {"Operator", "EQ"},
-                                                        {"Value", "1"},
-                                                        {"ErrorMsg", "no V"}}) {
-    if (name != left_out) fields += Field(name, value);
-  }
-  return Test(fields);
-}
-std::string Download(const std::string& source, const std::string& destination,
-                     const std::string& masks = "*", const std::string& crc = "12") {
-  return Group("Download", Group("File", Field("Source", source) + Field("Dest", destination) +
-                                             Field("CRC", crc) + Field("MCTMask", masks)));
-}
-std::string Cleanup(const std::string& action, const std::string& name) {
-  return Group("DiskCleanup", Group("File", Field("Name", name) + Field("Action", action)));
-}
-std::string Upgrade(const std::string& content) {
-  return Group("Orvenix", Group("Upgrade", content));
-}
-/// A job without a fault, and `more` in it.
-std::string With(const std::string& more) {
-  return Upgrade(kServer + kStore + kList + more);
-}
-
-Findings LintText(const std::string& groups, server::Site* site = nullptr, bool unlisted = false) {
-  return LintJob(ParseJob("<DevInfo><Subsystem Name='Orvenix'>" + groups + "</Subsystem></DevInfo>",
-                          "job.xml"),
-                 "job.xml", site, unlisted);
-}
-
-std::vector<std::string> Ids(const Findings& findings) {
-  std::vector<std::string> ids;
-  for (const Finding& finding : findings.all()) ids.emplace_back(RowOf(finding.rule).id);
-  return ids;
-}
+constexpr auto kAfterConfigurations = static_cast<std::size_t>(Rule::kNoStorage);
 
 struct LintCase {
   std::string id;
@@ -214,6 +158,9 @@ std::vector<LintCase> CasesOfFilesAndCleanup() {
       {"crc-zero", With(Download("a", "\\a", "*", "0"))},
       {"crc-number", With(Download("a", "\\a", "*", "0x12"))},
       {"ram-without-store", With(Download("a", "RAM:a"))},
+      {"ram-name", With(Download("a", "RAM:image-of-the-loader.nb0"))},
+      {"ram-case", With(Download("a", "Ram:os.nb0"))},
+      {"destination-macro", With(Download("a", "\\%CE2%\\a.dll"))},
       {"delete-root", With(Cleanup("Delete", "\\"))},
       {"delete-root", With(Cleanup("delete", "\\\\"))},
       {"delete-wildcard", With(Cleanup("Delete", "\\Temp\\*.*"))},
@@ -271,11 +218,14 @@ TEST(LintTest, FindsWhatEachRuleIsAbout) {
       }
     }
   }
-  // The rules about the server's files have tests of their own, below.
+  // The rules about the server's files and about configuration files have tests of their own.
   for (const char* id : {"list-missing", "list-crc", "list-shift", "list-zero-byte",
                          "list-field-long", "size-number", "file-missing", "file-crc", "file-size",
                          "size-short", "size-reserve", "file-unlisted", "multicast-folder"}) {
     seen.insert(id);
+  }
+  for (auto i = static_cast<std::size_t>(Rule::kUnknownElement); i < kAfterConfigurations; ++i) {
+    seen.insert(RowOf(static_cast<Rule>(i)).id);
   }
   for (std::size_t i = 0; i < static_cast<std::size_t>(Rule::kCount); ++i) {
     const RuleRow& rule = RowOf(static_cast<Rule>(i));
@@ -321,25 +271,6 @@ TEST(LintTest, NamesTheLineAndKeepsWhatFitsAsTheDeviceDoes) {
   EXPECT_EQ(findings.all()[0].where, "job.xml:5");
 }
 
-/// A served folder with a list file and what its list names.
-class LintServedTest : public ::testing::Test {
- protected:
-  Findings LintList(const std::string& list, const std::string& crc = "", bool unlisted = false) {
-    scratch_.Write("bundle.lst", list);
-    server::Site site(scratch_.path());
-    const std::string right = std::to_string(site.Open("bundle.lst")->crc32());
-    return LintText(
-        Upgrade(kServer + kStore +
-                Group("FileList", Field("Source", "bundle.lst") + Field("Dest", "\\bundle.lst") +
-                                      Field("CRC", crc.empty() ? right : crc)) +
-                job_),
-        &site, unlisted);
-  }
-
-  std::string job_;  ///< what is in the job besides
-  ScratchFolder scratch_;
-};
-
 TEST(LintTest, TakesWhatBundlesSayOfMulticast) {
   const std::string fields = Field("MulticastIP", "239.1.1.1") + Field("UDPPort", "7000");
 
@@ -348,95 +279,11 @@ TEST(LintTest, TakesWhatBundlesSayOfMulticast) {
               IsEmpty());
 }
 
-constexpr const char* kHello = "a.txt,\\a.txt,*,909783072,6\r\n";  // "hello\n"
-
-TEST_F(LintServedTest, FindsNothingInAListWhoseFilesAreServed) {
-  scratch_.Write("a.txt", "hello\n");
-  scratch_.Write("sub/empty", "");
-
-  EXPECT_THAT(Ids(LintList(kHello, "", true)), ElementsAre("file-unlisted"));
-  EXPECT_THAT(Ids(LintList(std::string(kHello) + "sub\\empty,\\e,*,1,0\r\n", "", true)), IsEmpty());
-  EXPECT_THAT(Ids(LintList(kHello)), IsEmpty()) << "other files may lie in a served folder";
-}
-
-TEST_F(LintServedTest, ComparesTheListWithWhatIsServed) {
-  scratch_.Write("a.txt", "hello\n");
-  scratch_.Write("b.txt", "world\n");
-
-  EXPECT_THAT(Ids(LintList(kHello, "5")), ElementsAre("list-crc"));
-  EXPECT_THAT(Ids(LintList("c.txt,\\c,*,5,6\r\n")), ElementsAre("file-missing"));
-  EXPECT_THAT(Ids(LintList("A.txt,\\a,*,909783072,6\r\n")), ElementsAre("file-missing"))
-      << "letter case";
-  EXPECT_THAT(Ids(LintList("b.txt,\\b,*,909783072,6\r\n")), ElementsAre("file-crc"));
-  EXPECT_THAT(Ids(LintList("a.txt,\\a,*,909783072,5\r\n")),
-              ElementsAre("file-size", "size-reserve"));
-  EXPECT_THAT(Ids(LintList("a.txt,\\a,*,909783072,six\r\n")),
-              ElementsAre("size-number", "file-size"));
-  EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\b,*,909783072,6\r\n")),
-              ElementsAre("size-short"));
-  EXPECT_THAT(Ids(LintList("../a.txt,\\a,*,909783072,6\r\n")),
-              ElementsAre("path-leading", "file-missing"));
-}
-
-TEST_F(LintServedTest, FollowsTheFoldersThatAMulticastMakes) {
-  scratch_.Write("a.txt", "hello\n");
-  job_ = Group("MulticastClient", Field("Parameters", "-A=239.1.1.1 -P=7000 -HV=TQ52"));
-  const auto line = [](const std::string& destination) {
-    return "a.txt," + destination + ",*,909783072,6\r\n";
-  };
-
-  EXPECT_THAT(Ids(LintList(line("\\New\\a") + line("\\Temp\\New\\a"))), ElementsAre("size-short"));
-  EXPECT_THAT(Ids(LintList(line("\\New\\sub\\a") + line("\\new\\a"))), ElementsAre("size-short"))
-      << "short paths come first";
-  const Findings deep = LintList(line("\\New\\sub\\a"));
-  EXPECT_THAT(Ids(deep), ElementsAre("multicast-folder"));
-  EXPECT_EQ(deep.all()[0].found, "\"\\New\\sub\\a\"");
-}
-
-TEST_F(LintServedTest, MissesTheTextOnlyWhereFilesAreForSomeDevices) {
-  scratch_.Write("a.txt", "hello\n");
-  job_ = Group("MulticastClient", Field("Parameters", "-A=239.1.1.1 -P=7000"));
-
-  EXPECT_THAT(Ids(LintList(kHello)), IsEmpty());
-  EXPECT_THAT(Ids(LintList("a.txt,\\a.txt,TQ5*,909783072,6\r\n")),
-              ElementsAre("multicast-no-text"));
-}
-
-TEST_F(LintServedTest, ReadsTheListAsTheDeviceDoes) {
-  scratch_.Write("a.txt", "hello\n");
-
-  const Findings shifted = LintList(std::string(kHello) + "a.txt,\\b,,909783072,6\r\nx\r\n");
-  EXPECT_THAT(Ids(shifted), ElementsAre("list-shift"));
-  EXPECT_EQ(shifted.all()[0].where, "bundle.lst:2");
-  EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\b,*,909783072\r\n")),
-              ElementsAre("list-shift"));
-  EXPECT_THAT(Ids(LintList(kHello + std::string("\0a.txt", 6))), ElementsAre("list-zero-byte"));
-  EXPECT_THAT(Ids(LintList(kHello + std::string(260, 'p') + ",\\b,*,5,6\r\n")),
-              ElementsAre("list-field-long"));
-  EXPECT_THAT(Ids(LintList("\r\n\n" + std::string(kHello) + "\n")), IsEmpty());
-  EXPECT_THAT(Ids(LintList(std::string(kHello) + "a.txt,\\A.TXT,*,909783072,0\r\n")),
-              ElementsAre("duplicate-destination", "file-size"));
-}
-
 TEST(LintTest, DoesNotTakeTheCrcOfTheListForLeftOut) {
   const std::string list =
       Group("FileList", Field("Source", "l") + Field("Dest", "\\l") + Field("CRC", "0"));
 
   EXPECT_THAT(Ids(LintText(Upgrade(kServer + kStore + list))), ElementsAre("list-crc"));
-}
-
-TEST_F(LintServedTest, MissesTheListItself) {
-  server::Site site(scratch_.path());
-
-  EXPECT_THAT(Ids(LintText(With(""), &site)), ElementsAre("list-missing"));
-}
-
-TEST_F(LintServedTest, TakesAnyBytesAsAList) {
-  std::string bytes = kHello;
-  for (int i = 0; i < 3000; ++i) bytes += static_cast<char>(i * 37 % 256);
-
-  EXPECT_GE(LintList(bytes).all().size(), 1U);
-  EXPECT_THAT(Ids(LintList("")), ElementsAre("size-reserve"));
 }
 
 TEST(LintOutputTest, GroupsFindingsByRuleWithTheWorstFirst) {

@@ -167,6 +167,8 @@ TEST(MulticastTableTest, SaysWhatTheSystemRefused) {
   EXPECT_THAT(report,
               HasSubstr("  7 datagrams of these did not go out: the system refused to send\n"));
   EXPECT_THAT(report, HasSubstr("  the session file could not be written 1 time: "));
+  EXPECT_THAT(FormatMulticast(figures, 1, 0, 1),
+              HasSubstr("  7 datagrams of these did not go out: "));
   EXPECT_EQ(ToJson(figures).at("refused"), 7);
   EXPECT_EQ(ToJson(figures).at("not_stored"), 1);
 }

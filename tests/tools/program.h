@@ -1,4 +1,4 @@
-// The built program, run as a process of its own.
+// The program, called in this process or run as one of its own.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -8,11 +8,15 @@
 
 #include <array>
 #include <cstdio>
+#include <filesystem>
+#include <iostream>
 #include <nlohmann/json.hpp>
+#include <sstream>
 #include <string>
 #include <vector>
 
 #include "server/scratch_folder.h"
+#include "tools/command_line.h"
 #include "tools/file_text.h"
 
 namespace tools {
@@ -23,12 +27,67 @@ struct Ended {
   std::string errors;
 };
 
-/// Runs the program in a folder of its own with a line of shell words.
+/// What goes to a stream of the process in the meantime.
+class CapturedStream {
+ public:
+  explicit CapturedStream(std::ostream& stream)
+      : stream_(stream), before_(stream.rdbuf(text_.rdbuf())) {}
+  ~CapturedStream() { stream_.rdbuf(before_); }
+  CapturedStream(const CapturedStream&) = delete;
+  CapturedStream& operator=(const CapturedStream&) = delete;
+  [[nodiscard]] std::string text() const { return text_.str(); }
+
+ private:
+  std::ostringstream text_;
+  std::ostream& stream_;
+  std::streambuf* const before_;
+};
+
+/// Gives lines of words to the program, in a folder of its own.
 class CommandLineTest : public ::testing::Test {
  protected:
+  CommandLineTest() {
+    std::filesystem::current_path(scratch_.path());
+    scratch_.Write("empty.txt", "");
+  }
+  ~CommandLineTest() override { std::filesystem::current_path("/"); }
+
+  /// Divides at blanks; what stands in single quotes stays together.
+  static std::vector<std::string> Words(const std::string& line) {
+    std::vector<std::string> words{"orvenix"};
+    bool in_word = false, quoted = false;
+    for (const char letter : line) {
+      if (letter == ' ' && !quoted) {
+        in_word = false;
+        continue;
+      }
+      if (!in_word) words.emplace_back();
+      in_word = true;
+      if (letter == '\'') {
+        quoted = !quoted;
+      } else {
+        words.back() += letter;
+      }
+    }
+    return words;
+  }
+
+  /// Calls the program's command line in this process.
+  static Ended Call(const std::string& line) {
+    std::vector<std::string> words = Words(line);
+    std::vector<char*> arguments;
+    for (std::string& word : words) arguments.push_back(word.data());
+    const CapturedStream output(std::cout), errors(std::cerr);
+    Ended ended;
+    ended.code = RunCommandLine(static_cast<int>(arguments.size()), arguments.data());
+    ended.output = output.text();
+    ended.errors = errors.text();
+    return ended;
+  }
+
+  /// Runs the built program through a shell: for what starts threads, or reads where it lies.
   Ended Run(const std::string& words) const {
-    const std::string command =
-        "cd '" + scratch_.path().string() + "' && '" ORVENIX_PROGRAM "' " + words + " 2>errors.txt";
+    const std::string command = "'" ORVENIX_PROGRAM "' " + words + " 2>errors.txt";
     Ended ended;
     FILE* pipe = ::popen(command.c_str(), "r");
     std::array<char, 4096> block{};

@@ -46,12 +46,12 @@ class RunTest : public ServerProcessTest {
     scratch_.Write("files/sub/data.bin", std::string(200'000, 'd'));
   }
   void MakeDevice(const std::string& settings = "") const {
-    ASSERT_EQ(Run("device new device " + settings).code, 0);
+    ASSERT_EQ(Call("device new device " + settings).code, 0);
   }
   /// A bundle for a server that listens on the port of the running one.
   void MakeBundleFor(int port, const std::string& more = "") const {
-    const Ended made = Run("bundle make files out --address 127.0.0.2 --port " +
-                           std::to_string(port) + " " + more);
+    const Ended made = Call("bundle make files out --address 127.0.0.2 --port " +
+                            std::to_string(port) + " " + more);
     ASSERT_EQ(made.code, 0) << made.errors;
   }
 };
@@ -76,7 +76,7 @@ TEST_F(RunTest, TakesFromTheGroupWhatIsAnnouncedForItAndTheRestByHttp) {
   MakeBundleFor(port_, more);
   MakeDevice("--set network.datagram_loss_percent=5");
 
-  const Ended run = Run("run out/job.xml --device device --json --pcap device.pcap");
+  const Ended run = Run("run out/job.xml --device device --hurry 50 --json --pcap device.pcap");
 
   ASSERT_EQ(run.code, 0) << run.errors;
   const auto events = Events(run.output);
@@ -111,7 +111,8 @@ TEST_F(RunTest, BringsEveryFileToTheDeviceAndTellsWhatHappens) {
   scratch_.Write("device/storage/Application/read me.txt", "hello\n");
   scratch_.Write("device/storage/Application/sub/data.bin", "spoilt");
 
-  const Ended run = Run("run out/job.xml --device device --screens screens --json --events all");
+  const Ended run =
+      Run("run out/job.xml --device device --hurry 50 --screens screens --json --events all");
 
   ASSERT_EQ(run.code, 0) << run.errors;
   EXPECT_EQ(ReadWholeFile(scratch_.path() / "all"), run.output);
@@ -134,10 +135,10 @@ TEST_F(RunTest, BringsEveryFileToTheDeviceAndTellsWhatHappens) {
             std::string(200'000, 'd'));
   EXPECT_TRUE(fs::exists(scratch_.path() / "screens/paint-000001.png"));
 
-  const Ended screen = Run("device screen device --picture last.png --json");
+  const Ended screen = Call("device screen device --picture last.png --json");
   EXPECT_THAT(nlohmann::json::parse(screen.output).at("lines"), Contains("Upgrade Complete"));
   EXPECT_TRUE(fs::exists(scratch_.path() / "last.png"));
-  const Ended show = Run("device show device");
+  const Ended show = Call("device show device");
   EXPECT_THAT(show.output, HasSubstr("\\Application\\sub\\data.bin"));
   EXPECT_THAT(show.output, HasSubstr("end of \\FileXfer.log:"));
 
@@ -205,6 +206,91 @@ TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
   const Ended unknown = Run("run unknown.xml --device device --force");
   EXPECT_EQ(unknown.code, static_cast<int>(ExitCode::kUnknownName)) << unknown.errors;
   EXPECT_THAT(unknown.errors, HasSubstr("knows no group or field \"HTTPSender\""));
+}
+
+class RunClientTest : public RunTest {
+ protected:
+  /// A configuration file for the running server, beside nothing.
+  void WriteConfiguration(const std::string& content) const {
+    scratch_.Write("upgrade.xml", "<Job><BaseUrl>http://127.0.0.2</BaseUrl><HTTPPort>" +
+                                      std::to_string(port_) + "</HTTPPort>" + content + "</Job>");
+  }
+  std::string OnDevice(const std::string& path) const {
+    return ReadWholeFile(scratch_.path() / "device" / path);
+  }
+};
+
+TEST_F(RunClientTest, SendsTheJobForEachPassAcrossTheRestartOfTheFlash) {
+  const std::string image(100'000, 'o');
+  scratch_.Write("served/fw/os.nb0", image);
+  scratch_.Write("served/fw/apps001.zip", "part one");
+  scratch_.Write("served/fw/apps002.zip", "part two");
+  scratch_.Write("served/both.txt", "in every pass");
+  Start({"served", "--address", "127.0.0.2", "--port", "0", "--json"});
+  WriteConfiguration(
+      "<OSFirmware><Package HardwareVersion='TQ5*' SourceDir='fw' Base='os.nb0' DestDir='RAM:' "
+      "AdditionalParms='Pass=1,RAMAllocSize=100000'/>"
+      "<Package HardwareVersion='TQ5*' SourceDir='fw' Base='apps' Count='2' "
+      "DestDir='\\Application' "
+      "AdditionalParms='Pass=2'/></OSFirmware>"
+      "<Downloads><File SourceDir='both.txt' DestDir='\\both.txt'/></Downloads>");
+  MakeDevice("--set flash.start=restarts");
+
+  const Ended run =
+      Run("run upgrade.xml --mode client --device device --bundle served --hurry 50 --json "
+          "--events all");
+
+  ASSERT_EQ(run.code, 0) << run.errors;
+  EXPECT_EQ(OnDevice("flash/os.nb0"), image);
+  EXPECT_EQ(OnDevice("storage/Application/apps002.zip"), "part two");
+  EXPECT_EQ(OnDevice("storage/kvoupgclnt.txt"), "2");
+  EXPECT_FALSE(fs::exists(scratch_.path() / "device/storage/Windows/upgrade.xml"));
+  EXPECT_EQ(ReadWholeFile(scratch_.path() / "all"), run.output) << "of both starts";
+  std::vector<std::string> story;
+  for (const nlohmann::json& event : Events(run.output)) {
+    const std::string name = event.at("event");
+    if (name == "started") story.push_back("pass " + std::to_string(event.at("pass").get<int>()));
+    if (name == "restart") story.push_back("restart by " + event.at("cause").get<std::string>());
+    if (name != "ended") continue;
+    EXPECT_EQ(event.at("outcome"), "ok");
+    for (const auto& file : event.at("files")) {
+      story.push_back(file.at("path").get<std::string>() + " " +
+                      file.at("state").get<std::string>());
+    }
+  }
+  EXPECT_THAT(story, ElementsAre("pass 1", "RAM:os.nb0 right", "\\both.txt right",
+                                 "restart by flash", "pass 2", "\\Application\\apps001.zip right",
+                                 "\\Application\\apps002.zip right", "\\both.txt right"));
+}
+
+TEST_F(RunClientTest, EndsWithTheTestThatFailed) {
+  port_ = 9;
+  WriteConfiguration(
+      "<Registry><Key>Software</Key><ValueName>V</ValueName><Type>REG_DWORD</Type>"
+      "<Operator>EQ</Operator><Value>1</Value><ErrorMsg>no V</ErrorMsg></Registry>"
+      "<OSFirmware><Package HardwareVersion='*' SourceDir='fw' Base='a' DestDir='\\' "
+      "AdditionalParms='Pass=2'/><Package HardwareVersion='*' SourceDir='fw' Base='b' "
+      "DestDir='\\' AdditionalParms='Pass=1'/></OSFirmware>");
+  MakeDevice();
+  scratch_.Write("device/storage/kvoupgclnt.txt", "1");
+
+  const Ended run = Run("run upgrade.xml --mode client --device device --hurry 50 --timeout 20");
+
+  EXPECT_EQ(run.code, static_cast<int>(ExitCode::kTestFailed)) << run.output;
+  EXPECT_THAT(run.output, HasSubstr("Upgrade Failed: no V"));
+  EXPECT_FALSE(fs::exists(scratch_.path() / "device/storage/kvoupgclnt.txt"))
+      << "the next job is the first pass again";
+}
+
+TEST_F(RunClientTest, RefusesAConfigurationWithErrors) {
+  port_ = 9;
+  WriteConfiguration("<OSFirmware><Package HardwareVersion='*' Base='os'/></OSFirmware>");
+  MakeDevice();
+
+  const Ended run = Run("run upgrade.xml --mode client --device device");
+
+  EXPECT_EQ(run.code, static_cast<int>(ExitCode::kBadInput));
+  EXPECT_THAT(run.errors, HasSubstr("1 error in the job: package-no-source"));
 }
 
 }  // namespace

@@ -1,4 +1,4 @@
-#include "upgrade_config/package_selection.h"
+#include "upgrade_config/selection/package_selection.h"
 
 #include <gtest/gtest.h>
 

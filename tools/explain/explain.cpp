@@ -2,11 +2,13 @@
 
 #include <array>
 #include <fstream>
+#include <functional>
 #include <iomanip>
 #include <iostream>
 #include <sstream>
 
 #include "server/request.h"
+#include "tools/explain/client_log.h"
 #include "tools/failure.h"
 
 namespace tools {
@@ -89,14 +91,62 @@ void ExplainText(const ExplainOptions& options) {
   std::cout << std::flush;
 }
 
+/// Calls `take` with every line, without its end. Lines longer than a device writes are cut.
+void ReadLines(const fs::path& file, const std::function<void(std::string_view)>& take) {
+  std::ifstream in(file, std::ios::binary);
+  if (!in) throw Failure(ExitCode::kBadInput, file.string(), "cannot be read");
+  std::vector<char> block(kBlock);
+  std::string line;
+  const auto finish = [&line, &take] {
+    while (!line.empty() && line.back() == '\r') line.pop_back();
+    take(line);
+    line.clear();
+  };
+  do {
+    in.read(block.data(), static_cast<std::streamsize>(block.size()));
+    std::string_view bytes(block.data(), static_cast<std::size_t>(in.gcount()));
+    while (!bytes.empty()) {
+      const std::size_t end = bytes.find('\n');
+      const std::string_view part = bytes.substr(0, end);
+      line.append(part.substr(0, kMaxLine - std::min(kMaxLine, line.size())));
+      if (end == std::string_view::npos) break;
+      finish();
+      bytes.remove_prefix(end + 1);
+    }
+  } while (in);
+  if (in.bad()) throw Failure(ExitCode::kBadInput, file.string(), "cannot be read to its end");
+  if (!line.empty()) finish();
+}
+
+/// @return false when the file is no log of a multicast client.
+bool ExplainClientLog(const ExplainOptions& options) {
+  ClientLog log(options.job);
+  ReadLines(options.what, [&log](std::string_view line) { log.Line(line); });
+  if (log.runs() == 0) return false;
+  const ClientRunStory run = log.Finish();
+  if (run.number == 0) {
+    throw Failure(ExitCode::kBadInput, options.what,
+                  "holds " + std::to_string(log.runs()) + " runs of the multicast client",
+                  "choose another --job");
+  }
+  if (options.json) {
+    PrintJson(ClientRunJson(options.what, run, log.runs()));
+  } else {
+    PrintClientRun(std::cout, options.what, run, log.runs());
+  }
+  return true;
+}
+
 void ExplainLog(const ExplainOptions& options) {
   LogStory story = ReadLog(options.what, options.job);
   const JobStory job = story.Finish();
+  if (story.jobs() == 0 && ExplainClientLog(options)) return;
   if (job.number == 0) {
-    throw Failure(ExitCode::kBadInput, options.what,
-                  story.jobs() == 0 ? "holds no line of this system"
-                                    : "holds " + std::to_string(story.jobs()) + " jobs",
-                  story.jobs() == 0 ? "give a device's FileXfer.log" : "choose another --job");
+    throw Failure(
+        ExitCode::kBadInput, options.what,
+        story.jobs() == 0 ? "holds no line of this system"
+                          : "holds " + std::to_string(story.jobs()) + " jobs",
+        story.jobs() == 0 ? "give a device's FileXfer.log or mcast.log" : "choose another --job");
   }
   if (options.json) {
     PrintJson(StoryJson(options.what, job, story.jobs()));
@@ -141,28 +191,8 @@ std::vector<const CodeRow*> MeaningsOf(std::uint32_t code) {
 }
 
 LogStory ReadLog(const fs::path& file, std::size_t wanted) {
-  std::ifstream in(file, std::ios::binary);
-  if (!in) throw Failure(ExitCode::kBadInput, file.string(), "cannot be read");
   LogStory story(wanted);
-  std::vector<char> block(kBlock);
-  std::string line;
-  do {
-    in.read(block.data(), static_cast<std::streamsize>(block.size()));
-    std::string_view bytes(block.data(), static_cast<std::size_t>(in.gcount()));
-    while (!bytes.empty()) {
-      const std::size_t end = bytes.find('\n');
-      const std::string_view part = bytes.substr(0, end);
-      line.append(part.substr(0, kMaxLine - std::min(kMaxLine, line.size())));
-      if (end == std::string_view::npos) break;
-      while (!line.empty() && line.back() == '\r') line.pop_back();
-      story.Line(line);
-      line.clear();
-      bytes.remove_prefix(end + 1);
-    }
-  } while (in);
-  if (in.bad()) throw Failure(ExitCode::kBadInput, file.string(), "cannot be read to its end");
-  while (!line.empty() && line.back() == '\r') line.pop_back();
-  if (!line.empty()) story.Line(line);
+  ReadLines(file, [&story](std::string_view line) { story.Line(line); });
   return story;
 }
 

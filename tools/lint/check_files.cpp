@@ -8,8 +8,9 @@
 #include "base/number.h"
 #include "base/text.h"
 #include "server/site.h"
-#include "tools/lint/checks.h"
+#include "tools/lint/files_check.h"
 #include "tools/lint/multicast_line.h"
+#include "upgrade/list_file/package_options.h"
 
 namespace tools {
 namespace {
@@ -21,38 +22,10 @@ constexpr std::uint64_t kLargestCrc = 0xFFFFFFFF;
 constexpr std::uint64_t kLargestSize = 0x7FFFFFFF;
 constexpr std::string_view kRamName = "RAM:";
 constexpr std::string_view kRename = ".rename";
-
-/// One file to fetch, from the job or from a line of the list file.
-struct WantedFile {
-  std::string where;
-  std::string_view source;
-  std::string_view destination;
-  std::string_view masks;
-  std::string_view crc;
-  std::string_view size;  ///< of list files only
-};
+constexpr std::size_t kLongestRamName = 19;
 
 bool IsLetter(char letter) {
   return (letter >= 'A' && letter <= 'Z') || (letter >= 'a' && letter <= 'z');
-}
-
-/// A source as the server sees it: slashes, and none in front.
-std::string PathOnServer(std::string_view source) {
-  std::string path(source);
-  std::replace(path.begin(), path.end(), '\\', '/');
-  return path.substr(std::min(path.find_first_not_of('/'), path.size()));
-}
-
-std::string ReadAll(const server::SiteFile& file) {
-  std::string text(static_cast<std::size_t>(file.size()), '\0');
-  std::size_t at = 0;
-  while (at < text.size()) {
-    const std::size_t got = file.ReadAt(at, text.data() + at, text.size() - at);
-    if (got == 0) break;
-    at += got;
-  }
-  text.resize(at);
-  return text;
 }
 
 /// The fields of one line; runs of commas give empty ones, which the device would not see.
@@ -66,48 +39,36 @@ std::vector<std::string_view> Fields(std::string_view line) {
   return fields;
 }
 
-class FilesCheck {
- public:
-  FilesCheck(const JobCheck& check, server::Site* site) : check_(check), site_(site) {
-    const auto& stores = check.job.stores;
-    has_ram_ = std::any_of(stores.begin(), stores.end(), [](const StoreSettings& store) {
-      return base::StartsWith(store.name.text, kRamName);
-    });
+}  // namespace
+
+std::string ReadServed(const server::SiteFile& file) {
+  std::string text(static_cast<std::size_t>(file.size()), '\0');
+  std::size_t at = 0;
+  while (at < text.size()) {
+    const std::size_t got = file.ReadAt(at, text.data() + at, text.size() - at);
+    if (got == 0) break;
+    at += got;
   }
+  text.resize(at);
+  return text;
+}
 
-  void Downloads();
-  void List();
-  void Unlisted();
-  void Multicast();
+std::string FilesCheck::PathOnServer(std::string_view source) {
+  std::string path(source);
+  std::replace(path.begin(), path.end(), '\\', '/');
+  return path.substr(std::min(path.find_first_not_of('/'), path.size()));
+}
 
- private:
-  void Add(Rule rule, const std::string& where, std::string found) {
-    check_.findings.Add(rule, where, std::move(found));
-  }
-  std::string InJob(int line) const { return check_.name + ":" + std::to_string(line); }
-
-  void Wanted(const WantedFile& file);
-  void Source(const WantedFile& file);
-  void Destination(const WantedFile& file);
-  void Twice(const WantedFile& file);
-  void Crc(const WantedFile& file);
-  void Served(const WantedFile& file);
-  void ServedList(const std::string& text);
-  bool Record(std::string_view line, const std::string& where);
-  void Sizes();
-  void Folders();
-
-  const JobCheck& check_;
-  server::Site* const site_;
-  /// By the destination's key: where it came from, for which devices.
-  std::map<std::string, std::pair<std::string, std::string>> destinations_;
-  std::set<std::string> asked_;  ///< paths on the server
-  std::set<std::string> masks_;
-  std::vector<std::string> listed_;  ///< destinations of the list
-  std::uint64_t listed_bytes_ = 0;
-  bool sizes_known_ = true;
-  bool has_ram_ = false;  ///< a requirement gives the RAM buffer its size
-};
+FilesCheck::FilesCheck(const JobCheck& check, server::Site* site) : check_(check), site_(site) {
+  const auto& job = check.job;
+  has_ram_ = std::any_of(job.stores.begin(), job.stores.end(),
+                         [](const StoreSettings& store) {
+                           return base::StartsWith(store.name.text, kRamName);
+                         }) ||
+             std::any_of(job.packages.begin(), job.packages.end(), [](const auto& package) {
+               return upgrade::PackageRamSize(package.options.text) != 0;
+             });
+}
 
 // ---- what the job or a line of the list says ----
 
@@ -138,8 +99,14 @@ void FilesCheck::Destination(const WantedFile& file) {
   }
   if (base::StartsWith(path, kRamName)) {
     if (!has_ram_) Add(Rule::kRamWithoutStore, file.where, found);
+    if (path.size() - kRamName.size() > kLongestRamName) Add(Rule::kRamName, file.where, found);
     return;
   }
+  if (base::EqualIgnoringCase(path.substr(0, kRamName.size()), kRamName)) {
+    Add(Rule::kRamCase, file.where, found);
+    return;
+  }
+  if (path.find("%CE") != std::string_view::npos) Add(Rule::kDestinationMacro, file.where, found);
   if (path.find_first_of("<>:\"|?*") != std::string_view::npos) {
     Add(Rule::kDestinationName, file.where, found);
   }
@@ -184,9 +151,10 @@ void FilesCheck::Wanted(const WantedFile& file) {
 
 void FilesCheck::Downloads() {
   const DeviceJob& job = check_.job;
-  if (!job.list && job.downloads.empty()) {
+  if (!job.list && job.downloads.empty() && job.packages.empty() && job.inf.text.empty()) {
     check_.Add(Rule::kNothingToFetch, std::max(job.upgrade_line, 1),
-               "neither FileList nor Download");
+               job.is_configuration ? "neither Downloads nor OSFirmware nor InfFile"
+                                    : "neither FileList nor Download");
   }
   if (job.list) {
     const DownloadSettings& list = *job.list;
@@ -204,12 +172,13 @@ void FilesCheck::Downloads() {
     const WantedFile file{InJob(download.line), download.source.text, download.destination.text,
                           download.masks.text,  download.crc.text,    {}};
     Wanted(file);
+    Served(file);
+    sizes_known_ = false;
+    if (job.is_configuration) continue;  // which has neither
     Crc(file);
     if (download.masks.text.find_first_not_of(" ;") == std::string::npos) {
       Add(Rule::kFileNoMask, file.where, "no MCTMask for " + Quoted(file.destination));
     }
-    Served(file);
-    sizes_known_ = false;
   }
 }
 
@@ -265,7 +234,7 @@ bool FilesCheck::Record(std::string_view line, const std::string& where) {
   }
   listed_bytes_ += base::LeadingNumber(file.size);
   masks_.insert(std::string(file.masks));
-  listed_.emplace_back(file.destination);
+  if (!base::StartsWith(file.destination, kRamName)) listed_.emplace_back(file.destination);
   Served(file);
   return true;
 }
@@ -326,7 +295,7 @@ void FilesCheck::List() {
         Quoted(path) + " has " + std::to_string(served->size()) + " bytes");
     return;
   }
-  ServedList(ReadAll(*served));
+  ServedList(ReadServed(*served));
 }
 
 /// Follows a device that makes folders as files are announced, those with the shortest paths first.
@@ -395,13 +364,13 @@ void FilesCheck::Unlisted() {
           (count > kNamed ? ", ..." : ""));
 }
 
-}  // namespace
-
 void CheckFiles(const JobCheck& check, server::Site* site, bool unlisted) {
   FilesCheck files(check, site);
   files.Downloads();
   files.List();
   files.Multicast();
+  files.Packages();
+  files.Inf();
   if (site != nullptr && unlisted) files.Unlisted();
 }
 

@@ -43,6 +43,28 @@ std::string Quoted(std::string_view text) {
   return "\"" + std::string(text.substr(0, kShown)) + (text.size() > kShown ? "..." : "") + "\"";
 }
 
+void CheckTextOf(const Setting& setting, std::string_view what, std::size_t limit,
+                 const std::string& name, Findings& findings) {
+  const std::string& text = setting.text;
+  const auto add = [&](Rule rule, const std::string& found) {
+    findings.Add(rule, name + ":" + std::to_string(setting.line), std::string(what) + " " + found);
+  };
+  const auto is_blank = [](char letter) {
+    return letter == ' ' || (letter >= '\t' && letter <= '\r');
+  };
+  if (limit > 0 && text.size() > limit) {
+    add(Rule::kCutText, "has " + std::to_string(text.size()) + " characters, the device keeps " +
+                            std::to_string(limit));
+  }
+  const bool ascii = std::all_of(text.begin(), text.end(), [is_blank](char letter) {
+    return is_blank(letter) || (letter >= ' ' && letter <= '~');
+  });
+  if (!ascii) add(Rule::kNotAscii, Quoted(text));
+  if (limit > 0 && !text.empty() && (is_blank(text.front()) || is_blank(text.back()))) {
+    add(Rule::kOuterBlanks, Quoted(text));
+  }
+}
+
 bool IsNumber(std::string_view text, std::uint64_t largest) {
   std::uint64_t value = 0;
   for (const char letter : text) {
@@ -119,6 +141,8 @@ void CheckTest(const JobCheck& check, const TestSettings& test) {
   const auto add = [&](Rule rule, const Setting& setting, const std::string& found) {
     check.Add(rule, setting.given() ? setting.line : test.line, value + " " + found);
   };
+  // A configuration file gives no root; the first test then looks under HKEY_LOCAL_MACHINE.
+  const bool no_root = check.job.is_configuration && !test.root.given();
   if (!test.type.given()) {
     add(Rule::kTestNoType, test.type, "has no Type");
   } else if (test.type.text != "REG_SZ" && test.type.text != "REG_DWORD") {
@@ -127,7 +151,7 @@ void CheckTest(const JobCheck& check, const TestSettings& test) {
   if (!IsOneOf(test.operation.text, kOperators)) {
     add(Rule::kTestOperator, test.operation, "has the Operator " + Quoted(test.operation.text));
   }
-  if (!IsOneOf(test.root.text, kRoots)) {
+  if (!IsOneOf(test.root.text, kRoots) && !(no_root && &test == &check.job.tests.front())) {
     add(Rule::kTestRoot, test.root, "has the Root " + Quoted(test.root.text));
   }
   if (test.key.text.empty()) add(Rule::kTestNoKey, test.key, "has no Key");
@@ -168,7 +192,9 @@ void CheckMessages(const JobCheck& check) {
   check_markup(job.begin_text, "BeginText");
   check_markup(job.end_text, "EndText");
   for (const TestSettings& test : job.tests) check_markup(test.message, "ErrorMsg");
-  CheckSwitch(check, job.show_window, "ShowGUI");
+  // Configuration files may write this one in any letter case.
+  const bool is_false = base::EqualIgnoringCase(job.show_window.text, "false");
+  if (!job.is_configuration || !is_false) CheckSwitch(check, job.show_window, "ShowGUI");
   CheckSwitch(check, job.wait, "Wait");
 }
 
@@ -218,7 +244,7 @@ void CheckServer(const JobCheck& check) {
     check.Add(Rule::kHttpPort, job.http_port.line, "HTTPPort is " + Quoted(job.http_port.text));
   }
   if (url.empty()) {
-    if (job.list || !job.downloads.empty())
+    if (job.list || !job.downloads.empty() || !job.packages.empty() || job.inf.given())
       check.Add(Rule::kUrlMissing, line, "there is no BaseURL");
     return;
   }
@@ -263,7 +289,10 @@ void CheckProcesses(const JobCheck& check) {
               "Parameters are " + Quoted(job.parameters.text));
   }
   if (Contains(job.program.text, "wceload.exe")) {
-    if (!Contains(job.parameters.text, " ")) {
+    const bool appended = std::any_of(
+        job.packages.begin(), job.packages.end(),
+        [](const PackageSettings& package) { return !package.command_line.text.empty(); });
+    if (!Contains(job.parameters.text, " ") && !appended) {
       check.Add(Rule::kInstallerBlank, std::max(job.parameters.line, job.program.line),
                 "the installer's Parameters are " + Quoted(job.parameters.text));
     }

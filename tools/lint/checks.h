@@ -43,6 +43,10 @@ void CheckFiles(const JobCheck& check, server::Site* site, bool unlisted);
 /// In quotes, and cut where it is long.
 [[nodiscard]] std::string Quoted(std::string_view text);
 [[nodiscard]] bool IsDotted(std::string_view address);
+/// Whether the device keeps the text whole (`limit` characters, 0: it is a number or a word), and
+/// as it is meant. `what` is its name in the findings, `name` the file's.
+void CheckTextOf(const Setting& setting, std::string_view what, std::size_t limit,
+                 const std::string& name, Findings& findings);
 /// All digits, and not above `largest`.
 [[nodiscard]] bool IsNumber(std::string_view text, std::uint64_t largest);
 /// Small letters, and "/" as "\": two paths with the same key are one file to a device.

@@ -9,8 +9,6 @@
 namespace tools {
 namespace {
 
-struct FieldRow;
-
 /// What the walk remembers between two calls.
 class Reader {
  public:
@@ -36,7 +34,6 @@ class Reader {
   void End(const JobGroup& group);
   void EndFile();
   void EndUpgrade(int line);
-  void CheckText(const JobField& field, const FieldRow& row);
 
   /// The letter case of three groups' names counts for some fields.
   bool IsGroup(std::string_view exact);
@@ -146,10 +143,6 @@ bool Is(const JobGroup& group, std::string_view name) {
   return base::EqualIgnoringCase(group.name, name);
 }
 
-bool IsBlank(char letter) {
-  return letter == ' ' || (letter >= '\t' && letter <= '\r');
-}
-
 // ---- where fields go ----
 
 bool Reader::IsGroup(std::string_view exact) {
@@ -194,22 +187,6 @@ Setting* Reader::Test(Setting TestSettings::*setting) {
 
 // ---- the walk ----
 
-void Reader::CheckText(const JobField& field, const FieldRow& row) {
-  const std::string& text = field.value;
-  if (row.limit > 0 && text.size() > row.limit) {
-    Add(Rule::kCutText, field.line,
-        std::string(row.name) + " has " + std::to_string(text.size()) + " characters, the device " +
-            "keeps " + std::to_string(row.limit));
-  }
-  const bool ascii = std::all_of(text.begin(), text.end(), [](char letter) {
-    return IsBlank(letter) || (letter >= ' ' && letter <= '~');
-  });
-  if (!ascii) Add(Rule::kNotAscii, field.line, std::string(row.name) + " " + Quoted(text));
-  if (row.limit > 0 && !text.empty() && (IsBlank(text.front()) || IsBlank(text.back()))) {
-    Add(Rule::kOuterBlanks, field.line, std::string(row.name) + " " + Quoted(text));
-  }
-}
-
 void Reader::Field(const JobField& field) {
   line_ = field.line;
   const FieldRow* const row = FindField(field.name);
@@ -236,7 +213,7 @@ void Reader::Field(const JobField& field) {
     }
     return;
   }
-  CheckText(field, *row);
+  CheckTextOf({field.value, field.line}, row->name, row->limit, name_, findings_);
   *place = {row->limit > 0 ? field.value.substr(0, row->limit) : field.value, field.line};
   if (place == &stop_) job_.stops.push_back(stop_);
 }

@@ -33,6 +33,12 @@ struct TestSettings {
   int line = 0;
 };
 
+/// A firmware package, which only configuration files have.
+struct PackageSettings {
+  Setting hardware, flash, source, base, destination, count, command_line, options;
+  int line = 0;
+};
+
 /// What the walk leaves behind. Lists are in the order in which the device has them.
 struct DeviceJob {
   Setting syslog_address, syslog_port;
@@ -45,7 +51,10 @@ struct DeviceJob {
   std::vector<StoreSettings> stores;
   std::vector<TestSettings> tests;
   std::vector<Setting> deletes, saves, stops;
-  int upgrade_line = 0;  ///< of the group whose end starts the job; 0: there is none
+  std::vector<PackageSettings> packages;
+  Setting inf;
+  int upgrade_line = 0;           ///< of the group whose end starts the job; 0: there is none
+  bool is_configuration = false;  ///< from a configuration file: an upgrade client runs it
 };
 
 /// Walks `job` by the configlet's rules: names by their leading parts, the first field in its

@@ -8,7 +8,10 @@
 #include "server/site.h"
 #include "tools/bundle.h"
 #include "tools/failure.h"
+#include "tools/file_text.h"
 #include "tools/lint/checks.h"
+#include "tools/lint/device_configuration.h"
+#include "tools/served_files.h"
 
 namespace tools {
 namespace {
@@ -20,32 +23,32 @@ constexpr std::size_t kTextShown = 200;
 
 /// Where the job lies and what serves its files.
 struct Source {
-  fs::path job;
-  fs::path root;  ///< empty: the server is not at hand
-  bool is_bundle = false;
+  std::vector<fs::path> jobs;  ///< a bundle may have one of each kind
+  fs::path root;               ///< empty: the server is not at hand
+  bool lists_all = false;      ///< the one job should name all that is served
 };
 
 /// The served folder of a bundle, or the folder itself.
 void SetServed(Source& source, const fs::path& folder) {
-  if (!fs::is_directory(folder)) {
-    throw Failure(ExitCode::kBadInput, folder.string(), "there is no such bundle or folder",
-                  "name a bundle, or the folder that is served");
-  }
-  source.is_bundle = fs::exists(folder / kBundleManifest);
-  source.root = source.is_bundle ? folder / kBundleTree : folder;
+  source.root = ServedFolder(folder);
+  source.lists_all =
+      fs::exists(folder / kBundleManifest) && !fs::exists(folder / kBundleConfiguration);
 }
 
 Source FindSource(const LintOptions& options) {
   Source source;
-  source.job = options.file;
   fs::path beside = options.file.parent_path().empty() ? fs::path(".") : options.file.parent_path();
   if (fs::is_directory(options.file)) {
-    source.job = options.file / kBundleJob;
     beside = options.file;
-    if (!fs::exists(source.job)) {
+    for (const char* name : {kBundleJob, kBundleConfiguration}) {
+      if (fs::exists(beside / name)) source.jobs.push_back(beside / name);
+    }
+    if (source.jobs.empty()) {
       throw Failure(ExitCode::kBadInput, options.file.string(), "there is no job.xml in the folder",
                     "name a job file, or a bundle of 'orvenix bundle make'");
     }
+  } else {
+    source.jobs.push_back(options.file);
   }
   if (!options.served.empty()) {
     SetServed(source, options.served);
@@ -69,6 +72,16 @@ void PrintRule(std::ostream& out, const RuleRow& rule, const std::vector<const F
   out << "  device: " << rule.device << "\n  fix:    " << rule.fix << "\n";
 }
 
+/// What holds for jobs of both kinds.
+void CheckAll(const JobCheck& check, server::Site* site, bool unlisted) {
+  CheckTests(check);
+  CheckMessages(check);
+  CheckServer(check);
+  CheckFiles(check, site, unlisted);
+  CheckCleanup(check);
+  CheckProcesses(check);
+}
+
 }  // namespace
 
 Findings LintJob(const Job& job, const std::string& name, server::Site* site, bool unlisted) {
@@ -77,14 +90,18 @@ Findings LintJob(const Job& job, const std::string& name, server::Site* site, bo
   if (read.upgrade_line > 0) {
     const JobCheck check{read, name, findings};
     CheckStorage(check);
-    CheckTests(check);
-    CheckMessages(check);
-    CheckServer(check);
-    CheckFiles(check, site, unlisted);
-    CheckCleanup(check);
-    CheckProcesses(check);
+    CheckAll(check, site, unlisted);
     CheckMulticast(check);
   }
+  findings.Sort();
+  return findings;
+}
+
+Findings LintConfiguration(std::string_view text, const std::string& name, server::Site* site,
+                           bool unlisted) {
+  Findings findings;
+  const DeviceJob read = ReadConfiguration(text, name, findings);
+  CheckAll({read, name, findings}, site, unlisted);
   findings.Sort();
   return findings;
 }
@@ -138,19 +155,27 @@ void RefuseErrors(const std::string& name, const Findings& findings, const std::
 
 void Lint(const LintOptions& options) {
   const Source source = FindSource(options);
-  const std::string name = source.job.string();
-  const Job job = ReadJob(source.job);
   std::optional<server::Site> site;
   if (!source.root.empty()) site.emplace(source.root);
-  const Findings findings = LintJob(job, name, site ? &*site : nullptr, source.is_bundle);
-  if (options.json) {
-    std::cout << FindingsJson(name, findings)
-                     .dump(-1, ' ', false, nlohmann::json::error_handler_t::replace)
-              << std::endl;
-  } else {
-    PrintFindings(std::cout, name, findings);
+  server::Site* const served = site ? &*site : nullptr;
+  std::vector<std::pair<std::string, Findings>> all;
+  for (const fs::path& job : source.jobs) {
+    const std::string name = job.string();
+    const std::string text = ReadWholeFile(job);
+    all.emplace_back(name, IsConfiguration(text)
+                               ? LintConfiguration(text, name, served, false)
+                               : LintJob(ParseJob(text, name), name, served, source.lists_all));
+    if (options.json) {
+      std::cout << FindingsJson(name, all.back().second)
+                       .dump(-1, ' ', false, nlohmann::json::error_handler_t::replace)
+                << std::endl;
+    } else {
+      PrintFindings(std::cout, name, all.back().second);
+    }
   }
-  RefuseErrors(name, findings, "mend them before the job is sent");
+  for (const auto& [name, findings] : all) {
+    RefuseErrors(name, findings, "mend them before the job is sent");
+  }
 }
 
 }  // namespace tools

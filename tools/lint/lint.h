@@ -5,6 +5,7 @@
 #include <iosfwd>
 #include <nlohmann/json.hpp>
 #include <string>
+#include <string_view>
 
 #include "tools/job_file.h"
 #include "tools/lint/finding.h"
@@ -21,6 +22,11 @@ namespace tools {
 [[nodiscard]] Findings LintJob(const Job& job, const std::string& name,
                                server::Site* site = nullptr, bool unlisted = false);
 
+/// The same for a configuration file, whose text is given. Throws Failure kBadInput when it is no
+/// XML.
+[[nodiscard]] Findings LintConfiguration(std::string_view text, const std::string& name,
+                                         server::Site* site = nullptr, bool unlisted = false);
+
 /// By rule: what was found and where, what the device does, how to mend it.
 void PrintFindings(std::ostream& out, const std::string& name, const Findings& findings);
 [[nodiscard]] nlohmann::ordered_json FindingsJson(const std::string& name,
@@ -33,7 +39,7 @@ void PrintFindings(std::ostream& out, const std::string& name, const Findings& f
 void RefuseErrors(const std::string& name, const Findings& findings, const std::string& advice);
 
 struct LintOptions {
-  std::filesystem::path file;    ///< a job file or a bundle
+  std::filesystem::path file;    ///< a job file, a configuration file or a bundle
   std::filesystem::path served;  ///< a bundle or served folder; empty: the bundle the job lies in
   bool json = false;
 };
