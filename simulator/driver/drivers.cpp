@@ -7,8 +7,10 @@
 #include "ce/errors.h"
 #include "ce/system.h"
 #include "device/device.h"
+#include "driver/disk_driver.h"
 #include "driver/flash_driver.h"
 #include "locale/code_pages.h"
+#include "profile/profile.h"
 #include "registry/registry.h"
 
 namespace sim {
@@ -72,6 +74,10 @@ class Drivers::Opened final : public KernelObject {
 
 Drivers::Drivers(Device& device) : device_(device) {
   SetLibrary(u"eflashdrv.dll", [](Device& on) { return std::make_shared<FlashDriver>(on); });
+  const Profile& profile = device.profile();
+  if (profile.disk_generation == 0) return;
+  AddBuiltIn(u"DSK0:",
+             std::make_shared<DiskDriver>(profile.disk_generation, profile.disk_capacity));
 }
 
 Drivers::~Drivers() = default;

@@ -40,7 +40,8 @@ class Drivers {
  public:
   using Factory = std::function<std::shared_ptr<StreamDriver>(Device&)>;
 
-  /// Knows "eflashdrv.dll", the flash driver; loads nothing.
+  /// Knows "eflashdrv.dll", the flash driver, but does not load it; has loaded the disk "DSK0:" if
+  /// the device has one.
   explicit Drivers(Device& device);
   ~Drivers();
   Drivers(const Drivers&) = delete;

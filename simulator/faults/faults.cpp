@@ -1,11 +1,32 @@
 #include "faults/faults.h"
 
+#include <execinfo.h>
+
+#include <array>
 #include <cstdio>
 #include <cstdlib>
 #include <functional>
 #include <utility>
 
 namespace sim {
+namespace {
+
+/// How far outwards two calls must have come the same way to be of one place. Far enough to know a
+/// helper's callers apart, and not so far that every line of a log is a place of its own.
+constexpr int kFrames = 8;
+
+std::uint64_t PlaceOfCaller() {
+  std::array<void*, kFrames> frames{};
+  const int count = backtrace(frames.data(), kFrames);
+  std::uint64_t place = 0xCBF29CE484222325U;  // FNV-1a, a word at a time
+  for (int i = 0; i < count; ++i) {
+    place ^= reinterpret_cast<std::uintptr_t>(frames[static_cast<std::size_t>(i)]);
+    place *= 0x100000001B3U;
+  }
+  return place;
+}
+
+}  // namespace
 
 void Faults::Add(FaultRule rule) {
   const std::lock_guard<std::mutex> guard(mutex_);
@@ -16,7 +37,18 @@ void Faults::Add(FaultRule rule) {
 void Faults::Clear() {
   const std::lock_guard<std::mutex> guard(mutex_);
   rules_.clear();
-  armed_.store(false, std::memory_order_relaxed);
+  armed_.store(notes_places_, std::memory_order_relaxed);
+}
+
+void Faults::NotePlaces() {
+  const std::lock_guard<std::mutex> guard(mutex_);
+  notes_places_ = true;
+  armed_.store(true, std::memory_order_relaxed);
+}
+
+std::vector<std::uint64_t> Faults::places() const {
+  const std::lock_guard<std::mutex> guard(mutex_);
+  return places_;
 }
 
 // One name may have several addresses, one for each source file that spells it: Count adds up.
@@ -44,6 +76,7 @@ bool Faults::Enter(const char* call, bool can_fail, std::uint32_t usual_error,
 bool Faults::Judge(std::string_view call, bool can_fail, std::uint32_t usual_error,
                    std::uint32_t& error) {
   const std::lock_guard<std::mutex> guard(mutex_);
+  if (notes_places_ && can_fail) places_.push_back(PlaceOfCaller());
   bool fails = false;
   for (Armed& armed : rules_) {
     const FaultRule& rule = armed.rule;

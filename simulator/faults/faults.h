@@ -37,6 +37,13 @@ class Faults {
   /// @return true, with `error`, when a rule lets the call fail.
   bool Enter(const char* call, bool can_fail, std::uint32_t usual_error, std::uint32_t& error);
 
+  /// Tells calls apart by the place of the program that makes them, from now on.
+  void NotePlaces();
+  /// Of each call that can fail since NotePlaces, in their order: a number for the place that makes
+  /// it. Equal numbers come from the same line, reached by the same way through the functions
+  /// around it; the numbers mean nothing to another process, unless that was forked from this one.
+  [[nodiscard]] std::vector<std::uint64_t> places() const;
+
   /// How often `call` was entered; "*" for the calls that can fail.
   [[nodiscard]] std::uint64_t Count(std::string_view call) const;
   /// How many calls were made to fail.
@@ -64,6 +71,8 @@ class Faults {
   std::atomic<bool> armed_{false};
   mutable std::mutex mutex_;
   std::vector<Armed> rules_;
+  bool notes_places_ = false;
+  std::vector<std::uint64_t> places_;
   std::uint64_t fired_ = 0;
   std::string last_fired_;
 };

@@ -71,6 +71,9 @@ struct Profile {
 
   // Firmware.
   std::string flash_start = "writes";  ///< what starting the flash does: writes, fails or restarts
+  std::uint8_t disk_generation =
+      0;  ///< code of the flash chip of "DSK0:"; 0: there is no such disk
+  std::uint32_t disk_capacity = 64U << 20U;  ///< of that chip, in bytes
 
   // Time.
   std::string start_time = "2006-03-01 14:05:09";  ///< local time at which a virtual world begins

@@ -189,6 +189,10 @@ std::vector<Setting<Profile>> MakeProfileSettings() {
            "Starting it writes what its driver stores, fails, or writes and restarts the device.",
            CheckFlashStart),
 
+      Number("disk", "generation", &P::disk_generation, 0, 255,
+             "Flash chip of DSK0:. 7 and 9: G3, 13: G4, 15: H3, others: unknown; 0: no such disk."),
+      Number("disk", "capacity", &P::disk_capacity, 0, kMost<std::uint32_t>, "Of it, in bytes."),
+
       Text("time", "start", &P::start_time, "Local time at which a virtual world begins.",
            CheckTime),
       Number("time", "utc_offset_minutes", &P::utc_offset_minutes, -1440, 1440,

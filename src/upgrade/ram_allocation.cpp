@@ -33,7 +33,8 @@ void InitRam(const UpgradeConfig& job) noexcept {
   const std::uint32_t bytes = base::LeadingNumber(size.view()) + kDriverRoom;
   report::ShowStatus("InitRAM = %d", static_cast<int>(bytes));
   device::SetRAMSize(bytes);
-  // A store that an earlier job has made goes on with its size.
+  // KEPT ODDITY: a store that an earlier job has made goes on with its size and with what is in it.
+  // An image that does not fit is tried for ever, and what an earlier job flashed is flashed again.
   if (device::HasRAMStore() || device::InitRAMStore()) return;
   report::Log("Orvenix - InitRAM - RAM init error = %s\r\n", size.c_str());
 }

@@ -16,6 +16,7 @@
 #include "upgrade/file_lists.h"
 #include "upgrade/flash_step.h"
 #include "upgrade/keep_awake.h"
+#include "upgrade/loader_images.h"
 #include "upgrade/memory_division.h"
 #include "upgrade/multicast_launch.h"
 #include "upgrade/pass_state.h"
@@ -189,7 +190,10 @@ void CarryOut(Run& run, std::int32_t mode) noexcept {
   KeepOrDeletePassState(run);
   Log("Orvenix - SendUpgradeComplete\r\n");
   http::SendUpgradeComplete(run.job, run.error_text.c_str());
-  if (run.os_image && run.succeeded) FlashOsImage();
+  if (run.os_image && run.succeeded) {
+    KeepMatchingLoaderImage(run.job);
+    FlashOsImage();
+  }
   ShowOutcome(run);
 }
 

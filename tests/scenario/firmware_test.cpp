@@ -1,10 +1,8 @@
 // Firmware: images that come into the flash driver's store and are written into the flash.
+#include "scenario/firmware_test.h"
+
 #include <gmock/gmock.h>
 
-#include <algorithm>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <memory>
 #include <string>
 #include <vector>
@@ -14,12 +12,9 @@
 #include "device/flash/ram_file.h"
 #include "driver/drivers.h"
 #include "faults/faults.h"
-#include "kernel/debug.h"
 #include "memory/memory.h"
-#include "orvenix/configlet.h"
 #include "orvenix/upgrade_thread.h"
 #include "product_support/jobs.h"
-#include "scenario/scenario_test.h"
 #include "server/multicast_run.h"
 #include "tools/fleet/fleet.h"
 #include "tools/virtual_multicast.h"
@@ -27,7 +22,6 @@
 namespace {
 
 using std::chrono::seconds;
-using test::HostJob;
 using test::ReadLog;
 using ::testing::AllOf;
 using ::testing::Contains;
@@ -37,47 +31,14 @@ using ::testing::IsEmpty;
 using ::testing::IsSupersetOf;
 using ::testing::Not;
 
-constexpr char kOtherEnd[] = "(none)";
-
-class FirmwareTest : public test::ScenarioTest {
+class FirmwareTest : public test::FirmwareScenario {
  protected:
-  explicit FirmwareTest(const std::string& flash_start = "writes")
-      : ScenarioTest(ProfileFor(flash_start)) {
+  explicit FirmwareTest(const sim::Profile& profile = test::FirmwareProfile())
+      : FirmwareScenario(profile) {
     network().SetDefaultLink(fleet::Plan::DefaultLink());
-    job_.store = "RAM:";
-    job_.required_space = "1000000";
   }
   ~FirmwareTest() override { port_.reset(); }
 
-  static sim::Profile ProfileFor(const std::string& flash_start) {
-    sim::Profile profile;
-    profile.address = "10.0.0.1";
-    profile.flash_start = flash_start;
-    return profile;
-  }
-
-  /// What was written into the flash under this name.
-  std::string Flashed(const std::string& name) {
-    const auto path = device().folder() / "flash" / name;
-    if (!std::filesystem::exists(path)) return kOtherEnd;
-    std::ifstream file(path, std::ios::binary);
-    return {std::istreambuf_iterator<char>(file), {}};
-  }
-  std::size_t FlashedFiles() {
-    const auto folder = device().folder() / "flash";
-    if (!std::filesystem::exists(folder)) return 0;
-    const std::filesystem::directory_iterator begin(folder);
-    return static_cast<std::size_t>(std::distance(begin, {}));
-  }
-
-  /// Lists the image for the job and puts it on the HTTP server.
-  void List(const std::string& name, const std::string& image) {
-    const std::string crc = server().Put("fw/" + name, image);
-    list_ += "fw/" + name + ",RAM:" + name + ",TQ5*," + crc + "," + std::to_string(image.size()) +
-             "\r\n";
-    const std::string list_crc = server().Put("fw/list.txt", list_);
-    job_.list = test::HostFile{"fw/list.txt", "\\list.txt", "*", list_crc};
-  }
   void Announce(const std::string& name, const std::string& image) {
     files_.push_back({name, "", 0x20, "2006-03-01 14:05:09", server::MemoryContent(image)});
   }
@@ -90,29 +51,10 @@ class FirmwareTest : public test::ScenarioTest {
         std::make_unique<tools::VirtualMulticast>(world(), sim::Endpoint{0x0A000002, 7001}, *run_);
     After(seconds(10), [this] { port_->Start(); });
   }
-  void RunJob() {
-    EXPECT_EQ(Start(job_), ICFG_OK);
-    ASSERT_TRUE(test::AwaitEndOfJobs(device()));
-  }
-  std::size_t Count(const std::string& line) const {
-    const std::string text = device_text();
-    std::size_t count = 0;
-    for (std::size_t at = text.find(line); at != std::string::npos; at = text.find(line, at + 1)) {
-      ++count;
-    }
-    return count;
-  }
 
-  HostJob job_;
-  std::string list_;
   std::vector<server::MulticastFile> files_;
   std::unique_ptr<server::MulticastRun> run_;
   std::unique_ptr<tools::VirtualMulticast> port_;
-
- private:
-  std::string device_text() const {
-    return const_cast<FirmwareTest*>(this)->device().debug().KernelText();
-  }
 };
 
 TEST_F(FirmwareTest, ComesByHttpIntoTheStoreAndIsFlashed) {
@@ -235,19 +177,6 @@ TEST_F(FirmwareTest, GoesIntoTheStoreAtTheSecondTryAfterADriverThatARestartTook)
   EXPECT_THAT(ShownLines(), Contains("RAMFile::Init - ok"));
 }
 
-TEST_F(FirmwareTest, OfTheNextJobGoesIntoTheSameStore) {
-  List("os.nb0", "the first image");
-  RunJob();
-  list_.clear();
-  List("os.nb0", "the second");
-
-  RunJob();
-
-  EXPECT_EQ(Flashed("os.nb0"), "the second");
-  EXPECT_EQ(Count("Allocated"), 1U);
-  EXPECT_THAT(ReadLog(), Not(HasSubstr("RAM init error")));
-}
-
 TEST_F(FirmwareTest, IsGivenBackWhole) {
   List("os.nb0", fleet::Noise(100000, 6));
   const test::Holdings before = test::HoldingsOf(device());
@@ -260,7 +189,7 @@ TEST_F(FirmwareTest, IsGivenBackWhole) {
 
 class FailingFlashTest : public FirmwareTest {
  protected:
-  FailingFlashTest() : FirmwareTest("fails") {}
+  FailingFlashTest() : FirmwareTest(test::FirmwareProfile("fails")) {}
 };
 
 TEST_F(FailingFlashTest, LeavesTheJobASuccess) {
@@ -274,7 +203,7 @@ TEST_F(FailingFlashTest, LeavesTheJobASuccess) {
 
 class RestartingFlashTest : public FirmwareTest {
  protected:
-  RestartingFlashTest() : FirmwareTest("restarts") {}
+  RestartingFlashTest() : FirmwareTest(test::FirmwareProfile("restarts")) {}
 };
 
 TEST_F(RestartingFlashTest, EndsTheJobWhereTheDeviceRestarts) {

@@ -52,6 +52,30 @@ TEST_F(FaultsTest, ARuleWithoutErrorSetsTheUsualOne) {
   EXPECT_EQ(GetLastError(), ERROR_NOT_ENOUGH_MEMORY);
 }
 
+TEST_F(FaultsTest, CallsAreToldApartByTheirPlacesAndTheWaysThere) {
+  const auto other = [this] { return Set(event_, 2); };
+  faults().NotePlaces();
+  Set(event_, 2);
+  SetEvent(event_);
+  other();
+  GetTickCount();  // cannot fail
+  const std::vector<std::uint64_t> places = faults().places();
+  ASSERT_EQ(places.size(), 5U);
+  EXPECT_EQ(places[0], places[1]);
+  EXPECT_NE(places[0], places[2]);
+  EXPECT_EQ(places[3], places[4]);
+  EXPECT_NE(places[0], places[3]) << "the same line, by another way";
+}
+
+TEST_F(FaultsTest, PlacesAreNotedBesideRules) {
+  faults().Add({"SetEvent", 2, 1, 5});
+  faults().NotePlaces();
+  EXPECT_EQ(Set(event_, 3), ".x.");
+  faults().Clear();
+  EXPECT_EQ(Set(event_, 1), ".");
+  EXPECT_EQ(faults().places().size(), 4U);
+}
+
 TEST_F(FaultsTest, AFailedCallHasNoEffect) {
   faults().Add({"SetEvent", 1, 1, 5});
   Set(event_, 1);

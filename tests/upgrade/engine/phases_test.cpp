@@ -17,8 +17,8 @@
 #include "net/network.h"
 #include "product_support/jobs.h"
 #include "product_support/log_lines.h"
+#include "product_support/status_lines.h"
 #include "product_support/upgrade_server.h"
-#include "report/window/window_state.h"
 #include "support/device_files.h"
 #include "support/device_test.h"
 #include "upgrade/fetch.h"
@@ -33,33 +33,25 @@ using test::GetFile;
 using test::LogLinesWith;
 using test::PutFile;
 using test::ReadLog;
+using test::StatusLines;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::Not;
 using ::testing::Optional;
 
-std::vector<std::string> StatusLines() {
-  std::vector<std::string> lines;
-  report::LineList::Line line;
-  for (int i = 0; report::window_state.lines.Copy(i, line); ++i) {
-    lines.emplace_back(line.view().begin(), line.view().end());
-  }
-  return lines;
-}
-
 class PhasesTest : public DeviceTest {
  protected:
   PhasesTest()
       : server_(world()), network_(world()), job_(std::make_unique<UpgradeConfig>()), run_(*job_) {
-    report::window_state.lines.Clear();
+    test::ClearStatusLines();
     job().SetBaseURL(test::kServerUrl);
     test::SetMfgString(job(), "TQ52-A1");
   }
 
   ~PhasesTest() override {
     http::ReleaseJobClient();
-    report::window_state.lines.Clear();
+    test::ClearStatusLines();
   }
 
   UpgradeConfig& job() { return *job_; }
