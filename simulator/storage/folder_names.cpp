@@ -7,6 +7,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <climits>
 #include <cstring>
 
 #include "storage/device_path.h"
@@ -18,6 +19,8 @@ namespace {
 /// Smaller folders are read as quickly as they are asked about.
 constexpr std::size_t kLarge = 64;
 constexpr std::size_t kMostFolders = 64;
+
+constexpr std::size_t kLargestEvent = sizeof(inotify_event) + NAME_MAX + 1;
 
 constexpr std::uint32_t kAppears = IN_CREATE | IN_MOVED_TO;
 constexpr std::uint32_t kVanishes = IN_DELETE | IN_MOVED_FROM;
@@ -98,6 +101,8 @@ void FolderNames::TakeChanges() {
       TakeChange(event.wd, event.mask, name);
       at += sizeof event + event.len;
     }
+    // Where one more would have had room, there was none.
+    if (static_cast<std::size_t>(got) + kLargestEvent <= events.size()) return;
   }
 }
 

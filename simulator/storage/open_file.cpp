@@ -78,15 +78,18 @@ ssize_t OpenFile::ReadHere(char* bytes, std::size_t size) {
   const bool ahead = ahead_.version == node_->version && position_ >= ahead_.at &&
                      position_ < ahead_.at + ahead_.size;
   if (!ahead) {
-    // The first piece comes alone: many a program looks at a file's head only.
-    if (size > kReadAhead / 4 || position_ == 0 || position_ != read_to_) {
-      return host_read(bytes, size);
-    }
+    const bool same = ahead_.version == node_->version;
+    // The host has already said that there is no more: it counts once, the next read asks again.
+    if (same && std::exchange(ahead_.ends, false) && position_ == ahead_.at + ahead_.size) return 0;
+    // The first piece of a large file comes alone: many a program looks at a file's head only.
+    const bool follows = position_ == read_to_ && (position_ != 0 || node_->size <= kReadAhead);
+    if (size > kReadAhead / 4 || !follows) return host_read(bytes, size);
     if (!ahead_.bytes) ahead_.bytes = std::make_unique<char[]>(kReadAhead);
     const ssize_t got = host_read(ahead_.bytes.get(), kReadAhead);
     ahead_.size = got > 0 ? static_cast<std::size_t>(got) : 0;
     ahead_.at = position_;
     ahead_.version = node_->version;
+    ahead_.ends = got > 0 && ahead_.size < kReadAhead;
     if (got <= 0) return got;
   }
   const std::size_t from = position_ - ahead_.at;

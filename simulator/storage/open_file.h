@@ -97,6 +97,7 @@ class OpenFile final : public KernelObject {
     std::uint64_t at = 0;
     std::size_t size = 0;
     std::uint64_t version = 0;  ///< of the content
+    bool ends = false;          ///< the file ended behind them, and nobody has been told
   };
 
   void NoteChange();

@@ -76,6 +76,17 @@ TEST_F(ReadAheadTest, EndsWhereTheFileWasCutMeanwhile) {
   EXPECT_EQ(Read(4096), "");
 }
 
+TEST_F(ReadAheadTest, SeesWhatIsAppendedAfterTheEndWasReached) {
+  SetFilePointer(reader_, 199'000, nullptr, FILE_BEGIN);
+  EXPECT_EQ(Read(400).size(), 400U);
+  EXPECT_EQ(Read(400).size(), 400U);
+  EXPECT_EQ(Read(400).size(), 200U);
+  Write(200'000, "more");
+  EXPECT_EQ(Read(400), "more");
+  EXPECT_EQ(Read(400), "");
+  EXPECT_EQ(Read(400), "");
+}
+
 TEST_F(ReadAheadTest, GoesBackAndForthAsTheProgramSeeks) {
   for (const LONG at : {0, 100, 50'000, 4096, 199'990, 8192}) {
     SetFilePointer(reader_, at, nullptr, FILE_BEGIN);
