@@ -6,6 +6,7 @@
 #include "ce/errors.h"
 #include "ce/files.h"
 #include "device/device.h"
+#include "installer/installer.h"
 #include "kernel/kernel.h"
 #include "locale/code_pages.h"
 #include "process/host_program.h"
@@ -131,6 +132,7 @@ DWORD Processes::FindProgram(const WCHAR* program, std::u16string& name) const {
   }
   if (path.names.empty()) return ERROR_FILE_NOT_FOUND;
   name = path.names.back();
+  if (FoldCase(name) == Installer::kProgram) return ERROR_SUCCESS;
   if (device_.profile().programs.count(ToHostText(FoldCase(name))) != 0) return ERROR_SUCCESS;
   const auto is_file = [this](const WCHAR* candidate) {
     DWORD attributes = 0;
@@ -150,10 +152,14 @@ DWORD Processes::Start(const WCHAR* program, const WCHAR* command_line,
   if (const DWORD error = FindProgram(program, name); error != ERROR_SUCCESS) return error;
   const auto& programs = device_.profile().programs;
   const auto named = programs.find(ToHostText(FoldCase(name)));
-  const ProgramProfile what = named == programs.end() ? ProgramProfile{} : named->second;
+  ProgramProfile what = named == programs.end() ? ProgramProfile{} : named->second;
   const Launch launch = {0, ToHostText(BoundedView(program, MAX_PATH)),
                          ToHostText(BoundedView(command_line, kMaxCommandLine))};
   if (!what.command.empty()) return StartCommand(launch, name, what, process);
+  if (named == programs.end() && FoldCase(name) == Installer::kProgram) {
+    const std::lock_guard<std::mutex> hold(installing_);
+    what = {"", Installer(device_).Run(launch.command_line), Installer::kRunMs};
+  }
   const auto lock = device_.world().Acquire();
   process = AddHeld(name);
   NoteLaunch(launch, process->id);

@@ -2,13 +2,15 @@
 //
 // The table begins with the program that the device's threads belong to and with what the profile
 // lists. CreateProcessW adds to it: a program of the device is what the profile names for it, a
-// command of the host or a built-in that ends with a given code after a given time. A program file
-// that lies in the storage but is not named is a built-in that ends at once with code 0.
+// command of the host or a built-in that ends with a given code after a given time. The package
+// installer is on every device (see Installer). A program file that lies in the storage but is not
+// named is a built-in that ends at once with code 0.
 #pragma once
 
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -112,6 +114,7 @@ class Processes {
                    std::uint32_t exit_code);
 
   Device& device_;
+  std::mutex installing_;  ///< one package at a time
   std::vector<std::shared_ptr<Process>> running_;
   std::vector<Launch> launches_;
   std::map<std::uint32_t, std::unique_ptr<HostProgram>> programs_;  ///< by process id

@@ -5,7 +5,8 @@
 namespace device {
 
 MappedFile::MappedFile(const char* path) noexcept {
-  const WideText<MAX_PATH> name(path);
+  WideText<MAX_PATH> name;
+  if (!name.Assign(path)) return;
   file_.Reset(CreateFileForMappingW(name.c_str(), GENERIC_READ, FILE_SHARE_READ, nullptr,
                                     OPEN_EXISTING, FILE_ATTRIBUTE_NORMAL, nullptr));
   if (!file_) return;

@@ -12,12 +12,14 @@ namespace device {
 /// Maps a file for reading while it exists. The bytes have no terminator behind them.
 class MappedFile {
  public:
-  /// @param path  at most 259 characters
+  /// @param path  at most 259 characters; no file has a longer one
   explicit MappedFile(const char* path) noexcept;
   ~MappedFile();
   MappedFile(const MappedFile&) = delete;
   MappedFile& operator=(const MappedFile&) = delete;
 
+  /// Whether the file could be opened, mapped or not.
+  [[nodiscard]] bool is_open() const noexcept { return static_cast<bool>(file_); }
   /// Empty when the file is, or could not be mapped.
   [[nodiscard]] std::string_view bytes() const noexcept { return bytes_; }
 

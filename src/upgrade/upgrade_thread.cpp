@@ -26,6 +26,7 @@
 #include "upgrade/registry_tests.h"
 #include "upgrade/run.h"
 #include "upgrade/run_state/run_state.h"
+#include "upgrade/start_upgrade.h"
 #include "upgrade/storage_card.h"
 #include "upgrade/turn.h"
 
@@ -134,10 +135,12 @@ void KeepOrDeletePassState(const Run& run) noexcept {
   }
 }
 
-void ShowOutcome(const Run& run) noexcept {
+/// What came onto the device is put to use, or it is said why nothing came.
+void StartProgramOrShowError(const Run& run) noexcept {
   if (run.succeeded) {
     Log("Local Upgrade Executing\r\n");
     Sleep(kPauseMs);
+    StartUpgrade(run.job);
     return;
   }
   ShowStatus("%s", run.error_text.c_str());
@@ -194,7 +197,7 @@ void CarryOut(Run& run, std::int32_t mode) noexcept {
     KeepMatchingLoaderImage(run.job);
     FlashOsImage();
   }
-  ShowOutcome(run);
+  StartProgramOrShowError(run);
 }
 
 void ShowEnd() noexcept {

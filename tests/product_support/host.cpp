@@ -97,6 +97,13 @@ std::uint32_t WalkJob(const HostJob& job) {
   IcfgEndGroup("HTTPServer", 0, 0);
   WalkPreparation(job);
   WalkFiles(job);
+  if (!job.program.empty()) {
+    IcfgBeginGroup("StartProcess", 0, 0);
+    Set("Process", job.program);
+    Set("Parameters", job.parameters);
+    Set("Wait", job.wait);
+    IcfgEndGroup("StartProcess", 0, 0);
+  }
   if (!job.multicast.empty()) {
     IcfgBeginGroup("MulticastClient", 0, 0);
     Set("Parameters", job.multicast);

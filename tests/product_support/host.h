@@ -44,6 +44,9 @@ struct HostJob {
   std::vector<std::string> stop;     ///< programs
   std::vector<std::string> cleared;  ///< files and folders
   std::vector<std::string> saved;
+  std::string program;     ///< started at the end,
+  std::string parameters;  ///< with these,
+  std::string wait;        ///< and waited for unless this is "false"
 };
 
 /// Walks all groups but "Upgrade"'s end. @return the result of beginning "Upgrade".

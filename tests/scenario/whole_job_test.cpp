@@ -142,6 +142,8 @@ TEST_F(WholeJobTest, LogsItsStepsInOrder) {
   const std::string report_end = "Orvenix - SendUpgradeComplete - Exiting\r\n";
   EXPECT_EQ(log.substr(log.find(report_end)), report_end +
                                                   "Local Upgrade Executing\r\n"
+                                                  "Orvenix - StartUpgrade - Entering\r\n"
+                                                  "Orvenix - StartUpgrade - Exiting\r\n"
                                                   "Orvenix - UpgradeThread - Exiting\r\n"
                                                   "Orvenix - DeleteUpgradeInProgressEvent\r\n"
                                                   "CloseTransferHandle");
