@@ -29,10 +29,29 @@ def noise(seed, size):
     return random.Random(seed).randbytes(size)
 
 
+def can_pack():
+    """Whether the program makes packages for the installer; without one none is installed."""
+    verbs = demo.orvenix("bundle", "--help", capture_output=True, text=True).stdout
+    return any(line.split()[:1] == ["cab"] for line in verbs.splitlines())
+
+
+def make_package(out):
+    application = out / "application"
+    (application / "bin").mkdir(parents=True)
+    (application / "bin/scan.exe").write_bytes(noise(1, 200 * 1024))
+    (application / "scan.ini").write_text("[scan]\nbeep=1\n")
+    values = out / "scan.reg"
+    values.write_text("Windows Registry Editor Version 5.00\n\n"
+                      f"[HKEY_LOCAL_MACHINE\\{REGISTRY}]\n\"Version\"=dword:00000007\n")
+    demo.must("orvenix bundle cab", "bundle", "cab", application, out / "firmware" / CABINET,
+              "--application", APPLICATION, "--provider", PROVIDER, "--registry", values)
+    shutil.copyfile(out / "firmware" / CABINET, out / "files" / CABINET)
+
+
 def make_inputs(out):
-    """Images, loaders, an application for the installer, and numbered parts."""
-    firmware, files, application = out / "firmware", out / "files", out / "application"
-    for folder in (firmware, files, application / "bin"):
+    """Images, loaders and numbered parts."""
+    firmware, files = out / "firmware", out / "files"
+    for folder in (firmware, files):
         folder.mkdir(parents=True)
     (firmware / IMAGE).write_bytes(noise(52, 5 * 1024 * 1024))
     (firmware / RADIO).write_bytes(noise(53, 300 * 1024))
@@ -40,14 +59,7 @@ def make_inputs(out):
         (firmware / name).write_bytes(noise(number, 64 * 1024))
     for number, name in enumerate(PARTS):
         (firmware / name).write_bytes(noise(90 + number, 700 * 1024))
-    (application / "bin/scan.exe").write_bytes(noise(1, 200 * 1024))
-    (application / "scan.ini").write_text("[scan]\nbeep=1\n")
-    values = out / "scan.reg"
-    values.write_text("Windows Registry Editor Version 5.00\n\n"
-                      f"[HKEY_LOCAL_MACHINE\\{REGISTRY}]\n\"Version\"=dword:00000007\n")
-    demo.must("orvenix bundle cab", "bundle", "cab", application, firmware / CABINET,
-              "--application", APPLICATION, "--provider", PROVIDER, "--registry", values)
-    for name in (IMAGE, RADIO, CABINET, *LOADERS.values()):
+    for name in (IMAGE, RADIO, *LOADERS.values()):
         shutil.copyfile(firmware / name, files / name)
 
 
@@ -125,7 +137,7 @@ def judge_package(device, events, out):
             demo.row("registry", known and value, f"{APPS_KEY}; {REGISTRY}")]
 
 
-def upgrade_by_host(out, firmware):
+def upgrade_by_host(out, firmware, packed):
     """The first device: multicast, repair by HTTP, loaders, flash, package."""
     device, evidence, bundle = out / "device", out / "evidence", out / "bundle"
     evidence.mkdir()
@@ -133,7 +145,8 @@ def upgrade_by_host(out, firmware):
     demo.must("orvenix bundle make", "bundle", "make", out / "files", bundle, "--address",
               demo.SERVER, "--port", port, "--name", "demo", "--dest", "\\", "--dest-for",
               f"{IMAGE}=RAM:", "--dest-for", f"{RADIO}=RAM:", "--dest-for", f"{CABINET}=\\Temp",
-              "--program", INSTALLER, "--parameters", f"/noui \\Temp\\{CABINET}", "--multicast",
+              *(("--program", INSTALLER, "--parameters", f"/noui \\Temp\\{CABINET}") if packed
+                else ()), "--multicast",
               f"{demo.GROUP}:{demo.free_udp_port()}", "--device-text", demo.DEVICE_TEXT)
     demo.must("orvenix job lint", "job", "lint", bundle)
     make_device(device, "network.datagram_loss_percent=2", "flash.start=writes")
@@ -163,11 +176,11 @@ def upgrade_by_host(out, firmware):
                      f"{', '.join(fetched) or 'nothing'}: damaged on its way")]
     rows += judge_flash(device, evidence, (IMAGE, RADIO), firmware)
     rows += judge_loaders(device, events, firmware)
-    rows += judge_package(device, events, out)
+    rows += judge_package(device, events, out) if packed else []
     return rows
 
 
-def upgrade_by_client(out, firmware):
+def upgrade_by_client(out, firmware, packed):
     """The second device: a configuration file of two passes, and a restart between them."""
     device, evidence, bundle = out / "device-2", out / "evidence-2", out / "bundle-2"
     evidence.mkdir()
@@ -177,10 +190,12 @@ def upgrade_by_client(out, firmware):
     packages = [f"{firmware / IMAGE};hardware=TQ52*;pass=1"]
     packages += [f"{firmware / name};to=\\;hardware=TQ52*;pass=1" for name in LOADERS.values()]
     packages += [f"{firmware / PARTS[0]};to=\\Application;pass=2",
-                 f"{firmware / CABINET};to=\\Temp;pass=2;cmd=\\Temp\\{CABINET}",
                  f"{firmware / IMAGE};hardware=MV41*;pass=1"]
+    if packed:
+        packages += [f"{firmware / CABINET};to=\\Temp;pass=2;cmd=\\Temp\\{CABINET}"]
     demo.must("orvenix bundle make", "bundle", "make", empty, bundle, "--address", demo.SERVER,
-              "--port", port, "--name", "demo", "--program", INSTALLER, "--parameters", "/noui",
+              "--port", port, "--name", "demo",
+              *(("--program", INSTALLER, "--parameters", "/noui") if packed else ()),
               *(word for package in packages for word in ("--firmware", package)))
     demo.must("orvenix job lint", "job", "lint", bundle)
     make_device(device, "flash.start=restarts")
@@ -205,7 +220,8 @@ def upgrade_by_client(out, firmware):
                      f"{len(right)} files right")]
     rows += judge_flash(device, evidence, (IMAGE,), firmware)
     rows += judge_loaders(device, events, firmware)
-    rows += judge_package(device, [event for event in events if event is not ended[0]], out)
+    if packed:
+        rows += judge_package(device, [event for event in events if event is not ended[0]], out)
     for entry in rows:
         entry["what"] = f"client: {entry['what']}"
     return rows
@@ -215,9 +231,13 @@ def main(out: pathlib.Path):
     out.mkdir(parents=True)
     print("making firmware, a package and bundles ...", flush=True)
     make_inputs(out)
-    firmware = out / "firmware"
+    firmware, packed = out / "firmware", can_pack()
+    if packed:
+        make_package(out)
+    else:
+        print("no package is installed: this program makes none", flush=True)
     print("upgrading a device by multicast ...", flush=True)
-    rows = upgrade_by_host(out, firmware)
+    rows = upgrade_by_host(out, firmware, packed)
     print("upgrading a device without a host, in two passes ...", flush=True)
-    rows += upgrade_by_client(out, firmware)
+    rows += upgrade_by_client(out, firmware, packed)
     return demo.show(rows, out)
