@@ -14,6 +14,7 @@
 #include "tools/bundle_rules.h"
 #include "tools/failure.h"
 #include "tools/file_text.h"
+#include "tools/input_files.h"
 #include "tools/job_file.h"
 
 namespace tools {
@@ -23,32 +24,6 @@ namespace fs = std::filesystem;
 
 constexpr const char* kFormatName = "orvenix-bundle-1";
 constexpr std::size_t kCopyBlock = 1 << 20;
-
-/// A file of the input folder.
-struct InputFile {
-  fs::path path;
-  std::string relative;  ///< with "/" between folders
-};
-
-/// All files below `folder`, in the order of their names: the same on every machine.
-std::vector<InputFile> FindInput(const fs::path& folder) {
-  if (!fs::is_directory(folder)) {
-    throw Failure(ExitCode::kBadInput, folder.string(), "is not a folder",
-                  "name the folder that holds the bundle's files");
-  }
-  std::vector<InputFile> found;
-  for (const fs::directory_entry& entry : fs::recursive_directory_iterator(folder)) {
-    if (entry.is_directory() && !entry.is_symlink()) continue;
-    if (!entry.is_regular_file() || entry.is_symlink()) {
-      throw Failure(ExitCode::kBadInput, entry.path().string(), "is not a regular file",
-                    "put a copy of what it stands for in its place");
-    }
-    found.push_back({entry.path(), entry.path().lexically_relative(folder).generic_string()});
-  }
-  std::sort(found.begin(), found.end(),
-            [](const InputFile& a, const InputFile& b) { return a.relative < b.relative; });
-  return found;
-}
 
 std::uint32_t AttributeNamed(const std::string& name) {
   if (name == "read-only") return server::kAttributeReadOnly;
@@ -377,7 +352,7 @@ std::uint32_t ParseAttributes(const std::string& names) {
 Bundle MakeBundle(const BundleOptions& options) {
   CheckBundleOptions(options);
   try {
-    const std::vector<InputFile> input = FindInput(options.folder);
+    const std::vector<InputFile> input = FindInputFiles(options.folder);
     Bundle bundle = Plan(input, options);
     const ConfigurationPlan plan = PlanConfiguration(bundle, options);
     RefuseEmptyBundle(bundle, plan);

@@ -211,6 +211,7 @@ void AddBundleVerb(CLI::App& app, Action& action) {
       "      --firmware './os.nb0;to=RAM:;hardware=TQ52*;pass=1' \\\n"
       "      --firmware './apps001.zip;to=\\SDMMC Disk;pass=2'");
   make->callback([command, &action] { action = [command] { return Make(*command); }; });
+  AddPackageVerb(*bundle, action);
 }
 
 }  // namespace tools

@@ -14,6 +14,8 @@ using Action = std::function<ExitCode()>;
 
 /// Each adds one verb with its options, and sets `action` when the command line names it.
 void AddBundleVerb(CLI::App& app, Action& action);
+/// Adds `bundle cab` below `bundle`.
+void AddPackageVerb(CLI::App& bundle, Action& action);
 void AddJobVerb(CLI::App& app, Action& action);
 void AddServeVerb(CLI::App& app, Action& action);
 void AddDeviceVerb(CLI::App& app, Action& action);

@@ -199,7 +199,7 @@ class SetupReader {
         break;
       case 0x00010000:
         value.type = REG_MULTI_SZ;
-        value.data = Wide(content);
+        value.data = Wide(WithoutLastZero(content));
         break;
       case 0x00010001:
         if (content.size() != sizeof(DWORD)) throw std::runtime_error("a number of another size");
@@ -209,6 +209,13 @@ class SetupReader {
       default: throw std::runtime_error("a value of an unknown type");
     }
     return value;
+  }
+
+  /// Some packages count the zero behind the last of several texts, others do not.
+  static std::string_view WithoutLastZero(std::string_view texts) {
+    const std::size_t size = texts.size();
+    const bool counted = size >= 2 && texts[size - 1] == '\0' && texts[size - 2] == '\0';
+    return texts.substr(0, counted ? size - 1 : size);
   }
 
   /// With a zero at the end.
