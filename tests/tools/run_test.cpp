@@ -71,7 +71,7 @@ TEST_F(RunTest, TakesFromTheGroupWhatIsAnnouncedForItAndTheRestByHttp) {
                            " --device-text TQ52 --encrypt --http-only '*.txt' "
                            "--masks-for 'other.bin=MV41*'";
   MakeBundleFor(8080, more);
-  Start({"out", "--port", "0", "--json", "--expect", "1", "--wait", "5", "--report", "report.json",
+  Start({"out", "--port", "0", "--json", "--expect", "1", "--wait", "3", "--report", "report.json",
          "--pcap", "server.pcap"});
   MakeBundleFor(port_, more);
   MakeDevice("--set network.datagram_loss_percent=5");
@@ -182,7 +182,7 @@ TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
   MakeBundleFor(8080);
   MakeDevice("--set power.ac_line=0 --set power.battery_flag=4");
 
-  const Ended power = Run("run out/job.xml --device device");
+  const Ended power = Run("run out/job.xml --device device --hurry 50");
   EXPECT_EQ(power.code, static_cast<int>(ExitCode::kNoPower)) << power.errors;
   EXPECT_THAT(power.output,
               HasSubstr("event 205180 to TW_Event_DB@~MASTERKX: Power requirement not met\n"));
@@ -193,7 +193,7 @@ TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
   scratch_.Write("big.xml", job);
   fs::remove_all(scratch_.path() / "device");
   MakeDevice();
-  const Ended space = Run("run big.xml --device device");
+  const Ended space = Run("run big.xml --device device --hurry 50");
   EXPECT_EQ(space.code, static_cast<int>(ExitCode::kNoSpace)) << space.errors;
 
   job.replace(job.find("HTTPServer"), 10, "HTTPSender");
@@ -203,7 +203,7 @@ TEST_F(RunTest, TellsWhyADeviceRefusesAJob) {
   EXPECT_EQ(Events(linted.output).at(0).at("findings").at(0).at("id"), "unknown-group");
   EXPECT_THAT(linted.errors,
               HasSubstr("1 error in the job: unknown-group; see 'orvenix job lint'"));
-  const Ended unknown = Run("run unknown.xml --device device --force");
+  const Ended unknown = Run("run unknown.xml --device device --force --hurry 50");
   EXPECT_EQ(unknown.code, static_cast<int>(ExitCode::kUnknownName)) << unknown.errors;
   EXPECT_THAT(unknown.errors, HasSubstr("knows no group or field \"HTTPSender\""));
 }
