@@ -114,7 +114,7 @@ def judge_loaders(device, events, firmware):
     """Only the image of the device's own chip is left, and the screen has named the others."""
     left = [name for name in LOADERS.values() if on_device(device, "\\" + name).is_file()]
     own = LOADERS[GENERATION]
-    deleted = [text for text in statuses(events) if text.startswith("Deleting !")]
+    deleted = sorted({text for text in statuses(events) if text.startswith("Deleting !")})
     same = demo.sha256(on_device(device, "\\" + own)) == demo.sha256(firmware / own)
     others = [f"Deleting !{name}!" for name in LOADERS.values() if name != own]
     return [demo.row("loader images", left == [own] and same, f"{', '.join(left)} is left"),
@@ -128,9 +128,9 @@ def judge_package(device, events, out):
                for launch in event["launched"]]
     lines = [launch["command_line"] for launch in started]
     installed = on_device(device, f"\\Program Files\\{APPLICATION}\\bin\\scan.exe")
-    registry = (device / "registry.reg").read_text()
-    known = f"[HKEY_LOCAL_MACHINE\\{APPS_KEY}]" in registry
-    value = f"[HKEY_LOCAL_MACHINE\\{REGISTRY}]\n\"Version\"=dword:00000007" in registry
+    registry = (device / "registry.reg").read_text().lower()  # keys keep their first spelling
+    known = f"[HKEY_LOCAL_MACHINE\\{APPS_KEY}]".lower() in registry
+    value = f"[HKEY_LOCAL_MACHINE\\{REGISTRY}]\n\"Version\"=dword:00000007".lower() in registry
     right = demo.sha256(installed) == demo.sha256(out / "application/bin/scan.exe")
     return [demo.row("installer", len(started) == 1 and CABINET in lines[0], "; ".join(lines)),
             demo.row("installed files", right, str(installed.relative_to(device))),
