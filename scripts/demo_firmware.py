@@ -29,12 +29,6 @@ def noise(seed, size):
     return random.Random(seed).randbytes(size)
 
 
-def can_pack():
-    """Whether the program makes packages for the installer; without one none is installed."""
-    verbs = demo.orvenix("bundle", "--help", capture_output=True, text=True).stdout
-    return any(line.split()[:1] == ["cab"] for line in verbs.splitlines())
-
-
 def make_package(out):
     application = out / "application"
     (application / "bin").mkdir(parents=True)
@@ -137,7 +131,7 @@ def judge_package(device, events, out):
             demo.row("registry", known and value, f"{APPS_KEY}; {REGISTRY}")]
 
 
-def upgrade_by_host(out, firmware, packed):
+def upgrade_by_host(out, firmware):
     """The first device: multicast, repair by HTTP, loaders, flash, package."""
     device, evidence, bundle = out / "device", out / "evidence", out / "bundle"
     evidence.mkdir()
@@ -145,8 +139,7 @@ def upgrade_by_host(out, firmware, packed):
     demo.must("orvenix bundle make", "bundle", "make", out / "files", bundle, "--address",
               demo.SERVER, "--port", port, "--name", "demo", "--dest", "\\", "--dest-for",
               f"{IMAGE}=RAM:", "--dest-for", f"{RADIO}=RAM:", "--dest-for", f"{CABINET}=\\Temp",
-              *(("--program", INSTALLER, "--parameters", f"/noui \\Temp\\{CABINET}") if packed
-                else ()), "--multicast",
+              "--program", INSTALLER, "--parameters", f"/noui \\Temp\\{CABINET}", "--multicast",
               f"{demo.GROUP}:{demo.free_udp_port()}", "--device-text", demo.DEVICE_TEXT)
     demo.must("orvenix job lint", "job", "lint", bundle)
     make_device(device, "network.datagram_loss_percent=2", "flash.start=writes")
@@ -176,11 +169,11 @@ def upgrade_by_host(out, firmware, packed):
                      f"{', '.join(fetched) or 'nothing'}: damaged on its way")]
     rows += judge_flash(device, evidence, (IMAGE, RADIO), firmware)
     rows += judge_loaders(device, events, firmware)
-    rows += judge_package(device, events, out) if packed else []
+    rows += judge_package(device, events, out)
     return rows
 
 
-def upgrade_by_client(out, firmware, packed):
+def upgrade_by_client(out, firmware):
     """The second device: a configuration file of two passes, and a restart between them."""
     device, evidence, bundle = out / "device-2", out / "evidence-2", out / "bundle-2"
     evidence.mkdir()
@@ -190,12 +183,11 @@ def upgrade_by_client(out, firmware, packed):
     packages = [f"{firmware / IMAGE};hardware=TQ52*;pass=1"]
     packages += [f"{firmware / name};to=\\;hardware=TQ52*;pass=1" for name in LOADERS.values()]
     packages += [f"{firmware / PARTS[0]};to=\\Application;pass=2",
+                 f"{firmware / CABINET};to=\\Temp;pass=2;cmd=\\Temp\\{CABINET}",
                  f"{firmware / IMAGE};hardware=MV41*;pass=1"]
-    if packed:
-        packages += [f"{firmware / CABINET};to=\\Temp;pass=2;cmd=\\Temp\\{CABINET}"]
     demo.must("orvenix bundle make", "bundle", "make", empty, bundle, "--address", demo.SERVER,
               "--port", port, "--name", "demo",
-              *(("--program", INSTALLER, "--parameters", "/noui") if packed else ()),
+              "--program", INSTALLER, "--parameters", "/noui",
               *(word for package in packages for word in ("--firmware", package)))
     demo.must("orvenix job lint", "job", "lint", bundle)
     make_device(device, "flash.start=restarts")
@@ -220,8 +212,7 @@ def upgrade_by_client(out, firmware, packed):
                      f"{len(right)} files right")]
     rows += judge_flash(device, evidence, (IMAGE,), firmware)
     rows += judge_loaders(device, events, firmware)
-    if packed:
-        rows += judge_package(device, [event for event in events if event is not ended[0]], out)
+    rows += judge_package(device, [event for event in events if event is not ended[0]], out)
     for entry in rows:
         entry["what"] = f"client: {entry['what']}"
     return rows
@@ -231,13 +222,10 @@ def main(out: pathlib.Path):
     out.mkdir(parents=True)
     print("making firmware, a package and bundles ...", flush=True)
     make_inputs(out)
-    firmware, packed = out / "firmware", can_pack()
-    if packed:
-        make_package(out)
-    else:
-        print("no package is installed: this program makes none", flush=True)
+    make_package(out)
+    firmware = out / "firmware"
     print("upgrading a device by multicast ...", flush=True)
-    rows = upgrade_by_host(out, firmware, packed)
+    rows = upgrade_by_host(out, firmware)
     print("upgrading a device without a host, in two passes ...", flush=True)
-    rows += upgrade_by_client(out, firmware, packed)
+    rows += upgrade_by_client(out, firmware)
     return demo.show(rows, out)
