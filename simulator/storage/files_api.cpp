@@ -32,9 +32,13 @@ HANDLE OpenByName(sim::ApiCall& call, const WCHAR* name, const sim::Storage::Ope
 }
 
 /// A device has no file behind it: how it is shared and made is its driver's business.
-HANDLE OpenDevice(sim::ApiCall& call, const WCHAR* name, DWORD access) {
+HANDLE OpenDevice(sim::ApiCall& call, const sim::Storage::OpenRequest& request) {
+  const WCHAR* const name = request.name;
   call.Argument("name", name);
-  call.Argument("access", access);
+  call.Argument("access", request.mode.access);
+  call.Argument("share", request.mode.share);
+  call.Argument("disposition", request.disposition);
+  call.Argument("attributes", request.attributes);
   if (call.failed()) return call.Return(INVALID_HANDLE_VALUE);
   HANDLE opened = INVALID_HANDLE_VALUE;
   const DWORD error = call.device().drivers().Open(name, opened);
@@ -57,8 +61,10 @@ BOOL Finish(sim::ApiCall& call, DWORD error) {
 HANDLE CreateFileW(const WCHAR* name, DWORD access, DWORD share, SECURITY_ATTRIBUTES* /*security*/,
                    DWORD disposition, DWORD attributes, HANDLE /*template_file*/) {
   sim::ApiCall call("CreateFileW", ERROR_ACCESS_DENIED);
-  if (sim::Drivers::IsDeviceName(name)) return OpenDevice(call, name, access);
-  return OpenByName(call, name, {name, {access, share, false, false}, disposition, attributes});
+  const sim::Storage::OpenRequest request{
+      name, {access, share, false, false}, disposition, attributes};
+  if (sim::Drivers::IsDeviceName(name)) return OpenDevice(call, request);
+  return OpenByName(call, name, request);
 }
 
 // NOLINTNEXTLINE(readability-function-size): the platform's parameters

@@ -15,15 +15,13 @@ namespace {
 constexpr std::uint32_t kProtecting =
     FILE_ATTRIBUTE_READONLY | FILE_ATTRIBUTE_HIDDEN | FILE_ATTRIBUTE_SYSTEM;
 
-PackageResult ForgetInstallation(const SetupFile& setup) noexcept {
-  SetupFile::RegistryKey key;
-  const PackageResult result = setup.ReadKey(&key);
-  if (result != PackageResult::kDone) return result;
-  // Nothing was installed when it is not there; the package is prepared all the same.
-  static_cast<void>(
-      RegDeleteKeyW(HKEY_LOCAL_MACHINE,
-                    device::WideText<SetupFile::RegistryKey::capacity()>(key.view()).c_str()));
-  return PackageResult::kDone;
+/// @return kNameOrRegistry also when there was no such key: nothing was installed then.
+PackageResult ForgetInstallation(const SetupFile::RegistryKey& key) noexcept {
+  device::WideText<SetupFile::RegistryKey::capacity()> name;
+  // An empty name would mean the root itself.
+  if (!name.Assign(key.view())) return PackageResult::kNameOrRegistry;
+  const bool deleted = RegDeleteKeyW(HKEY_LOCAL_MACHINE, name.c_str()) == ERROR_SUCCESS;
+  return deleted ? PackageResult::kDone : PackageResult::kNameOrRegistry;
 }
 
 void Unprotect(device::File& files, const char* path) noexcept {
@@ -32,14 +30,15 @@ void Unprotect(device::File& files, const char* path) noexcept {
   if ((mask & kProtecting) != 0) files.SetAttributes(path, mask & ~kProtecting);
 }
 
-PackageResult UnprotectFiles(const SetupFile& setup) noexcept {
+/// @param before  what came of the step before, for the case that not one file can be looked at
+PackageResult UnprotectFiles(const SetupFile& setup, PackageResult before) noexcept {
   EntryIndex files(setup.stored(), setup.files());
   EntryIndex strings(setup.stored(), setup.strings());
   const std::uint32_t file_count = files.table().count;
   const std::uint32_t file_slots = files.SlotsFor(file_count);
   const std::uint32_t string_slots = strings.SlotsFor(0xFFFF);
   const auto slots = device::LocalBlock<std::uint32_t>::Allocate(file_slots + string_slots);
-  if (!slots) return PackageResult::kCannotRead;
+  if (!slots) return before == PackageResult::kDone ? PackageResult::kCannotRead : before;
   files.Build(slots.get(), file_slots);
   strings.Build(slots.get() + file_slots, string_slots);
 
@@ -64,8 +63,11 @@ PackageResult PreparePackage(const char* cabinet) noexcept {
   PackageResult result = FindSetupFile(file.bytes(), &stored);
   if (result != PackageResult::kDone) return result;
   const SetupFile setup(stored);
-  result = ForgetInstallation(setup);
-  return result == PackageResult::kDone ? UnprotectFiles(setup) : result;
+  SetupFile::RegistryKey key;
+  result = setup.ReadKey(&key);
+  if (result != PackageResult::kDone) return result;
+  // The files are prepared whatever comes of the key.
+  return UnprotectFiles(setup, ForgetInstallation(key));
 }
 
 }  // namespace upgrade

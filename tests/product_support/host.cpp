@@ -132,6 +132,14 @@ bool AwaitEndOfJobs(sim::Device& device, std::uint32_t limit_s) {
   return true;
 }
 
+bool IsRelease(std::string_view call) {
+  static constexpr std::string_view kReleases[] = {
+      "CloseHandle",     "FindClose",   "RegCloseKey",   "ReleasePowerRequirement",
+      "UnmapViewOfFile", "WSACleanup",  "DestroyWindow", "CloseToolhelp32Snapshot",
+      "TerminateThread", "closesocket", "PostMessageW",  "DeactivateDevice"};
+  return std::find(std::begin(kReleases), std::end(kReleases), call) != std::end(kReleases);
+}
+
 Holdings HoldingsOf(sim::Device& device) {
   Holdings holdings;
   holdings.handles = device.kernel().OpenHandles();

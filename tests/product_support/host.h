@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "device/device.h"
@@ -79,6 +80,10 @@ struct Holdings {
   }
 };
 Holdings HoldingsOf(sim::Device& device);
+
+/// Whether a call of this name gives something back or ends a thread: where it fails, what it was
+/// to give back is kept.
+bool IsRelease(std::string_view call);
 void PrintTo(const Holdings& holdings, std::ostream* out);
 
 /// Frees the job, and the records for one, that the configlet still keeps because no thread has

@@ -22,12 +22,6 @@
 namespace test {
 namespace {
 
-/// Calls that give something back or end a thread.
-constexpr std::string_view kReleases[] = {
-    "CloseHandle",     "FindClose",   "RegCloseKey",   "ReleasePowerRequirement",
-    "UnmapViewOfFile", "WSACleanup",  "DestroyWindow", "CloseToolhelp32Snapshot",
-    "TerminateThread", "closesocket", "PostMessageW",  "DeactivateDevice"};
-
 /// Far more than a job takes whose every wait runs into its limit, in seconds.
 constexpr std::uint32_t kLimit = 900;
 
@@ -104,7 +98,7 @@ void Walk::Run(std::uint64_t nth) {
 }
 
 bool Walk::release_failed() const {
-  return std::find(std::begin(kReleases), std::end(kReleases), call_) != std::end(kReleases);
+  return IsRelease(call_);
 }
 
 std::string Walk::Flashed(const std::string& name) const {

@@ -3,6 +3,7 @@
 
 #include <gmock/gmock.h>
 
+#include <algorithm>
 #include <memory>
 #include <string>
 #include <vector>
@@ -18,6 +19,7 @@
 #include "server/multicast_run.h"
 #include "tools/fleet/fleet.h"
 #include "tools/virtual_multicast.h"
+#include "trace/trace.h"
 
 namespace {
 
@@ -76,6 +78,29 @@ TEST_F(FirmwareTest, ComesByHttpIntoTheStoreAndIsFlashed) {
                                HasSubstr("Orvenix - RAMFILECRC32\r\n"),
                                HasSubstr("Starting Eflash...After Eflash...Local Upgrade "
                                          "Executing\r\n")));
+}
+
+TEST_F(FirmwareTest, IsFlashedAfterTheMemoryWasDividedAndThreeSeconds) {
+  List("os.nb0", "image");
+  std::vector<std::string> steps;
+  device().trace().SetSink([&steps](std::string_view line) {
+    const auto holds = [line](const char* part) {
+      return line.find(part) != std::string_view::npos;
+    };
+    if (holds("\"SetSystemMemoryDivision\"")) steps.emplace_back("division");
+    if (holds("\"Sleep\"") && holds("\"ms\":3000")) steps.emplace_back("pause");
+    if (holds("\"DeviceIoControl\"") && holds("\"code\":2281469")) steps.emplace_back("start");
+  });
+
+  RunJob();
+
+  device().trace().SetSink({});
+  EXPECT_EQ(Flashed("os.nb0"), "image");
+  const auto start = std::find(steps.begin(), steps.end(), "start");
+  ASSERT_NE(start, steps.end());
+  ASSERT_GE(start - steps.begin(), 2);
+  EXPECT_THAT(std::vector<std::string>(start - 2, start), ElementsAre("division", "pause"));
+  EXPECT_EQ(std::count(steps.begin(), steps.end(), "start"), 1);
 }
 
 TEST_F(FirmwareTest, ComesByMulticastAndNeedsNoHttp) {

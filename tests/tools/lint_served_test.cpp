@@ -5,14 +5,19 @@
 
 #include "server/scratch_folder.h"
 #include "server/site.h"
+#include "tools/file_text.h"
 #include "tools/lint/lint.h"
 #include "tools/lint_jobs.h"
+#include "tools/package/package.h"
 
 namespace tools {
 namespace {
 
+using ::testing::Contains;
 using ::testing::ElementsAre;
+using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Not;
 
 constexpr const char* kHello = "a.txt,\\a.txt,*,909783072,6\r\n";  // "hello\n"
 
@@ -61,6 +66,39 @@ TEST_F(LintServedTest, ComparesTheListWithWhatIsServed) {
               ElementsAre("size-short"));
   EXPECT_THAT(Ids(LintList("../a.txt,\\a,*,909783072,6\r\n")),
               ElementsAre("path-leading", "file-missing"));
+}
+
+TEST_F(LintServedTest, LooksIntoThePackageThatTheJobInstalls) {
+  scratch_.Write("in/a.exe", "the program");
+  PackageOptions options;
+  options.folder = scratch_.path() / "in";
+  options.cabinet = scratch_.path() / "p.cab";
+  options.application = "A";
+  options.provider = "B";
+  options.destination = "\\Program Files\\A";
+  MakePackage(options);
+  const std::string good = ReadWholeFile(options.cabinet);
+  const auto lint = [this](const std::string& cabinet) {
+    scratch_.Write("p.cab", cabinet);
+    server::Site site(scratch_.path());
+    const auto served = site.Open("p.cab");
+    return Ids(LintList("p.cab,\\P.cab,*," + std::to_string(served->crc32()) + "," +
+                        std::to_string(served->size()) + "\r\n"));
+  };
+  const auto changed = [&good](const std::string& from, const std::string& to) {
+    const std::size_t at = good.find(from);
+    EXPECT_NE(at, std::string::npos) << from;
+    return std::string(good).replace(at, to.size(), to);
+  };
+
+  EXPECT_THAT(lint("no cabinet"), Not(Contains("cabinet-broken"))) << "nothing installs it";
+  job_ = Group("StartProcess",
+               Field("Process", "\\Windows\\wceload.exe") + Field("Parameters", "/noui \\p.cab"));
+  EXPECT_THAT(lint(good), Not(Contains(HasSubstr("cabinet"))));
+  EXPECT_THAT(lint("no cabinet"), Contains("cabinet-broken"));
+  EXPECT_THAT(lint(good.substr(0, 50)), Contains("cabinet-broken"));
+  EXPECT_THAT(lint(changed("MSCE", "MSCF")), Contains("cabinet-compressed"));
+  EXPECT_THAT(lint(changed("%CE1%", "%CX1%")), Contains("cabinet-macro"));
 }
 
 TEST_F(LintServedTest, FollowsTheFoldersThatAMulticastMakes) {

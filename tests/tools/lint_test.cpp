@@ -219,9 +219,11 @@ TEST(LintTest, FindsWhatEachRuleIsAbout) {
     }
   }
   // The rules about the server's files and about configuration files have tests of their own.
-  for (const char* id : {"list-missing", "list-crc", "list-shift", "list-zero-byte",
-                         "list-field-long", "size-number", "file-missing", "file-crc", "file-size",
-                         "size-short", "size-reserve", "file-unlisted", "multicast-folder"}) {
+  for (const char* id :
+       {"list-missing", "list-crc", "list-shift", "list-zero-byte", "list-field-long",
+        "size-number", "file-missing", "file-crc", "file-size", "size-short", "size-reserve",
+        "file-unlisted", "multicast-folder", "cabinet-broken", "cabinet-compressed",
+        "cabinet-files", "cabinet-macro"}) {
     seen.insert(id);
   }
   for (auto i = static_cast<std::size_t>(Rule::kUnknownElement); i < kAfterConfigurations; ++i) {

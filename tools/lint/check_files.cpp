@@ -18,6 +18,7 @@ namespace {
 namespace fs = std::filesystem;
 
 constexpr std::size_t kMaxListFile = std::size_t{16} << 20U;
+constexpr std::size_t kMaxCabinet = std::size_t{256} << 20U;
 constexpr std::uint64_t kLargestCrc = 0xFFFFFFFF;
 constexpr std::uint64_t kLargestSize = 0x7FFFFFFF;
 constexpr std::string_view kRamName = "RAM:";
@@ -205,6 +206,9 @@ void FilesCheck::Served(const WantedFile& file) {
     Add(Rule::kFileSize, file.where,
         Quoted(path) + " has " + std::to_string(served->size()) + " bytes, not " +
             std::string(file.size));
+  }
+  if (IsInstalledPackage(check_.job, file.destination) && served->size() <= kMaxCabinet) {
+    CheckCabinet(check_, file.where, file.destination, ReadServed(*served));
   }
 }
 

@@ -38,6 +38,13 @@ void CheckMulticast(const JobCheck& check);
 /// @param unlisted  whether served files that the list does not name are worth a note
 void CheckFiles(const JobCheck& check, server::Site* site, bool unlisted);
 
+/// Whether a file with this destination is the package that the job's program installs.
+[[nodiscard]] bool IsInstalledPackage(const DeviceJob& job, std::string_view destination);
+/// What a device can prepare of a package.
+/// @param bytes  of the cabinet, as the server has it
+void CheckCabinet(const JobCheck& check, const std::string& where, std::string_view destination,
+                  std::string_view bytes);
+
 // ---- helpers of the checks ----
 
 /// In quotes, and cut where it is long.

@@ -26,7 +26,8 @@ constexpr std::size_t kProvider = 88;
 /// A field's length may or may not count a zero at its end.
 template <std::size_t Capacity>
 std::string_view TextIn(const char (&bytes)[Capacity], std::size_t size) noexcept {
-  return base::Part(base::FieldView(bytes), 0, size);
+  const std::string_view text(bytes, size < Capacity ? size : Capacity);
+  return base::Part(text, 0, text.find('\0'));
 }
 
 }  // namespace

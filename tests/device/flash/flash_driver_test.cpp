@@ -116,7 +116,8 @@ TEST_F(FlashHelperTest, OpensTheDriverForWritingThrough) {
   });
   ASSERT_TRUE(device::EFL_Helper_Init(1000));
   device().trace().SetSink({});
-  EXPECT_THAT(opening, HasSubstr("\"access\":3221225472"));
+  EXPECT_THAT(opening, HasSubstr("\"access\":3221225472,\"share\":0,\"disposition\":3,"
+                                 "\"attributes\":2147483776"));
 }
 
 TEST_F(FlashHelperTest, LoadsNothingThatIsLoadedAndOpensItAllTheSame) {

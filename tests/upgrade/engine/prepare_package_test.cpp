@@ -165,6 +165,19 @@ TEST_F(PreparePackageTest, ForgetsAKeyThatIsNotThere) {
   }
 }
 
+TEST_F(PreparePackageTest, GoesOnWhenTheKeyCannotBeDeleted) {
+  PutPackage();
+  device().faults().Add({"RegDeleteKeyW", 1, 1, ERROR_ACCESS_DENIED});
+  EXPECT_EQ(PreparePackage(kPackage), PackageResult::kDone);
+  EXPECT_TRUE(KeyExists(kKey));
+  EXPECT_EQ(AttributesOf(kFiles[0]), std::uint32_t{FILE_ATTRIBUTE_ARCHIVE});
+
+  device().faults().Add({"RegDeleteKeyW", 1, 1, ERROR_ACCESS_DENIED});
+  device().faults().Add({"LocalAlloc", 1, 1, ERROR_OUTOFMEMORY});
+  EXPECT_EQ(PreparePackage(kPackage), PackageResult::kNameOrRegistry)
+      << "what is said when no file was looked at";
+}
+
 TEST_F(PreparePackageTest, ReturnsTheResultOfTheLastNumber) {
   plan_.files = {{1, 1, "scan.exe"}, {3, 2, "scan.dll"}};  // there is no number 2
   PutPackage();

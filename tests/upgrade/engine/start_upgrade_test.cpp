@@ -16,7 +16,6 @@
 #include "product_support/messages.h"
 #include "report/messages/message_link.h"
 #include "report/window/window_state.h"
-#include "scenario/fault_walk.h"
 #include "support/cabinets.h"
 #include "support/device_files.h"
 #include "support/device_test.h"
