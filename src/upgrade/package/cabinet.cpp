@@ -33,7 +33,7 @@ PackageResult ReadReserves(std::string_view cabinet, Layout* layout) noexcept {
   std::uint8_t sizes[kReserveSizesSize];
   const PackageResult result = ReadAt(cabinet, kHeaderSize, sizes, sizeof sizes);
   if (result != PackageResult::kDone) return result;
-  layout->folders += kReserveSizesSize + base::Little16(sizes);
+  layout->folders += static_cast<std::uint32_t>(kReserveSizesSize + base::Little16(sizes));
   layout->folder_size += sizes[2];
   layout->data_head_size += sizes[3];
   return PackageResult::kDone;
