@@ -57,6 +57,24 @@ def check(*commands):
     return action
 
 
+def unless_missing(packages, action):
+    """A step that is skipped where the programs or folders of some packages are not there.
+
+    packages: what each brings, as {package: program on the path or absolute path}
+    """
+
+    def guarded(step, counts):
+        missing = [package for package, what in packages.items()
+                   if not (pathlib.Path(what).exists() if what.startswith("/") else shutil.which(what))]
+        if not missing:
+            return action(step, counts)
+        counts.skipped += 1
+        print(f"    skipped: {step}: not installed: {', '.join(missing)}")
+        return True
+
+    return guarded
+
+
 def build(preset, *targets):
     command = ["cmake", "--build", "--preset", preset, "-j", JOBS]
     return check(["cmake", "--preset", preset], command + (["--target", *targets] if targets else []))
@@ -152,6 +170,10 @@ def fuzz_target(target):
 
 FUZZ_SECONDS = 5
 
+# Without these nothing can be made for 32-bit ARM, or not be carried out.
+ARM_LINUX = {"g++-arm-linux-gnueabi": "arm-linux-gnueabi-g++", "qemu-user": "qemu-arm",
+             "googletest": "/usr/src/googletest/googletest/src/gtest-all.cc"}
+
 STEPS = [
     ("layers", "who may include whom", check([sys.executable, "scripts/check_layers.py"])),
     ("words", "words and paths that must not be in the project",
@@ -170,6 +192,9 @@ STEPS = [
     ("windows", "the library for desktop Windows",
      check(["cmake", "--preset", "windows"], ["cmake", "--build", "--preset", "windows", "-j", JOBS],
            [sys.executable, "scripts/check_exports.py", "build/windows/bin/orvenix.dll"])),
+    ("ce-loader-build", "the simulator and the loader for 32-bit ARM",
+     unless_missing(ARM_LINUX, build("ce-loader"))),
+    ("ce-loader", "their tests, carried out by qemu", unless_missing(ARM_LINUX, ctest("ce-loader"))),
     ("fuzz", "every fuzz target for a few seconds", fuzz),
     ("tidy", "clang-tidy",
      check(["cmake", "--preset", "release", "-B", "build/tidy", "-DCMAKE_DISABLE_PRECOMPILE_HEADERS=ON"],

@@ -176,7 +176,7 @@ DWORD FlashDriver::Write(const Block& block) {
   if (count == 0) return ERROR_SUCCESS;
   const std::uint8_t* const data = Data(block);
   if (data == nullptr) return ERROR_NOACCESS;
-  std::copy_n(data, count, file->content.begin() + position_);
+  std::copy_n(data, count, file->content.data() + position_);
   position_ += count;
   file->written = std::max(file->written, position_);
   return ERROR_SUCCESS;
@@ -191,7 +191,7 @@ DWORD FlashDriver::Read(const Block& block) {
   if (count == 0) return ERROR_SUCCESS;
   std::uint8_t* const data = Data(block);
   if (data == nullptr) return ERROR_NOACCESS;
-  std::copy_n(file->content.begin() + position, count, data);
+  std::copy_n(file->content.data() + position, count, data);
   return ERROR_SUCCESS;
 }
 
@@ -246,7 +246,8 @@ bool FlashDriver::WriteFlash() const {
   std::ofstream record(device_.folder() / "flash.record", std::ios::app);
   for (const auto& [name, file] : files_) {
     std::ofstream image(ImageFile(device_, name), std::ios::binary | std::ios::trunc);
-    image.write(reinterpret_cast<const char*>(file.content.data()), file.written);
+    image.write(reinterpret_cast<const char*>(file.content.data()),
+                static_cast<std::streamsize>(file.written));
     image.close();
     std::string line = R"({"us":)" + std::to_string(device_.world().now().count()) + R"(,"name":)";
     AppendJsonText(line, std::string_view(name));

@@ -96,7 +96,7 @@ std::int32_t LapiClose(HANDLE connection) {
 }
 
 template <typename Function>
-FARPROC Address(Function* function) {
+FARPROC EntryOf(Function* function) {
   return reinterpret_cast<FARPROC>(reinterpret_cast<void (*)()>(function));
 }
 
@@ -104,9 +104,9 @@ FARPROC Address(Function* function) {
 
 Library MakeQueueLibrary(std::u16string_view name, std::u16string_view lacks) {
   Library library{std::u16string(name),
-                  {{u"lapi_open", Address(&LapiOpen)},
-                   {u"lapi_write", Address(&LapiWrite)},
-                   {u"lapi_close", Address(&LapiClose)}}};
+                  {{u"lapi_open", EntryOf(&LapiOpen)},
+                   {u"lapi_write", EntryOf(&LapiWrite)},
+                   {u"lapi_close", EntryOf(&LapiClose)}}};
   library.entries.erase(std::u16string(lacks));
   return library;
 }

@@ -26,7 +26,7 @@ Address OwnAddress(const Device& device) {
   return *address;
 }
 
-bool SameName(std::string_view a, std::string_view b) {
+bool SameHost(std::string_view a, std::string_view b) {
   const auto lower = [](char c) { return c >= 'A' && c <= 'Z' ? static_cast<char>(c + 32) : c; };
   return std::equal(a.begin(), a.end(), b.begin(), b.end(),
                     [&](char x, char y) { return lower(x) == lower(y); });
@@ -138,8 +138,8 @@ void Network::LetTimePass(World::Lock& lock) {
 // ---- names ----
 
 std::optional<Address> Network::Resolve(std::string_view name) const {
-  if (name.empty() || SameName(name, device_.profile().host_name)) return own_;
-  if (SameName(name, "localhost")) return kLocalHost;
+  if (name.empty() || SameHost(name, device_.profile().host_name)) return own_;
+  if (SameHost(name, "localhost")) return kLocalHost;
   if (!device_.world().is_virtual()) return std::nullopt;
   return device_.world().Shared<Fabric>().FindName(name);
 }

@@ -22,12 +22,6 @@ constexpr std::uint32_t kIdStep = 4;
 /// A command line is at most this long: what is longer is no text of a program's own.
 constexpr std::size_t kMaxCommandLine = 32768;
 
-std::u16string_view BoundedView(const WCHAR* text, std::size_t most) {
-  std::size_t length = 0;
-  while (text != nullptr && length < most && text[length] != 0) ++length;
-  return {text, length};
-}
-
 }  // namespace
 
 Processes::Processes(Device& device) : device_(device) {

@@ -31,12 +31,6 @@ std::uint32_t NumberOf(HKEY key) {
   return number > UINT32_MAX ? 0 : static_cast<std::uint32_t>(number);
 }
 
-std::u16string_view BoundedView(const WCHAR* text, std::size_t most) {
-  std::size_t length = 0;
-  while (text != nullptr && length < most && text[length] != 0) ++length;
-  return {text, length};
-}
-
 std::optional<KeyTree::Path> PathOf(const WCHAR* text) {
   const std::u16string_view path = BoundedView(text, kMaxPath);
   if (path.size() == kMaxPath) return std::nullopt;
@@ -178,7 +172,7 @@ DWORD Registry::EnumKey(HKEY key, DWORD index, std::u16string& name) const {
   std::shared_ptr<RegistryKey> found;
   if (const DWORD error = FindKey(key, found); error != ERROR_SUCCESS) return error;
   if (index >= found->children.size()) return ERROR_NO_MORE_ITEMS;
-  name = std::next(found->children.begin(), index)->second->name;
+  name = std::next(found->children.begin(), static_cast<std::ptrdiff_t>(index))->second->name;
   return ERROR_SUCCESS;
 }
 
@@ -187,7 +181,7 @@ DWORD Registry::EnumValue(HKEY key, DWORD index, RegistryValue& value) const {
   std::shared_ptr<RegistryKey> found;
   if (const DWORD error = FindKey(key, found); error != ERROR_SUCCESS) return error;
   if (index >= found->values.size()) return ERROR_NO_MORE_ITEMS;
-  value = std::next(found->values.begin(), index)->second;
+  value = std::next(found->values.begin(), static_cast<std::ptrdiff_t>(index))->second;
   return ERROR_SUCCESS;
 }
 

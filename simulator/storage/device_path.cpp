@@ -10,13 +10,6 @@ namespace {
 
 constexpr std::u16string_view kRefused = u"\"*/:<>?|\\";
 
-/// The text, at most MAX_PATH characters of it.
-std::u16string_view BoundedView(const WCHAR* text) {
-  std::size_t length = 0;
-  while (length < MAX_PATH && text[length] != 0) ++length;
-  return {text, length};
-}
-
 bool ValidPattern(std::u16string_view pattern) {
   std::u16string plain(pattern);
   for (char16_t& letter : plain) {
@@ -38,7 +31,7 @@ bool ValidName(std::u16string_view name) {
 DWORD ParsePath(const WCHAR* text, bool wild, DevicePath& path) {
   path = {};
   if (text == nullptr) return ERROR_INVALID_PARAMETER;
-  std::u16string_view rest = BoundedView(text);
+  std::u16string_view rest = BoundedView(text, MAX_PATH);
   if (rest.empty()) return ERROR_PATH_NOT_FOUND;
   if (rest.size() >= MAX_PATH) return ERROR_FILENAME_EXCED_RANGE;
   path.closed = rest.back() == u'\\';

@@ -92,7 +92,7 @@ ssize_t OpenFile::ReadHere(char* bytes, std::size_t size) {
     ahead_.ends = got > 0 && ahead_.size < kReadAhead;
     if (got <= 0) return got;
   }
-  const std::size_t from = position_ - ahead_.at;
+  const auto from = static_cast<std::size_t>(position_ - ahead_.at);
   const std::size_t taken = std::min(size, ahead_.size - from);
   std::memcpy(bytes, ahead_.bytes.get() + from, taken);
   return static_cast<ssize_t>(taken);
@@ -208,7 +208,7 @@ DWORD OpenFile::Load(char* bytes, std::size_t size) {
 DWORD OpenFile::Store(const char* bytes, std::size_t size) {
   if (!can_write()) return ERROR_ACCESS_DENIED;
   const std::lock_guard<std::mutex> hold(node_->mutex);
-  const std::size_t kept = std::min<std::uint64_t>(size, node_->size);
+  const auto kept = static_cast<std::size_t>(std::min<std::uint64_t>(size, node_->size));
   if (!WriteContent(bytes, kept, 0)) return ErrorOfErrno(errno);
   NoteChange();
   return ERROR_SUCCESS;

@@ -55,13 +55,18 @@ void SharedParts::Fill(std::uint64_t at, char* bytes, std::size_t size) const {
   for (; part != parts_.end() && part->first < end; ++part) {
     const std::uint64_t from = std::max(part->first, at);
     const std::uint64_t to = std::min(part->second, end);
-    if (from < to) std::memcpy(bytes + (from - at), content_->data() + from, to - from);
+    if (from < to) {
+      std::memcpy(bytes + (from - at), content_->data() + from,
+                  static_cast<std::size_t>(to - from));
+    }
   }
 }
 
 void SharedParts::ForEach(
     const std::function<void(std::uint64_t, const char*, std::size_t)>& use) const {
-  for (const auto& [begin, end] : parts_) use(begin, content_->data() + begin, end - begin);
+  for (const auto& [begin, end] : parts_) {
+    use(begin, content_->data() + begin, static_cast<std::size_t>(end - begin));
+  }
 }
 
 }  // namespace sim

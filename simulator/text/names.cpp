@@ -133,4 +133,10 @@ bool SameName(std::u16string_view a, std::u16string_view b) noexcept {
   return true;
 }
 
+std::u16string_view BoundedView(const char16_t* text, std::size_t most) noexcept {
+  std::size_t length = 0;
+  while (text != nullptr && length < most && text[length] != 0) ++length;
+  return {text, length};
+}
+
 }  // namespace sim

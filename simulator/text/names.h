@@ -5,6 +5,7 @@
 // was.
 #pragma once
 
+#include <cstddef>
 #include <string>
 #include <string_view>
 
@@ -22,5 +23,8 @@ namespace sim {
 [[nodiscard]] char16_t FoldCase(char16_t letter) noexcept;
 [[nodiscard]] std::u16string FoldCase(std::u16string_view text);
 [[nodiscard]] bool SameName(std::u16string_view a, std::u16string_view b) noexcept;
+
+/// The text that a program gave, at most `most` characters of it; a null pointer is an empty one.
+[[nodiscard]] std::u16string_view BoundedView(const char16_t* text, std::size_t most) noexcept;
 
 }  // namespace sim

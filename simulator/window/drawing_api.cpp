@@ -14,10 +14,6 @@ constexpr UINT kOpaqueRectangle = 2;
 constexpr UINT kClipped = 4;
 constexpr UINT kLongestText = 8192;
 
-WindowSystem& SystemOf(const ApiCall& call) {
-  return call.device().screen().system();
-}
-
 /// Where a context's drawing goes. Nothing is drawn into a window that cannot be seen.
 struct Target {
   DeviceContext* context = nullptr;

@@ -7,10 +7,6 @@
 namespace sim {
 namespace {
 
-WindowSystem& SystemOf(const ApiCall& call) {
-  return call.device().screen().system();
-}
-
 constexpr BOOL kGetMessageError = -1;
 
 }  // namespace

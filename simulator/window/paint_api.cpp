@@ -13,10 +13,6 @@ namespace {
 
 constexpr int kDotsPerInch = 96;
 
-WindowSystem& SystemOf(const ApiCall& call) {
-  return call.device().screen().system();
-}
-
 /// Saves the picture of a finished paint; the first file that cannot be written ends the saving.
 void SavePaint(Device& device, const std::filesystem::path& folder, std::uint64_t number) {
   char name[40];

@@ -11,10 +11,6 @@
 namespace sim {
 namespace {
 
-WindowSystem& SystemOf(const ApiCall& call) {
-  return call.device().screen().system();
-}
-
 /// Window names are compared without regard to case, as the class names are.
 bool IsNamed(const std::u16string& name, const WCHAR* wanted) {
   if (wanted == nullptr) return true;

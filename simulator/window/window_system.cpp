@@ -5,6 +5,7 @@
 #include <utility>
 
 #include "device/device.h"
+#include "faults/api_call.h"
 #include "profile/profile.h"
 #include "world/sim_thread.h"
 
@@ -193,6 +194,10 @@ void WindowSystem::Invalidate(Window& window, const RECT* area, bool erase) {
   window.update = Around(window.update, added);
   window.erase = window.erase || erase;
   world_.Notify(QueueOf(*window.owner).wake);
+}
+
+WindowSystem& SystemOf(const ApiCall& call) {
+  return call.device().screen().system();
 }
 
 }  // namespace sim

@@ -18,6 +18,8 @@
 
 namespace sim {
 
+class ApiCall;
+
 inline constexpr COLORREF kDesktopColour = RGB(72, 96, 120);
 inline constexpr COLORREF kBlack = RGB(0, 0, 0);
 inline constexpr COLORREF kWhite = RGB(255, 255, 255);
@@ -208,5 +210,8 @@ class WindowSystem {
   std::map<HGDIOBJ, GdiObject> objects_;
   std::unique_ptr<Font> font_;
 };
+
+/// Where the calls of a device's programs go.
+WindowSystem& SystemOf(const ApiCall& call);
 
 }  // namespace sim

@@ -28,6 +28,12 @@ class Fiber {
   [[noreturn]] static void SwitchForEver(Fiber& from, Fiber& to);
 
  private:
+#if defined(__ARM_EABI_UNWINDER__)
+  static constexpr std::size_t kExceptionWords = 3;  // it keeps those under way, too
+#else
+  static constexpr std::size_t kExceptionWords = 2;
+#endif
+
   static void Enter();
   static void Go(Fiber& from, Fiber& to, bool for_ever);
   void Prepare();
@@ -38,7 +44,7 @@ class Fiber {
   std::size_t size_ = 0;
   void* place_ = nullptr;  ///< where it was left: the stack pointer, or a context
   /// What the run time of exceptions keeps for a thread: the exceptions being handled.
-  std::array<unsigned char, 2 * sizeof(void*)> exceptions_{};
+  std::array<unsigned char, kExceptionWords * sizeof(void*)> exceptions_{};
   void* fake_stack_ = nullptr;  ///< of the address sanitizer
   void* tsan_fiber_ = nullptr;  ///< of the thread sanitizer
 };

@@ -179,7 +179,8 @@ void TcpConnection::SendSegment(Side from) {
   std::size_t size = std::max<std::size_t>(profile.segment_bytes, 1);
   size = std::min({size, stream.unsent.size(), stream.credit});
   if (stream.fault) {
-    size = std::min<std::size_t>(size, stream.fault->after_bytes - stream.sent);
+    size = static_cast<std::size_t>(
+        std::min<std::uint64_t>(size, stream.fault->after_bytes - stream.sent));
   }
   const auto bytes = std::make_shared<const std::string>(stream.unsent.view().substr(0, size));
   stream.unsent.Drop(size);
