@@ -118,6 +118,14 @@ BOOL PulseEvent(HANDLE event) {
   });
 }
 
+BOOL EventModify(HANDLE event, DWORD action) {
+  if (action == EVENT_SET) return SetEvent(event);
+  if (action == EVENT_RESET) return ResetEvent(event);
+  if (action == EVENT_PULSE) return PulseEvent(event);
+  ApiCall call("EventModify", ERROR_INVALID_PARAMETER);
+  return call.Fail(ERROR_INVALID_PARAMETER, FALSE);
+}
+
 HANDLE CreateMutexW(SECURITY_ATTRIBUTES* /*security*/, BOOL initial_owner, const WCHAR* name) {
   ApiCall call("CreateMutexW", ERROR_NOT_ENOUGH_MEMORY);
   call.Argument("owned", initial_owner);

@@ -173,3 +173,8 @@ ce_FILE* ce_stdout() {
   sim::ApiCall call("stdout", sim::kCannotFail);
   return call.Return(call.device().storage().streams().console());
 }
+
+ce_FILE* _getstdfilex(int index) {
+  constexpr int kOutput = 1;
+  return index == kOutput ? ce_stdout() : nullptr;
+}

@@ -96,4 +96,8 @@ int ce_fclose(ce_FILE* stream);
 int ce_fflush(ce_FILE* stream);
 /// The stream that the device calls `stdout`: its programs' console.
 ce_FILE* ce_stdout();
+/// What the device's library has in its place: standard input, output and errors by number from 0.
+ce_FILE* _getstdfilex(int index);
+/// What the device's library has in its place: standard input, output and errors by number from 0.
+ce_FILE* _getstdfilex(int index);
 }

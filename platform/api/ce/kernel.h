@@ -11,6 +11,9 @@ inline constexpr DWORD MAXIMUM_WAIT_OBJECTS = 64;
 inline constexpr DWORD STILL_ACTIVE = 0x103;
 inline constexpr DWORD CREATE_SUSPENDED = 4;
 inline constexpr DWORD EVENT_ALL_ACCESS = 0x1F0003;
+inline constexpr DWORD EVENT_PULSE = 1;
+inline constexpr DWORD EVENT_RESET = 2;
+inline constexpr DWORD EVENT_SET = 3;
 
 /// Room for the platform's own critical section; its content is the platform's business.
 struct CRITICAL_SECTION {
@@ -94,6 +97,9 @@ HANDLE OpenEventW(DWORD access, BOOL inherit, const WCHAR* name);
 BOOL SetEvent(HANDLE event);
 BOOL ResetEvent(HANDLE event);
 BOOL PulseEvent(HANDLE event);
+/// The one function behind the three above that the device's library has; those stand in its
+/// headers.
+BOOL EventModify(HANDLE event, DWORD action);
 HANDLE CreateMutexW(SECURITY_ATTRIBUTES* security, BOOL initial_owner, const WCHAR* name);
 BOOL ReleaseMutex(HANDLE mutex);
 HANDLE CreateSemaphoreW(SECURITY_ATTRIBUTES* security, LONG initial, LONG maximum,

@@ -20,10 +20,16 @@ using VOID = void;
 using LONGLONG = std::int64_t;
 using ULONGLONG = std::uint64_t;
 
-// UTF-16 as its own type: code that mistakes it for a 32-bit wchar_t does not compile.
+// UTF-16: the compiler's own wide character where that has 16 bits, as on the device, and elsewhere
+// a type of its own, so that code which mistakes it for a 32-bit wchar_t does not compile.
+#if __SIZEOF_WCHAR_T__ == 2
+using WCHAR = wchar_t;
+#define TEXT(literal) L##literal
+#else
 using WCHAR = char16_t;
-using TCHAR = WCHAR;
 #define TEXT(literal) u##literal
+#endif
+using TCHAR = WCHAR;
 
 using LPVOID = void*;
 using LPCVOID = const void*;
