@@ -37,8 +37,10 @@ extern "C" {
 extern const Constructor ce_constructors[];
 extern const Constructor ce_constructors_end[];
 
-/// Of a library that wants to hear of it; this one need not have it.
-[[gnu::weak]] BOOL DllMain(HINSTANCE instance, DWORD reason, void* reserved);
+/// For a library that need not hear of it; one that must has its own.
+[[gnu::weak]] BOOL DllMain(HINSTANCE /*instance*/, DWORD /*reason*/, void* /*reserved*/) {
+  return TRUE;
+}
 
 /// What tells the objects of one library from those of others, where several share a run time.
 void* __dso_handle = nullptr;
@@ -54,7 +56,7 @@ BOOL _DllMainCRTStartup(HINSTANCE instance, DWORD reason, void* reserved) {
   if (reason == kAttached) {
     for (const Constructor* next = ce_constructors; next != ce_constructors_end; ++next) (*next)();
   }
-  const BOOL answer = DllMain == nullptr ? TRUE : DllMain(instance, reason, reserved);
+  const BOOL answer = DllMain(instance, reason, reserved);
   if (reason == kDetached || (reason == kAttached && answer == FALSE)) RunDestructors();
   return answer;
 }
