@@ -42,7 +42,7 @@ Device::Device(World& world, Profile profile, std::filesystem::path folder)
       processes_(std::make_unique<Processes>(*this)),
       network_(std::make_unique<Network>(*this)),
       screen_(std::make_unique<Screen>(*this)),
-      libraries_(std::make_unique<Libraries>()),
+      libraries_(std::make_unique<Libraries>(*this)),
       messages_(std::make_unique<ManagementQueue>(*this)),
       drivers_(std::make_unique<Drivers>(*this)) {}
 

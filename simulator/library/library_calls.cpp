@@ -1,12 +1,12 @@
-// LoadLibraryW and GetProcAddressW.
+// LoadLibraryW, FreeLibrary and GetProcAddressW.
 #include <cstdint>
-#include <memory>
 
 #include "ce/errors.h"
 #include "ce/kernel.h"
 #include "device/device.h"
 #include "faults/api_call.h"
 #include "library/libraries.h"
+#include "text/names.h"
 
 extern "C" HMODULE LoadLibraryW(const WCHAR* name) {
   sim::ApiCall call("LoadLibraryW", ERROR_MOD_NOT_FOUND);
@@ -14,8 +14,17 @@ extern "C" HMODULE LoadLibraryW(const WCHAR* name) {
   const HMODULE none = nullptr;
   if (call.failed()) return call.Return(none);
   if (name == nullptr) return call.Fail(ERROR_INVALID_PARAMETER, none);
-  HMODULE const module = call.device().libraries().Load(name);
-  return module != nullptr ? call.Return(module) : call.Fail(ERROR_MOD_NOT_FOUND, none);
+  DWORD error = ERROR_SUCCESS;
+  HMODULE const module = call.device().libraries().Load(sim::BoundedView(name, MAX_PATH), error);
+  return module != nullptr ? call.Return(module) : call.Fail(error, none);
+}
+
+extern "C" BOOL FreeLibrary(HMODULE module) {
+  sim::ApiCall call("FreeLibrary", ERROR_INVALID_HANDLE);
+  call.Argument("module", module);
+  if (call.failed()) return call.Return(FALSE);
+  return call.device().libraries().Free(module) ? call.Return(TRUE)
+                                                : call.Fail(ERROR_INVALID_HANDLE, FALSE);
 }
 
 extern "C" FARPROC GetProcAddressW(HMODULE module, const WCHAR* name) {
@@ -27,10 +36,8 @@ extern "C" FARPROC GetProcAddressW(HMODULE module, const WCHAR* name) {
   if (is_name) call.Argument("name", name);
   const FARPROC none = nullptr;
   if (call.failed()) return call.Return(none);
-  const std::shared_ptr<const sim::Library> library = call.device().libraries().Find(module);
-  if (library == nullptr) return call.Fail(ERROR_INVALID_HANDLE, none);
-  if (!is_name) return call.Fail(ERROR_PROC_NOT_FOUND, none);
-  const auto entry = library->entries.find(std::u16string_view(name));
-  if (entry == library->entries.end()) return call.Fail(ERROR_PROC_NOT_FOUND, none);
-  return call.Return(entry->second);
+  const std::u16string_view wanted = is_name ? std::u16string_view(name) : std::u16string_view();
+  DWORD error = ERROR_SUCCESS;
+  const FARPROC function = call.device().libraries().Find(module, wanted, error);
+  return function != nullptr ? call.Return(function) : call.Fail(error, none);
 }

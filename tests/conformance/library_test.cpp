@@ -19,6 +19,20 @@ TEST(LoadLibraryWTest, SaysThatALibraryIsMissing) {
   EXPECT_EQ(GetLastError(), DWORD{ERROR_MOD_NOT_FOUND});
 }
 
+TEST(FreeLibraryTest, GivesOneUseBack) {
+  const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
+  ASSERT_EQ(LoadLibraryW(TEXT("kx_clapi_dll")), module);
+  EXPECT_TRUE(FreeLibrary(module));
+  EXPECT_NE(GetProcAddressW(module, TEXT("lapi_open")), nullptr);
+  EXPECT_TRUE(FreeLibrary(module));
+}
+
+TEST(FreeLibraryTest, RefusesWhatIsNoModule) {
+  SetLastError(kPoison);
+  EXPECT_FALSE(FreeLibrary(nullptr));
+  EXPECT_NE(GetLastError(), kPoison);
+}
+
 TEST(GetProcAddressWTest, FindsFunctionsByTheirExactName) {
   const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
   const FARPROC open = GetProcAddressW(module, TEXT("lapi_open"));

@@ -47,6 +47,10 @@ struct PROCESSENTRY32 {
 using LPPROCESSENTRY32 = PROCESSENTRY32*;
 static_assert(sizeof(PROCESSENTRY32) == 564, "the device's layout");
 
+/// Why a library's entry point is called: it has been loaded, or is about to be unloaded.
+inline constexpr DWORD DLL_PROCESS_DETACH = 0;
+inline constexpr DWORD DLL_PROCESS_ATTACH = 1;
+
 /// A function of a loaded library, to be cast to what it is.
 using FARPROC = std::intptr_t(WINAPI*)();
 
@@ -134,6 +138,7 @@ BOOL TerminateProcess(HANDLE process, DWORD exit_code);
 BOOL GetExitCodeProcess(HANDLE process, DWORD* exit_code);
 
 HMODULE LoadLibraryW(const WCHAR* name);
+BOOL FreeLibrary(HMODULE module);
 FARPROC GetProcAddressW(HMODULE module, const WCHAR* name);
 
 void OutputDebugStringW(const WCHAR* text);

@@ -2,11 +2,16 @@
 
 #include <gmock/gmock.h>
 
-#include <string>
+#include <filesystem>
+#include <memory>
+#include <string_view>
+#include <vector>
 
 #include "ce/errors.h"
 #include "ce/kernel.h"
 #include "faults/faults.h"
+#include "library/shared_objects.h"
+#include "support/device_files.h"
 #include "support/device_test.h"
 
 namespace {
@@ -88,6 +93,19 @@ TEST_F(LibrariesTest, AreMissedWhenTheyAreNotInstalled) {
   EXPECT_THAT(device().libraries().Loaded(), IsEmpty());
 }
 
+TEST_F(LibrariesTest, AreUnloadedWithTheirLastUse) {
+  HMODULE const module = LoadLibraryW(u"tools");
+  EXPECT_EQ(LoadLibraryW(u"tools"), module);
+  EXPECT_TRUE(FreeLibrary(module));
+  EXPECT_EQ(GetProcAddressW(module, u"first"), &First) << "one use is left";
+  EXPECT_TRUE(FreeLibrary(module));
+  EXPECT_EQ(GetProcAddressW(module, u"first"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
+  EXPECT_FALSE(FreeLibrary(module));
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
+  EXPECT_NE(LoadLibraryW(u"tools"), nullptr) << "it can be loaded again";
+}
+
 TEST_F(LibrariesTest, CanBeMadeToFail) {
   device().faults().Add({"LoadLibraryW", 1, 1, 0});
   EXPECT_EQ(LoadLibraryW(u"tools"), nullptr);
@@ -96,6 +114,112 @@ TEST_F(LibrariesTest, CanBeMadeToFail) {
   device().faults().Add({"GetProcAddressW", 1, 1, 5});
   EXPECT_EQ(GetProcAddressW(module, u"first"), nullptr);
   EXPECT_EQ(GetLastError(), 5U);
+}
+
+// ---- libraries that come from files ----
+
+/// What the reader of this test's files has been asked and has made.
+struct Seen {
+  std::vector<std::filesystem::path> files;
+  std::vector<DWORD> reasons;
+  HMODULE module = nullptr;
+  bool welcome = true;
+  int loaded = 0;
+};
+
+class FileCode final : public sim::LibraryCode {
+ public:
+  explicit FileCode(Seen& seen) : seen_(seen) { ++seen_.loaded; }
+  ~FileCode() override { --seen_.loaded; }
+  bool Enter(HMODULE module, DWORD reason) override {
+    seen_.module = module;
+    seen_.reasons.push_back(reason);
+    return seen_.welcome;
+  }
+  [[nodiscard]] FARPROC Find(std::u16string_view name) const override {
+    return name == u"first" ? &First : nullptr;
+  }
+
+ private:
+  Seen& seen_;
+};
+
+class LibraryFilesTest : public DeviceTest {
+ protected:
+  LibraryFilesTest() {
+    sim::SetLibraryReader([this](const std::filesystem::path& file) {
+      seen_.files.push_back(file);
+      return std::make_unique<FileCode>(seen_);
+    });
+    test::PutFile("\\Program Files\\a.dll", "a");
+  }
+  ~LibraryFilesTest() override { sim::SetLibraryReader({}); }
+
+  Seen seen_;
+};
+
+TEST_F(LibraryFilesTest, AreReadEnteredFoundAndLeft) {
+  HMODULE const module = LoadLibraryW(u"\\Program Files\\a.dll");
+  ASSERT_NE(module, nullptr);
+  ASSERT_EQ(seen_.files.size(), 1U);
+  EXPECT_EQ(seen_.files[0], folder() / "device/storage/Program Files/a.dll");
+  EXPECT_EQ(seen_.module, module);
+  EXPECT_EQ(LoadLibraryW(u"\\PROGRAM FILES\\A"), module) << "read once";
+  EXPECT_EQ(GetProcAddressW(module, u"first"), &First);
+  EXPECT_EQ(GetProcAddressW(module, u"second"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_PROC_NOT_FOUND);
+
+  EXPECT_TRUE(FreeLibrary(module));
+  EXPECT_THAT(seen_.reasons, ElementsAre(DLL_PROCESS_ATTACH));
+  EXPECT_TRUE(FreeLibrary(module));
+  EXPECT_THAT(seen_.reasons, ElementsAre(DLL_PROCESS_ATTACH, DLL_PROCESS_DETACH));
+  EXPECT_EQ(seen_.loaded, 0);
+  EXPECT_FALSE(FreeLibrary(module));
+}
+
+TEST_F(LibraryFilesTest, AreLookedForInTheWindowsFolderAndInTheRoot) {
+  test::PutFile("\\in_root.dll", "a");
+  test::PutFile("\\Windows\\in_windows.dll", "a");
+  test::PutFile("\\plain", "a");
+  EXPECT_NE(LoadLibraryW(u"in_root"), nullptr);
+  EXPECT_NE(LoadLibraryW(u"in_root.DLL"), nullptr);
+  EXPECT_NE(LoadLibraryW(u"in_windows"), nullptr);
+  EXPECT_EQ(LoadLibraryW(u"a"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_MOD_NOT_FOUND);
+  EXPECT_EQ(LoadLibraryW(u"plain"), nullptr) << "it would be plain.dll";
+  EXPECT_EQ(LoadLibraryW(u"\\Windows"), nullptr);
+  EXPECT_EQ(seen_.files.size(), 2U);
+}
+
+TEST_F(LibraryFilesTest, AreGoneAgainWhenTheyDoNotWantToBeLoaded) {
+  seen_.welcome = false;
+  EXPECT_EQ(LoadLibraryW(u"\\Program Files\\a.dll"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_DLL_INIT_FAILED);
+  EXPECT_EQ(seen_.loaded, 0);
+  seen_.welcome = true;
+  EXPECT_NE(LoadLibraryW(u"\\Program Files\\a.dll"), nullptr);
+}
+
+TEST_F(LibraryFilesTest, AreRefusedWhenNobodyCanReadThem) {
+  sim::SetLibraryReader([](const std::filesystem::path&) { return nullptr; });
+  EXPECT_EQ(LoadLibraryW(u"\\Program Files\\a.dll"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_BAD_EXE_FORMAT);
+  sim::SetLibraryReader({});
+  EXPECT_EQ(LoadLibraryW(u"\\Program Files\\a.dll"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_BAD_EXE_FORMAT);
+}
+
+TEST_F(LibraryFilesTest, EndWithTheirDevice) {
+  EXPECT_NE(LoadLibraryW(u"\\Program Files\\a.dll"), nullptr);
+  Restart();
+  EXPECT_EQ(seen_.loaded, 0);
+  EXPECT_THAT(seen_.reasons, ElementsAre(DLL_PROCESS_ATTACH)) << "it had no time to say goodbye";
+}
+
+TEST_F(LibraryFilesTest, RefuseWhatIsNoSharedObject) {
+  sim::SetLibraryReader(&sim::ReadSharedObject);
+  EXPECT_EQ(LoadLibraryW(u"\\Program Files\\a.dll"), nullptr);
+  EXPECT_EQ(GetLastError(), ERROR_BAD_EXE_FORMAT);
 }
 
 }  // namespace
