@@ -174,6 +174,9 @@ FUZZ_SECONDS = 5
 ARM_LINUX = {"g++-arm-linux-gnueabi": "arm-linux-gnueabi-g++", "qemu-user": "qemu-arm",
              "googletest": "/usr/src/googletest/googletest/src/gtest-all.cc"}
 
+ARM_NONE = {"gcc-arm-none-eabi": "arm-none-eabi-g++",
+            "libstdc++-arm-none-eabi-newlib": "/usr/include/newlib/c++"}
+
 STEPS = [
     ("layers", "who may include whom", check([sys.executable, "scripts/check_layers.py"])),
     ("words", "words and paths that must not be in the project",
@@ -192,6 +195,9 @@ STEPS = [
     ("windows", "the library for desktop Windows",
      check(["cmake", "--preset", "windows"], ["cmake", "--build", "--preset", "windows", "-j", JOBS],
            [sys.executable, "scripts/check_exports.py", "build/windows/bin/orvenix.dll"])),
+    ("ce", "the library for Windows CE on 32-bit ARM", unless_missing(ARM_NONE, check(
+        ["cmake", "--preset", "ce"], ["cmake", "--build", "--preset", "ce", "-j", JOBS],
+        [sys.executable, "scripts/check_ce.py", "build/ce"]))),
     ("ce-loader-build", "the simulator and the loader for 32-bit ARM",
      unless_missing(ARM_LINUX, build("ce-loader"))),
     ("ce-loader", "their tests, carried out by qemu", unless_missing(ARM_LINUX, ctest("ce-loader"))),

@@ -195,6 +195,19 @@ TEST_F(KernelTest, PulseReleasesAllWaitersOfAManualEventAndOneOfAnAutomaticOne) 
   }
 }
 
+TEST_F(KernelTest, EventModifyDoesWhatTheThreeCallsOverItDo) {
+  HANDLE event = CreateEventW(nullptr, TRUE, FALSE, nullptr);
+  EXPECT_NE(EventModify(event, EVENT_SET), FALSE);
+  EXPECT_EQ(WaitForSingleObject(event, 0), WAIT_OBJECT_0);
+  EXPECT_NE(EventModify(event, EVENT_PULSE), FALSE);
+  EXPECT_EQ(WaitForSingleObject(event, 0), WAIT_TIMEOUT);
+  EventModify(event, EVENT_SET);
+  EXPECT_NE(EventModify(event, EVENT_RESET), FALSE);
+  EXPECT_EQ(WaitForSingleObject(event, 0), WAIT_TIMEOUT);
+  EXPECT_EQ(EventModify(event, 4), FALSE);
+  EXPECT_EQ(GetLastError(), ERROR_INVALID_PARAMETER);
+}
+
 TEST_F(KernelTest, AThreadThatKeepsEnteringASectionDoesNotStarveTheOthers) {
   CRITICAL_SECTION section;
   InitializeCriticalSection(&section);
