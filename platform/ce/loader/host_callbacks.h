@@ -1,0 +1,13 @@
+// The host's callback table, when the library that calls it has a misaligned stack.
+#pragma once
+
+#include "loader/import_table.h"
+
+namespace loader {
+
+/// A function to be called like the DLL's own `set_callbacks`, its IcfgSetCallbacks: it hands the
+/// library a table whose function leads to the host's through a gate out of the DLL. One library at
+/// a time has a table.
+[[nodiscard]] Function CallbacksThroughGates(Function set_callbacks);
+
+}  // namespace loader
