@@ -45,7 +45,8 @@ Peer ToPeer(const udp::endpoint& endpoint) {
 
 class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
  public:
-  Socket(asio::io_context& loop, MulticastRun& run) : run_(run), socket_(loop), timer_(loop) {}
+  Socket(asio::io_context& loop, MulticastRun& run)
+      : run_(run), socket_(loop), ears_(loop), timer_(loop) {}
 
   void Open(const MulticastSocketOptions& options);
   void Start(std::function<void()> ended);
@@ -61,6 +62,8 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
 
   bool CanHave(const asio::ip::address_v4& address, std::uint16_t port);
   bool Bind(const asio::ip::address_v4& address, std::uint16_t port);
+  void OpenEars(const asio::ip::address_v4& address);
+  void WaitToOverhear();
   bool Receive();
   Sending Send();
   void WaitToSend();
@@ -71,6 +74,7 @@ class MulticastDriver::Socket : public std::enable_shared_from_this<Socket> {
 
   MulticastRun& run_;
   udp::socket socket_;
+  udp::socket ears_;  ///< hears what is said on the public group, and says nothing
   asio::steady_timer timer_;
   Peer local_;
   MulticastSocketFigures figures_;
@@ -111,6 +115,35 @@ void MulticastDriver::Socket::Open(const MulticastSocketOptions& options) {
   socket_.non_blocking(true);
   local_ = ToPeer(socket_.local_endpoint());
   tap_ = options.tap;
+  OpenEars(address);
+}
+
+/// Without them the run goes on as well: it does not find out that there is another server.
+void MulticastDriver::Socket::OpenEars(const asio::ip::address_v4& address) {
+  const asio::ip::address_v4 group(run_.options().public_group.address);
+  ErrorCode error;
+  ears_.open(udp::v4(), error);
+  if (!error) ears_.set_option(asio::socket_base::reuse_address(true), error);
+  // Bound to the group itself: what is meant for a client on this machine goes to the client.
+  if (!error) ears_.bind(udp::endpoint(group, run_.options().public_group.port), error);
+  if (!error) ears_.set_option(asio::ip::multicast::join_group(group, address), error);
+  if (!error) ears_.non_blocking(true, error);
+  if (error) ears_.close(error);
+}
+
+void MulticastDriver::Socket::WaitToOverhear() {
+  if (closed_ || !ears_.is_open()) return;
+  ears_.async_wait(udp::socket::wait_read, [self = shared_from_this()](ErrorCode error) {
+    for (int i = 0; !error && i < kTurn; ++i) {
+      udp::endpoint from;
+      const std::size_t size =
+          self->ears_.receive_from(asio::buffer(self->buffer_), from, 0, error);
+      if (error) break;
+      self->run_.OnOverheard(ToPeer(from), {self->buffer_.data(), size}, NowMicros());
+    }
+    const bool quiet = error == asio::error::would_block || error == asio::error::try_again;
+    if (!error || quiet) self->WaitToOverhear();
+  });
 }
 
 bool MulticastDriver::Socket::CanHave(const asio::ip::address_v4& address, std::uint16_t port) {
@@ -135,6 +168,7 @@ bool MulticastDriver::Socket::Bind(const asio::ip::address_v4& address, std::uin
 void MulticastDriver::Socket::Start(std::function<void()> ended) {
   ended_ = std::move(ended);
   run_.Start(local_, NowMicros());
+  WaitToOverhear();
   Pump();
 }
 
@@ -266,6 +300,7 @@ void MulticastDriver::Socket::Close() {
   kept_ = nullptr;
   ErrorCode ignored;
   socket_.close(ignored);
+  ears_.close(ignored);
   timer_.cancel();
 }
 

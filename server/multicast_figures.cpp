@@ -42,6 +42,7 @@ std::string_view EventName(MulticastEventKind kind) {
     case MulticastEventKind::kRunEnded: return "run-ended";
     case MulticastEventKind::kRefused: return "refused";
     case MulticastEventKind::kNotStored: return "not-stored";
+    case MulticastEventKind::kRival: return "rival";
   }
   return "";
 }

@@ -7,6 +7,7 @@
 #include <functional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "server/moment.h"
 #include "server/peer.h"
@@ -107,6 +108,11 @@ struct MulticastFigures {
   std::uint64_t not_stored = 0;   ///< times the session file could not be written
   std::uint64_t refused = 0;      ///< datagrams that counted as sent and that the system refused
   std::uint64_t rate = 0;         ///< bits per second allowed; 0: no limit
+  /// Other servers that announce on the same group, in the order in which they were heard, so many
+  /// at most. What a device says names no file: while there is another server, it may mean that
+  /// one's, and "proven" is worth less.
+  std::vector<Peer> rivals;
+  static constexpr std::size_t kMostRivals = 16;
 };
 
 /// Bytes that a datagram of `payload` bytes takes on an Ethernet, in fragments when need be.
@@ -129,6 +135,7 @@ enum class MulticastEventKind : std::uint8_t {
   kRunEnded,
   kRefused,    ///< the system would not send a datagram, for the first time
   kNotStored,  ///< the session file could not be written, for the first time
+  kRival,      ///< another server announces on the same group, heard for the first time
 };
 /// "announced", "joined", "started", "master", "overrun", ...
 [[nodiscard]] std::string_view EventName(MulticastEventKind kind);

@@ -12,46 +12,29 @@
 
 #include "mcftp/cipher/frame_cipher.h"
 #include "mcftp/wire/frames.h"
+#include "server/multicast/option_rules.h"
 #include "server/multicast/outbox.h"
 #include "server/multicast/pace.h"
 #include "server/multicast/session.h"
 #include "server/multicast/session_store.h"
+#include "server/request.h"
 
 namespace server {
 namespace {
 
 /// Frames that are no blocks, while a block waits.
 constexpr int kMostControl = 16;
+/// Of a name that another server announces.
+constexpr std::size_t kMostShown = 60;
 /// No frame for a server is longer.
 constexpr std::size_t kLongestReceived = 2048;
 /// What happens in between is lost with a server that dies: devices that are proven are asked
 /// again. Who joins is kept before it is answered.
 constexpr Micros kStoreInterval = std::chrono::milliseconds(250);
 
-void Require(bool holds, const std::string& what) {
-  if (!holds) throw std::invalid_argument(what);
-}
-
 bool IsDevice(const Peer& peer) {
   return peer.port != 0 && peer.address != 0 && peer.address != 0xFFFFFFFF &&
          !IsGroup(peer.address);
-}
-
-void CheckOptions(const MulticastOptions& options) {
-  Require(IsGroup(options.public_group.address) && options.public_group.port != 0,
-          "the public group " + ToText(options.public_group) + " is not a multicast group");
-  Require(IsGroup(options.private_group),
-          "the private group " + AddressText(options.private_group) + " is not a multicast group");
-  Require(options.private_group != options.public_group.address,
-          "public and private group are the same");
-  Require(options.oack_wait >= std::chrono::milliseconds(1),
-          "clients have to be told to wait for an answer");
-  Require(options.announce_interval.count() > 0 && options.announce_max > 0,
-          "a file has to be announced");
-  Require(options.block_size > 0, "a block has to have a size");
-  Require(options.start.expected <= options.max_devices,
-          "more devices are expected than are kept apart");
-  Require(options.poll_group > 0 && options.rounds > 0, "nobody would be served");
 }
 
 std::uint64_t LargestFrame(const MulticastOptions& options,
@@ -86,6 +69,7 @@ class MulticastRun::Body {
 
   void Start(const Peer& own, Micros now);
   void OnDatagram(const Peer& from, std::string_view bytes, Micros now);
+  void OnOverheard(const Peer& from, std::string_view bytes, Micros now);
   void OnTime(Micros now);
   const Outgoing* Next(Micros now);
   std::optional<Micros> deadline(Micros now);
@@ -113,8 +97,9 @@ class MulticastRun::Body {
   [[nodiscard]] RunMemory Everything() const;
   void EndSession();
   void EndRun(Micros now);
-  void Tell(MulticastEventKind kind, std::string detail, Micros now);
+  void Tell(MulticastEventKind kind, std::string detail, Micros now, int error = 0);
   void Advance(Micros now);
+  bool Take(std::string_view bytes, mcftp::Header& header);
   void Account(const Outgoing& outgoing, Micros now);
   [[nodiscard]] StartPolicy PolicyForFile() const;
   [[nodiscard]] std::uint32_t NewTransferId();
@@ -309,23 +294,19 @@ void MulticastRun::Body::EndRun(Micros now) {
   Tell(MulticastEventKind::kRunEnded, "", now);
 }
 
-void MulticastRun::Body::Tell(MulticastEventKind kind, std::string detail, Micros now) {
+void MulticastRun::Body::Tell(MulticastEventKind kind, std::string detail, Micros now, int error) {
   if (!listener_) return;
   MulticastEvent event;
   event.kind = kind;
   event.when = now;
+  event.error = error;
   event.detail = std::move(detail);
   listener_(event);
 }
 
 void MulticastRun::Body::OnRefused(int error, Micros now) {
-  if (figures_.refused++ > 0 || !listener_) return;
-  MulticastEvent event;
-  event.kind = MulticastEventKind::kRefused;
-  event.when = now;
-  event.error = error;
-  event.detail = std::generic_category().message(error);
-  listener_(event);
+  if (figures_.refused++ > 0) return;
+  Tell(MulticastEventKind::kRefused, std::generic_category().message(error), now, error);
 }
 
 void MulticastRun::Body::Advance(Micros now) {
@@ -339,15 +320,35 @@ void MulticastRun::Body::OnTime(Micros now) {
   Advance(now);
 }
 
+/// Takes a frame's bytes over, in the clear.
+bool MulticastRun::Body::Take(std::string_view bytes, mcftp::Header& header) {
+  if (bytes.size() > kLongestReceived) return false;
+  std::copy(bytes.begin(), bytes.end(), received_.begin());
+  return mcftp::DecodeHeader(received_.data(), bytes.size(), header) &&
+         outbox_.Open(received_.data(), bytes.size());
+}
+
+void MulticastRun::Body::OnOverheard(const Peer& from, std::string_view bytes, Micros now) {
+  std::vector<Peer>& rivals = figures_.rivals;
+  const bool known = std::find(rivals.begin(), rivals.end(), from) != rivals.end();
+  mcftp::Header header;
+  mcftp::Announcement announcement;
+  if (from == own_ || known || rivals.size() == MulticastFigures::kMostRivals ||
+      !Take(bytes, header) || !header.Is(mcftp::Opcode::kAnnouncement) ||
+      !mcftp::DecodeAnnouncement(received_.data(), bytes.size(), announcement)) {
+    return;
+  }
+  rivals.push_back(from);
+  Tell(MulticastEventKind::kRival,
+       ToText(from) + " announces " + Printable(announcement.file_name, kMostShown) +
+           " on the same group",
+       now);
+}
+
 void MulticastRun::Body::OnDatagram(const Peer& from, std::string_view bytes, Micros now) {
   ++figures_.frames_received;
   mcftp::Header header;
-  bool good = bytes.size() <= kLongestReceived && from.address != own_.address && IsDevice(from);
-  if (good) {
-    std::copy(bytes.begin(), bytes.end(), received_.begin());
-    good = mcftp::DecodeHeader(received_.data(), bytes.size(), header) &&
-           outbox_.Open(received_.data(), bytes.size());
-  }
+  bool good = from.address != own_.address && IsDevice(from) && Take(bytes, header);
   if (good && session_ != nullptr) {
     good = session_->OnFrame(from, header, received_.data(), bytes.size(), now);
   }
@@ -419,7 +420,8 @@ MulticastRun::MulticastRun(MulticastOptions options, std::vector<MulticastFile> 
   CheckOptions(options);
   for (const MulticastFile& file : files) {
     const std::string objection = Objection(file);
-    Require(objection.empty(), "\"" + file.device_path + "\" " + objection);
+    if (objection.empty()) continue;
+    throw std::invalid_argument("\"" + file.device_path + "\" " + objection);
   }
   body_ = std::make_unique<Body>(std::move(options), std::move(files));
 }
@@ -436,6 +438,10 @@ void MulticastRun::Start(const Peer& own, Micros now) {
 
 void MulticastRun::OnDatagram(const Peer& from, std::string_view bytes, Micros now) {
   body_->OnDatagram(from, bytes, now);
+}
+
+void MulticastRun::OnOverheard(const Peer& from, std::string_view bytes, Micros now) {
+  body_->OnOverheard(from, bytes, now);
 }
 
 void MulticastRun::OnTime(Micros now) {

@@ -54,6 +54,9 @@ class MulticastRun {
   /// @param own  where the driver's socket is bound: written into announcements
   void Start(const Peer& own, Micros now);
   void OnDatagram(const Peer& from, std::string_view bytes, Micros now);
+  /// A datagram that came to the public group: a driver that listens there lets the run find out
+  /// that it is not the only server. Its own are ignored.
+  void OnOverheard(const Peer& from, std::string_view bytes, Micros now);
   /// To be called when deadline() is reached; calls before it change nothing.
   void OnTime(Micros now);
 

@@ -158,6 +158,10 @@ std::string ServerTroubles(const server::MulticastFigures& figures) {
     text += "  the session file could not be written " + Plural(figures.not_stored, "time") +
             ": a server that is started again knows less\n";
   }
+  for (const server::Peer& rival : figures.rivals) {
+    text += "  " + server::ToText(rival) +
+            " announces on the same group: what devices say may be meant for that server\n";
+  }
   return text;
 }
 
@@ -174,6 +178,8 @@ nlohmann::ordered_json ToJson(const server::MulticastFigures& figures) {
                               {"refused", figures.refused},
                               {"not_stored", figures.not_stored},
                               {"rate_limit", figures.rate}};
+  json["rivals"] = nlohmann::ordered_json::array();
+  for (const server::Peer& rival : figures.rivals) json["rivals"].push_back(server::ToText(rival));
   json["files"] = nlohmann::ordered_json::array();
   for (const FileFigures& file : figures.files) json["files"].push_back(ToJson(file));
   return json;

@@ -30,7 +30,14 @@ class VirtualMulticast {
             [this](sim::VirtualPort& /*port*/, const sim::Endpoint& from, std::string_view bytes) {
               run_.OnDatagram({from.address, from.port}, bytes, now());
               Go();
-            }) {}
+            }),
+        ears_(
+            world, {local.address, run.options().public_group.port},
+            [this](sim::VirtualPort& /*port*/, const sim::Endpoint& from, std::string_view bytes) {
+              run_.OnOverheard({from.address, from.port}, bytes, now());
+            }) {
+    ears_.Join(run.options().public_group.address);
+  }
   ~VirtualMulticast() { *alive_ = false; }
   VirtualMulticast(const VirtualMulticast&) = delete;
   VirtualMulticast& operator=(const VirtualMulticast&) = delete;
@@ -75,6 +82,7 @@ class VirtualMulticast {
 
   server::MulticastRun& run_;
   sim::VirtualPort port_;
+  sim::VirtualPort ears_;  ///< hears what is said on the public group, and says nothing
   std::function<void()> ended_;
   std::shared_ptr<bool> alive_ = std::make_shared<bool>(true);
   bool timer_set_ = false;

@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "server/multicast/session.h"
+#include "server/request.h"
 
 namespace server {
 namespace {
@@ -12,6 +13,7 @@ using mcftp::Role;
 
 constexpr std::uint16_t kDiskFull = 3;
 constexpr std::uint16_t kUnknownTransfer = 5;
+constexpr std::size_t kMostShown = 60;  ///< of a text from a device
 
 /// What a device says in "Overrun:6750:120".
 struct OverrunReport {
@@ -29,16 +31,6 @@ std::optional<OverrunReport> ParseOverrun(std::string_view message) {
   const auto block = std::from_chars(percent.ptr + 1, end, report.block);
   if (block.ec != std::errc{} || block.ptr != end) return std::nullopt;
   return report;
-}
-
-/// Text from a device as people may see it.
-std::string Printable(std::string_view text) {
-  constexpr std::size_t kMost = 60;
-  std::string shown(text.substr(0, kMost));
-  for (char& c : shown) {
-    if (c < ' ' || c > '~') c = '?';
-  }
-  return shown;
 }
 
 }  // namespace
@@ -206,7 +198,7 @@ void MulticastSession::OnNak(Device& device, std::uint16_t block, Micros now) {
 
 void MulticastSession::OnError(Device& device, const mcftp::ErrorFrame& error, Micros now) {
   ++figures_.errors;
-  const std::string words = Printable(error.message);
+  const std::string words = Printable(error.message, kMostShown);
   Heard(device, "ERROR " + std::to_string(error.code) + " " + words, now);
   if (transfer_ == nullptr || device.settled()) return;
   if (error.code == kDiskFull) {

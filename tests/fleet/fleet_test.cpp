@@ -84,6 +84,20 @@ TEST(FleetTest, WorksEnciphered) {
   EXPECT_TRUE(fleet::Run(plan).all_right());
 }
 
+TEST(FleetTest, EndsWhenTheServerIsCutOffForGoodAndCallsNobodyProven) {
+  Plan plan = PlanOf(3, 1);
+  plan.server.rate = 2'000'000;
+  for (std::uint32_t device = 0; device < plan.devices; ++device) {
+    plan.absences.push_back({device, milliseconds(100), seconds(0)});
+  }
+  const Outcome outcome = fleet::Run(plan);
+  EXPECT_TRUE(outcome.run_finished);
+  EXPECT_EQ(outcome.figures.files[0].Count(server::DeviceState::kDead), 3U);
+  for (const fleet::DeviceOutcome& device : outcome.devices) {
+    EXPECT_TRUE(device.ended) << "it waits for announcements no longer than five minutes";
+  }
+}
+
 /// What can befall a fleet.
 struct Trouble {
   const char* name;
@@ -119,6 +133,14 @@ constexpr Trouble kTroubles[] = {
        plan.server.rate = 2'000'000;
        const auto who = static_cast<std::uint32_t>(plan.seed % plan.devices);
        plan.absences.push_back({who, milliseconds(100), seconds(3)});
+     }},
+    {"ServerCutOff",
+     [](Plan& plan) {
+       plan.link.loss = 0.02;
+       plan.server.rate = 2'000'000;
+       for (std::uint32_t device = 0; device < plan.devices; ++device) {
+         plan.absences.push_back({device, milliseconds(100), seconds(6)});
+       }
      }},
 };
 

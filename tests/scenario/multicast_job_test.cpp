@@ -181,6 +181,48 @@ TEST_F(MulticastJobTest, HoldsUnderLoss) {
   EXPECT_THAT(GetFile("\\Data\\a.bin"), Optional(a));
 }
 
+TEST_F(MulticastJobTest, GoesOnByHttpWhenTheMulticastServerIsCutOffInTheMiddle) {
+  const std::string a = AddToJob("a.bin", 300000);
+  const std::string b = AddToJob("b.bin", 5000);
+  AddToMulticast("a.bin", a);
+  AddToMulticast("b.bin", b);
+  listener_ = [this](const server::MulticastEvent& event) {
+    if (event.kind != server::MulticastEventKind::kStarted) return;
+    network().At(world().now() + std::chrono::milliseconds(5), [this] {
+      network().Stall(0x0A000001, 0x0A000002);
+      network().Stall(0x0A000002, 0x0A000001);
+    });
+  };
+  RunBoth();
+  EXPECT_THAT(GetFile("\\Data\\a.bin"), Optional(a));
+  EXPECT_THAT(GetFile("\\Data\\b.bin"), Optional(b));
+  EXPECT_THAT(server().RequestedPaths(), ElementsAre("files/a.bin:1,1", "files/b.bin:2,1"));
+  EXPECT_TRUE(run_->finished());
+  EXPECT_EQ(run_->figures().files[0].Count(server::DeviceState::kDead), 1U);
+}
+
+/// As when two servers were started from two bundles, with one group.
+TEST_F(MulticastJobTest, EndsWithItsOwnFilesThoughASecondServerSendsOthersByTheSameNames) {
+  const std::string a = AddToJob("a.bin", 30000);
+  const std::string b = AddToJob("b.bin", 40000);
+  AddToMulticast("a.bin", a);
+  AddToMulticast("b.bin", b);
+  std::vector<server::MulticastFile> others = files_;
+  others[0].content = server::MemoryContent(fleet::Noise(30000, 1));
+  others[1].content = server::MemoryContent(fleet::Noise(35000, 2));
+  server::MulticastOptions options;
+  options.start.expected = 1;
+  options.seed = 2;
+  server::MulticastRun second(options, others);
+  tools::VirtualMulticast port(world(), sim::Endpoint{0x0A000003, 7001}, second);
+  After(seconds(9), [&port] { port.Start(); });
+  RunBoth();
+  EXPECT_THAT(GetFile("\\Data\\a.bin"), Optional(a));
+  EXPECT_THAT(GetFile("\\Data\\b.bin"), Optional(b));
+  EXPECT_EQ(server().Device().report->error, "");
+  EXPECT_FALSE(server().RequestedPaths().empty());
+}
+
 TEST_F(MulticastJobTest, FallsBackToHttpWhenNoServerAnnouncesAnything) {
   const std::string a = AddToJob("a.bin", 1000);
   EXPECT_EQ(Start(job_), ICFG_OK);

@@ -170,6 +170,12 @@ TEST(MulticastTableTest, SaysWhatTheSystemRefused) {
   EXPECT_THAT(FormatMulticast(figures, 1, 0, 1),
               HasSubstr("  7 datagrams of these did not go out: "));
   EXPECT_EQ(ToJson(figures).at("refused"), 7);
+  EXPECT_TRUE(ToJson(figures).at("rivals").empty());
+  figures.rivals = {{0x0A000003, 7001}};
+  EXPECT_THAT(FormatMulticastReport(figures),
+              HasSubstr("  10.0.0.3:7001 announces on the same group: "
+                        "what devices say may be meant for that server\n"));
+  EXPECT_EQ(ToJson(figures).at("rivals").at(0), "10.0.0.3:7001");
   EXPECT_EQ(ToJson(figures).at("not_stored"), 1);
 }
 
