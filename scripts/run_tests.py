@@ -75,6 +75,19 @@ def unless_missing(packages, action):
     return guarded
 
 
+def unless_unbuilt(result, action):
+    """A step that is skipped where the build before it has not left its result."""
+
+    def guarded(step, counts):
+        if (ROOT / result).exists():
+            return action(step, counts)
+        counts.skipped += 1
+        print(f"    skipped: {step}: there is no {result}")
+        return True
+
+    return guarded
+
+
 def build(preset, *targets):
     command = ["cmake", "--build", "--preset", preset, "-j", JOBS]
     return check(["cmake", "--preset", preset], command + (["--target", *targets] if targets else []))
@@ -177,6 +190,10 @@ ARM_LINUX = {"g++-arm-linux-gnueabi": "arm-linux-gnueabi-g++", "qemu-user": "qem
 ARM_NONE = {"gcc-arm-none-eabi": "arm-none-eabi-g++",
             "libstdc++-arm-none-eabi-newlib": "/usr/include/newlib/c++"}
 
+# What looks at the device's library.
+CE_LINT = {"gcc-arm-none-eabi": "arm-none-eabi-g++", "binutils-arm-none-eabi": "arm-none-eabi-objdump",
+           "llvm-14": "llvm-readobj-14"}
+
 STEPS = [
     ("layers", "who may include whom", check([sys.executable, "scripts/check_layers.py"])),
     ("words", "words and paths that must not be in the project",
@@ -198,6 +215,8 @@ STEPS = [
     ("ce", "the library for Windows CE on 32-bit ARM", unless_missing(ARM_NONE, check(
         ["cmake", "--preset", "ce"], ["cmake", "--build", "--preset", "ce", "-j", JOBS],
         [sys.executable, "scripts/check_ce.py", "build/ce"]))),
+    ("ce-lint", "what the device's library consists of", unless_missing(CE_LINT, unless_unbuilt(
+        "build/ce/orvenix.dll", check([sys.executable, "scripts/check_ce_binary.py", "build/ce"])))),
     ("ce-loader-build", "the simulator and the loader for 32-bit ARM",
      unless_missing(ARM_LINUX, build("ce-loader"))),
     ("ce-loader", "their tests, carried out by qemu", unless_missing(ARM_LINUX, ctest("ce-loader"))),

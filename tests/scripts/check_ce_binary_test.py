@@ -1,0 +1,234 @@
+"""Shows of each rule of scripts/check_ce_binary.py that it catches what it is there for."""
+
+import pathlib
+import shutil
+import subprocess
+import sys
+import tempfile
+import unittest
+
+ROOT = pathlib.Path(__file__).resolve().parent.parent.parent
+sys.path.insert(0, str(ROOT / "scripts"))
+sys.dont_write_bytecode = True
+
+import check_ce_binary as lint  # noqa: E402
+
+
+def disassembly(*code, function="Alpha"):
+    lines = "".join(f"10001{at * 4:03x}:\t{one}\n" for at, one in enumerate(code))
+    return f"\norvenix.elf:     file format elf32-littlearm\n\n10001000 <{function}>:\n{lines}"
+
+
+def complaints(*code, reviewed=()):
+    return [line.rsplit(": ", 1)[1] for line in lint.check_code(disassembly(*code), set(reviewed))]
+
+
+class CodeTest(unittest.TestCase):
+    def test_takes_what_the_compiler_makes_for_version_4t(self):
+        self.assertEqual(complaints(
+            "push\t{r4, lr}", "sub\tsp, sp, #8", "ldr\tr0, [pc, #12]\t@ 10001020 <Alpha+0x20>",
+            "cmp\tr0, #3", "ldrls\tpc, [pc, r0, lsl #2]", ".word\t0x0badf00d", "mov\tlr, pc", "bx\tr3",
+            "movne\tlr, pc", "bxne\tr3", "ldrsbcs\tr1, [r2, #1]", "umull\tr0, r1, r2, r3", "stmib\tsp, {r0, r1}",
+            "addseq\tr0, r0, #1", "nop\t\t\t@ (mov r0, r0)",
+            "bic\tr1, r1, #3", "mov\tr0, sp", "pop\t{r4, lr}", "bxeq\tlr", "bx\tlr"), [])
+
+    def test_refuses_instructions_of_later_processors(self):
+        for code in ("ldrd\tr0, [sp]", "strd\tr4, [sp, #8]", "strdne\tr4, [r0]", "clz\tr0, r1", "blx\tr3",
+                     "pld\t[r0]", "bkpt\t0x0000", "movw\tr0, #1", "rev\tr0, r0", "ldrex\tr0, [r1]",
+                     "smulbb\tr0, r1, r2", "vldr\td0, [r0]", "svc\t0x00000000", "mcr\t15, 0, r0, cr7, cr10, {5}",
+                     "\t@ <UNDEFINED> instruction: 0xe7ffffff"):
+            self.assertEqual(len(complaints(code)), 1, code)
+
+    def test_refuses_returns_and_jumps_without_bx(self):
+        for code in ("pop\t{r4, pc}", "ldm\tsp!, {r4, pc}", "ldmfd\tsp!, {pc}", "ldr\tpc, [r3]",
+                     "ldr\tpc, [sp], #4", "ldrne\tpc, [pc, #4]", "mov\tpc, lr", "movs\tpc, lr", "moveq\tpc, r3",
+                     "add\tpc, pc, r3, lsl #2", "sub\tpc, lr, #4"):
+            self.assertEqual(len(complaints(code)), 1, code)
+
+    def test_refuses_a_call_that_is_no_bx(self):
+        self.assertEqual(complaints("mov\tlr, pc", "nop"),
+                         ["does not call by BX, though the link register has been set"])
+        self.assertEqual(len(complaints("mov\tlr, pc", "ldr\tpc, [r3]")), 1)
+        self.assertEqual(len(complaints("movne\tlr, pc", "bx\tr3")), 1)
+
+    def test_refuses_to_round_to_eight_but_where_it_has_been_seen(self):
+        for code in ("bic\tr3, r3, #7", "bicne\tr3, r3, #7", "bics\tr9, r9, #7", "bic\tr2, r3, #7", "bic\tsp, sp, #7"):
+            self.assertIn("rounds to a multiple of 8", complaints(code))
+        self.assertEqual(complaints("bic\tr3, r3, #7", reviewed=["Alpha"]), [])
+        self.assertEqual(lint.check_code(disassembly("bic\tr3, r3, #7", function="Alpha.constprop.0"), {"Alpha"}), [])
+        self.assertEqual(lint.check_code(disassembly("bx\tlr"), {"Alpha"}),
+                         ["platform/ce/reviewed_code.txt: Alpha rounds nothing any more"])
+
+    def test_refuses_to_take_the_stack_pointer_for_round(self):
+        for code in ("orr\tr0, sp, #4", "and\tr0, sp, #7", "tst\tsp, #7", "eor\tr0, sp, #4", "bic\tsp, sp, #15"):
+            self.assertEqual(len(complaints(code)), 1, code)
+
+    def test_finds_all_of_it_in_what_the_assembler_makes(self):
+        if not shutil.which("arm-none-eabi-as"):
+            self.skipTest("binutils-arm-none-eabi is not installed")
+        code = {"ldrd r0, r1, [sp]": "instructions of version", "clz r0, r1": "instructions of version",
+                "blx r3": "instructions of version", "pld [r0]": "instructions of version",
+                "pop {r4, pc}": "returns", "ldr pc, [r3]": "jumps", "mov pc, lr": "jumps",
+                "bic r3, r3, #7": "rounds", "orr r0, sp, #4": "stack pointer"}
+        with tempfile.TemporaryDirectory() as folder:
+            source = pathlib.Path(folder, "bad.s")
+            source.write_text(".syntax unified\n.arch armv5te\n.arm\nBad:\n" + "".join(f"  {one}\n" for one in code)
+                              + "  bx lr\n  .word 0xf5d0f000\n")
+            subprocess.run(["arm-none-eabi-as", "-o", f"{folder}/bad.o", source], check=True)
+            text = subprocess.run(["arm-none-eabi-objdump", "-d", "--no-show-raw-insn", f"{folder}/bad.o"],
+                                  check=True, capture_output=True, text=True).stdout
+        found = lint.check_code(text, set())
+        self.assertEqual(len(found), len(code), found)
+        for complaint, expected in zip(found, code.values()):
+            self.assertIn(expected, complaint)
+
+
+HEADER = """  Machine: IMAGE_FILE_MACHINE_ARM (0x1C0)
+  TimeDateStamp: 1970-01-01 00:00:00 (0x0)
+  OptionalHeaderSize: 224
+  Characteristics [ (0x210E)
+  ImageBase: 0x10000000
+  SectionAlignment: 4096
+  FileAlignment: 512
+  MajorSubsystemVersion: 5
+  MinorSubsystemVersion: 0
+  Subsystem: IMAGE_SUBSYSTEM_WINDOWS_CE_GUI (0x9)
+"""
+
+IMPORTS = """Import {
+  Name: COREDLL.dll
+  ImportLookupTableRVA: 0x703C
+  Symbol: Sleep (0)
+  Symbol: GetTickCount (0)
+}
+Import {
+  Name: WS2.dll
+  Symbol: send (0)
+}
+"""
+LISTED = {"COREDLL.dll": {"Sleep", "GetTickCount"}, "WS2.dll": {"send"}}
+
+EXPORTS = """Export {
+  Ordinal: 1
+  Name: Alpha
+  RVA: 0x1008
+}
+Export {
+  Ordinal: 2
+  Name: beta
+  RVA: 0x1010
+}
+"""
+
+RELOCATIONS = """BaseReloc [
+  Entry {
+    Type: HIGHLOW
+    Address: 0x1020
+  }
+  Entry {
+    Type: ABSOLUTE
+    Address: 0x1000
+  }
+]
+"""
+READELF = """
+Relocation section '.rel.text' at offset 0x6004 contains 2 entries:
+10001020  00000102 R_ARM_ABS32            10002000   names
+10001000  0000011c R_ARM_CALL             10001008   Alpha
+
+Relocation section '.rel.debug_info' at offset 0x60fc contains 1 entry:
+00000006  00001102 R_ARM_ABS32            00000000   .debug_abbrev
+"""
+
+
+class HeaderTest(unittest.TestCase):
+    def test_refuses_every_other_value(self):
+        self.assertEqual(lint.check_header(HEADER), [])
+        for line in HEADER.splitlines():
+            self.assertEqual(len(lint.check_header(HEADER.replace(line + "\n", ""))), 1, line)
+        self.assertEqual(lint.check_header(HEADER.replace("WINDOWS_CE_GUI (0x9)", "WINDOWS_GUI (0x2)")),
+                         ["the header's Subsystem is IMAGE_SUBSYSTEM_WINDOWS_GUI (0x2)"])
+
+    def test_refuses_imports_but_the_listed_ones(self):
+        self.assertEqual(lint.check_imports(IMPORTS, LISTED), [])
+        self.assertEqual(lint.check_imports(IMPORTS, {**LISTED, "WS2.dll": {"recv"}}),
+                         ["imports send of WS2.dll, which imports.txt does not list",
+                          "does not import recv of WS2.dll, which imports.txt lists"])
+        self.assertEqual(len(lint.check_imports(IMPORTS, {**LISTED, "WS2.dll": {"send"}, "AYGSHELL.dll": {"X"}})), 1)
+        self.assertEqual(lint.check_imports(IMPORTS.replace("send (0)", "send (3)"), LISTED),
+                         ["imports send of WS2.dll with hint 3"])
+        self.assertTrue(lint.check_imports(IMPORTS.replace("send (0)", " (7)"), LISTED))
+
+    def test_refuses_imports_with_wide_arguments_even_when_listed(self):
+        for name in ("__rt_sdiv64by64", "_abs64", "sin", "pow", "atof", "_atoi64", "__addd", "__dtoi64", "difftime"):
+            found = lint.check_imports(IMPORTS.replace("send", name), {**LISTED, "WS2.dll": {name}})
+            self.assertEqual(found, [f"imports {name}, which takes or gives more than 32 bits"])
+
+    def test_reads_the_list_of_imports_by_library(self):
+        text = "# all\n\n[COREDLL.dll]\nSleep\nGetTickCount\n[WS2.dll]\nsend\n"
+        self.assertEqual(lint.listed_imports(text), LISTED)
+
+    def test_refuses_exports_but_the_listed_ones(self):
+        self.assertEqual(lint.check_exports(EXPORTS, {"Alpha", "beta"}), [])
+        self.assertEqual(lint.check_exports(EXPORTS, {"Alpha"}),
+                         ["exports beta, which exports.txt does not list"])
+        self.assertEqual(lint.check_exports(EXPORTS, {"Alpha", "beta", "Gamma"}),
+                         ["does not export Gamma, which exports.txt lists"])
+        turned = EXPORTS.replace("Alpha", "@").replace("beta", "Alpha").replace("@", "beta")
+        self.assertEqual(lint.check_exports(turned, {"Alpha", "beta"}),
+                         ["the exports are not sorted, or one is there twice"])
+
+    def test_refuses_relocations_but_those_that_the_linker_listed(self):
+        self.assertEqual(lint.check_relocations(RELOCATIONS, READELF), [])
+        self.assertEqual(lint.check_relocations(RELOCATIONS, READELF.replace("R_ARM_CALL ", "R_ARM_ABS32")),
+                         ["has 1 relocations, where the linker listed 2"])
+        self.assertEqual(len(lint.check_relocations(RELOCATIONS.replace("HIGHLOW", "THUMB_MOV32"), READELF)), 2)
+
+
+FORMATTED = "[[gnu::format(printf, 1, 2)]] void Log(const char* format, ...) noexcept;\n"
+
+
+class VariadicTest(unittest.TestCase):
+    def test_takes_formats_of_words(self):
+        self.assertEqual(lint.check_formats({"log.h": FORMATTED, "a.cpp": '''
+            Log("%d %-8.3s %*.*s %08lX %c %u%%f\\n", 1, "a"); quote = '"'; (Store(to), ...);
+            template <typename... T> void F(T... all) { (Store(all), ...); }
+            void Log(const char* format, ...) noexcept { va_start(arguments, format); }'''}), [])
+
+    def test_refuses_formats_of_more(self):
+        for conversion in ("%lld", "%5.1f", "%g", "%llX", "%jd", "%zu", "%I64d", "%La"):
+            found = lint.check_formats({"a.cpp": f'Log("wide: {conversion}\\n", wide);'})
+            self.assertEqual(len(found), 1, conversion)
+        self.assertEqual(len(lint.check_formats({"a.cpp": 'Log("split %l"\n    "lu");'})), 1)
+
+    def test_refuses_variadic_functions_whose_formats_nobody_reads(self):
+        found = lint.check_formats({"log.h": FORMATTED + "\nvoid Tell(const char* format, ...);\n"})
+        self.assertEqual(found, ["log.h:3: Tell is variadic, and its format is compared with nothing"])
+        self.assertEqual(len(lint.check_formats({"a.h": "int Sum(...);"})), 1)
+
+    def test_refuses_to_compile_without_comparing_formats(self):
+        entry = {"file": "/home/src/a.cpp", "command": "g++ -Werror -Wformat=2 -c a.cpp"}
+        self.assertEqual(lint.check_flags([entry]), [])
+        self.assertEqual(len(lint.check_flags([{**entry, "command": "g++ -Werror -Wformat -c a.cpp"}])), 1)
+
+    def test_knows_the_device_s_variadic_functions(self):
+        api = "void NKDbgPrintfW(const WCHAR* format, ...);\nBOOL Sleep(DWORD time);\nint wsprintfW(WCHAR* out,\n const WCHAR* f, ...);"
+        self.assertEqual(lint.device_variadic(api), {"NKDbgPrintfW", "wsprintfW"})
+
+    def test_compiles_wide_calls_with_a_look_at_the_types(self):
+        compiler = shutil.which("arm-none-eabi-g++")
+        if not compiler:
+            self.skipTest("gcc-arm-none-eabi is not installed")
+        with tempfile.TemporaryDirectory() as folder:
+            pathlib.Path(folder, "coredll.h").write_text(
+                '#pragma once\nextern "C" void NKDbgPrintfW(const char16_t* format, ...);\n')
+            source = pathlib.Path(folder, "a.cpp")
+            command = f"/usr/bin/cmake -E env X=1 {compiler} -std=c++17 -I{folder} -o a.o -c {source}"
+            for argument, good in (("1U", True), ('u"text"', True), ("source", True), ("1LL", False), ("2.0F", False)):
+                source.write_text("#include <coredll.h>\nvoid F(const char16_t (&source)[3]) "
+                                  f'{{ NKDbgPrintfW(u"%s", {argument}); (void)source; }}\n')
+                self.assertEqual(lint.check_wide_calls(command, source) == [], good, argument)
+
+
+if __name__ == "__main__":
+    unittest.main()
