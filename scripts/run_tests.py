@@ -209,6 +209,8 @@ STEPS = [
     ("exports", "what the library exports and needs",
      check([sys.executable, "scripts/check_exports.py", "build/release/lib/liborvenix.so"],
            [sys.executable, "scripts/check_surface.py", "build/release/lib/liborvenix.so"])),
+    ("install", "the installed library, used by integrators in C and in C++",
+     check([sys.executable, "scripts/check_install.py", "build/release", "build/dev/bin/orvenix"])),
     ("windows", "the library for desktop Windows",
      check(["cmake", "--preset", "windows"], ["cmake", "--build", "--preset", "windows", "-j", JOBS],
            [sys.executable, "scripts/check_exports.py", "build/windows/bin/orvenix.dll"])),
