@@ -11,8 +11,13 @@ using Byte = unsigned char;
 /// Four bytes of whatever lies there.
 using Word [[gnu::may_alias]] = std::uint32_t;
 
+/// Four words, which travel in one instruction each way.
+struct [[gnu::may_alias]] Run {
+  std::uint32_t words[4];
+};
+
 inline constexpr std::size_t kWord = sizeof(Word);
-inline constexpr std::size_t kRun = 4 * kWord;
+inline constexpr std::size_t kRun = sizeof(Run);
 /// Below this it does not pay to look for words.
 inline constexpr std::size_t kShort = 16;
 
@@ -32,21 +37,19 @@ inline void CopyBytes(Byte* to, const Byte* from, std::size_t size) noexcept {
   while (size-- > 0) *to++ = *from++;
 }
 
-/// Both sides are aligned. Four words at a time, so that they travel in one instruction each way.
+/// Both sides are aligned.
 inline std::size_t CopyWords(Byte* to, const Byte* from, std::size_t size) noexcept {
+  std::size_t left = size;
+  const std::uintptr_t ahead =
+      reinterpret_cast<std::uintptr_t>(from) - reinterpret_cast<std::uintptr_t>(to);
+  if (ahead >= kRun) {  // else one run would reach into its own source
+    for (; left >= kRun; left -= kRun, to += kRun, from += kRun) {
+      *static_cast<Run*>(static_cast<void*>(to)) =
+          *static_cast<const Run*>(static_cast<const void*>(from));
+    }
+  }
   auto* target = Words(to);
   const auto* source = Words(from);
-  std::size_t left = size;
-  for (; left >= kRun; left -= kRun, target += 4, source += 4) {
-    const Word first = source[0];
-    const Word second = source[1];
-    const Word third = source[2];
-    const Word fourth = source[3];
-    target[0] = first;
-    target[1] = second;
-    target[2] = third;
-    target[3] = fourth;
-  }
   for (; left >= kWord; left -= kWord) *target++ = *source++;
   return size - left;
 }
