@@ -5,11 +5,14 @@
 // and 32 powers are one word.
 //
 //  Bytes    The remainder takes in one byte with one look-up.
-//  Strands  Words are dealt out to six remainders that do not wait for each other; each steps over
-//           the other five's words with four look-ups. At the end they are taken in one by one.
+//  Strands  Words are dealt out to remainders that do not wait for each other; each steps over the
+//           others' words with four look-ups. At the end they are taken in one by one.
 //  Folding  P divides x^9600 + x^4960 + x^3744 + x^2848 + 1. So a word may be struck out of the
 //           message when it is added to the words 145, 183, 211 and 300 further on, which takes no
 //           look-up at all. Folding goes on until 300 words are left for the strands.
+//
+// A large core has six strands and folds. A handheld's has few registers and waits little for a
+// look-up: two strands fit, and folding would take it twice as many instructions.
 #include "base/crc32.h"
 
 #include <cstring>
@@ -19,7 +22,8 @@ namespace {
 
 constexpr std::uint32_t kGenerator = 0xEDB88320U;  // x^32 is understood; the lowest bit is x^31
 constexpr std::size_t kWord = 4;
-constexpr std::size_t kStrands = 6;
+constexpr bool kLargeCore = sizeof(void*) >= 8;
+constexpr std::size_t kStrands = kLargeCore ? 6 : 2;
 constexpr std::size_t kRow = kStrands * kWord;
 
 constexpr std::uint32_t TimesX(std::uint32_t value) noexcept {
@@ -77,17 +81,30 @@ std::uint32_t TakeBytes(std::uint32_t remainder, const std::uint8_t* bytes,
   return remainder;
 }
 
+/// The value itself, of which the compiler knows nothing any more: it keeps it in a register. An
+/// address in the tables it would compute again for each look-up.
+template <typename Value>
+[[gnu::always_inline]] inline Value Kept(Value value) noexcept {
+  if constexpr (!kLargeCore) asm("" : "+r"(value));
+  return value;
+}
+
 /// @param bytes  aligned to a word
 /// @param rows   at least 1
 std::uint32_t TakeRows(std::uint32_t remainder, const std::uint8_t* bytes,
                        std::size_t rows) noexcept {
   std::uint32_t strand[kStrands] = {remainder};
+  const std::uint32_t* const first = Kept(kTables.strand[0]);
+  const std::uint32_t* const second = Kept(kTables.strand[1]);
+  const std::uint32_t* const third = Kept(kTables.strand[2]);
+  const std::uint32_t* const fourth = Kept(kTables.strand[3]);
+  const std::uint32_t byte = Kept(std::uint32_t{0xFF});
   for (; rows > 1; --rows, bytes += kRow) {
 #pragma GCC unroll 8
     for (std::size_t i = 0; i < kStrands; ++i) {
       const std::uint32_t word = strand[i] ^ WordAt(bytes + i * kWord);
-      strand[i] = kTables.strand[0][word & 0xFFU] ^ kTables.strand[1][(word >> 8) & 0xFFU] ^
-                  kTables.strand[2][(word >> 16) & 0xFFU] ^ kTables.strand[3][word >> 24];
+      strand[i] = first[word & byte] ^ second[(word >> 8) & byte] ^ third[(word >> 16) & byte] ^
+                  fourth[word >> 24];
     }
   }
   remainder = 0;
@@ -164,8 +181,13 @@ void Crc32::Update(const void* bytes, std::size_t size) noexcept {
   remainder_ = TakeBytes(remainder_, at, first);
   at += first;
   size -= first;
-  remainder_ =
-      size < kFoldFrom ? TakeWords(remainder_, at, size) : TakeFolding(remainder_, at, size);
+  if constexpr (kLargeCore) {
+    if (size >= kFoldFrom) {
+      remainder_ = TakeFolding(remainder_, at, size);
+      return;
+    }
+  }
+  remainder_ = TakeWords(remainder_, at, size);
 }
 
 }  // namespace base
