@@ -1,5 +1,5 @@
 // A switch in user space: links with a rate, a delay and a loss, between interfaces of one network
-// namespace.
+// namespace. With two interfaces it is a line between them.
 //
 //   bench_wire RATE_MBIT DELAY_US LOSS_PERCENT SEED SERVER_IF RECEIVER_IF...
 //
@@ -12,6 +12,7 @@
 #include <net/ethernet.h>
 #include <net/if.h>
 #include <poll.h>
+#include <sys/prctl.h>
 #include <sys/socket.h>
 #include <unistd.h>
 
@@ -74,6 +75,8 @@ int OpenPort(const char* name) {
   address.sll_family = AF_PACKET;
   address.sll_protocol = htons(ETH_P_ALL);
   address.sll_ifindex = static_cast<int>(::if_nametoindex(name));
+  const int on = 1;
+  ::setsockopt(made, SOL_PACKET, PACKET_IGNORE_OUTGOING, &on, sizeof on);
   const int room = 64 << 20;
   ::setsockopt(made, SOL_SOCKET, SO_RCVBUFFORCE, &room, sizeof room);
   ::setsockopt(made, SOL_SOCKET, SO_SNDBUFFORCE, &room, sizeof room);
@@ -214,6 +217,7 @@ class Switch {
 }  // namespace
 
 int main(int count, char** arguments) {
+  ::prctl(PR_SET_TIMERSLACK, 1000UL);  // nanoseconds: frames of a fast line come close together
   if (count < 7) {
     std::fprintf(stderr, "usage: bench_wire RATE_MBIT DELAY_US LOSS_PERCENT SEED IF IF...\n");
     return 2;

@@ -7,6 +7,7 @@
 
 #include "net/posix/device_sockets.h"
 #include "net/posix/file.h"
+#include "net/posix/inbox.h"
 #include "net/transport.h"
 
 namespace sim {
@@ -34,28 +35,25 @@ class PosixDatagram final : public Transport {
   int Tune(Tuning what, int value) override;
   unsigned Ready(unsigned interest) override;
   void Watch(unsigned interest, std::vector<pollfd>& files) const override;
-  [[nodiscard]] Endpoint local() const override { return own_box_.file.Local(); }
+  [[nodiscard]] Endpoint local() const override { return own_box_.file().Local(); }
   [[nodiscard]] Endpoint peer() const override { return peer_; }
   void Abort() override {}
 
  private:
-  struct Inbox {
-    SocketFile file;
-    Address group = kAnyAddress;  ///< 0: the device's own address
-    bool heard = false;           ///< the first datagram in line is one that is not lost
-  };
-
-  int OpenGroup(Address group, SocketFile& file);
+  int OpenGroup(Address group, Inbox& inbox);
   [[nodiscard]] Inbox* FirstReadable();
-  [[nodiscard]] Inbox* FindFirstReadable();
-  void DropStrangers(Inbox& inbox);
-  void DropLost(Inbox& inbox);
+  [[nodiscard]] Inbox* FirstInLine();
+  void ListOpenInboxes();
+  [[nodiscard]] bool MustFill() const;
+  bool FillEmptyInboxes();
+  void DropUnheard(Inbox& inbox);
 
   Inbox own_box_;
   std::map<Address, Inbox> groups_;  ///< closed files until the socket is bound
-  Inbox* first_ = nullptr;           ///< known to have something to read
-  std::vector<pollfd> polled_;       ///< the inboxes' open files, for one call
-  std::vector<Inbox*> inboxes_;      ///< whose files they are
+  std::vector<Inbox*> inboxes_;      ///< those whose files are open, for one call
+  std::vector<pollfd> polled_;       ///< files of some of them, for one call
+  std::uint64_t round_ = 0;          ///< looks at the host's files
+  int error_ = 0;                    ///< what the host had instead of a datagram
   DeviceSockets& device_;
   bool bound_ = false;
   std::uint16_t port_ = 0;  ///< once it is bound

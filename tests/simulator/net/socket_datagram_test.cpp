@@ -101,6 +101,25 @@ TYPED_TEST(SocketDatagramTest, HearsItsGroupsAndItselfInTheOrderOfSending) {
   for (int i = 0; i < 6; ++i) EXPECT_EQ(ReceiveText(member), std::to_string(i));
 }
 
+/// A device that gets its turn late finds more than it takes from the host at one time.
+TYPED_TEST(SocketDatagramTest, KeepsTheOrderOfALongBacklogAndWhatComesMeanwhile) {
+  const SOCKET member = Udp();
+  ASSERT_EQ(Bind(member, sim::kAnyAddress), 0);
+  const std::uint16_t port = LocalName(member).port;
+  ASSERT_EQ(Group(member, CE_IP_ADD_MEMBERSHIP, kGroup), 0);
+  const SOCKET sender = Udp();
+  const auto target = [port](int i) { return sim::Endpoint{i % 23 == 0 ? kDevice : kGroup, port}; };
+  for (int i = 0; i < 100; ++i) SendTo(sender, target(i), std::to_string(i));
+
+  for (int i = 0; i < 100; ++i) {
+    ASSERT_EQ(Select(member, For::kRead, 0), 1);
+    ASSERT_EQ(ReceiveText(member), std::to_string(i));
+    SendTo(sender, target(100 + i), std::to_string(100 + i));
+  }
+  for (int i = 100; i < 200; ++i) ASSERT_EQ(ReceiveText(member), std::to_string(i));
+  EXPECT_EQ(Select(member, For::kRead, 0), 0);
+}
+
 TYPED_TEST(SocketDatagramTest, ShowsAListenerWhatIsSentAndReceived) {
   const SOCKET member = Udp();
   ASSERT_EQ(Bind(member, sim::kAnyAddress), 0);
