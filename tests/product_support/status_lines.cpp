@@ -17,4 +17,8 @@ void ClearStatusLines() {
   report::window_state.lines.Clear();
 }
 
+int OverallProgress() {
+  return report::window_state.overall_value.get();
+}
+
 }  // namespace test

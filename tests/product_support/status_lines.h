@@ -10,5 +10,7 @@ namespace test {
 std::vector<std::string> StatusLines();
 /// They belong to the process, not to a device.
 void ClearStatusLines();
+/// The whole job's progress, of report::kBarUnits.
+int OverallProgress();
 
 }  // namespace test

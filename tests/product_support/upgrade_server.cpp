@@ -1,9 +1,9 @@
 #include "product_support/upgrade_server.h"
 
-#include <zlib.h>
-
 #include <fstream>
 #include <stdexcept>
+
+#include "base/crc32.h"
 
 namespace test {
 namespace {
@@ -147,8 +147,9 @@ UpgradeServer::Treatment AnswerWith(std::string answer, Afterwards afterwards) {
 }
 
 std::string CrcText(std::string_view content) {
-  return std::to_string(
-      crc32(0, reinterpret_cast<const Bytef*>(content.data()), static_cast<uInt>(content.size())));
+  base::Crc32 crc;
+  crc.Update(content.data(), content.size());
+  return std::to_string(crc.value());
 }
 
 }  // namespace test

@@ -10,6 +10,7 @@
 #include "kernel/kernel.h"
 #include "memory/memory.h"
 #include "orvenix/configlet.h"
+#include "product_support/status_lines.h"
 #include "report/window/window_state.h"
 #include "scenario/scenario_test.h"
 #include "server/multicast_run.h"
@@ -269,7 +270,7 @@ TEST_F(MulticastJobTest, ShowsItsProgress) {
   job_.required_space = "100000";
   StartBoth();
   while (LogLinesWith("StartMulticastClient - Exiting").empty()) Sleep(50);
-  EXPECT_EQ(report::window_state.overall_value.get(), report::kBarUnits / 2);
+  EXPECT_EQ(test::OverallProgress(), report::kBarUnits / 2);
   ASSERT_TRUE(test::AwaitEndOfJobs(device()));
 }
 

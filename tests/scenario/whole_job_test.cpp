@@ -9,6 +9,7 @@
 #include "memory/memory.h"
 #include "orvenix/configlet.h"
 #include "power/power.h"
+#include "product_support/status_lines.h"
 #include "report/window/window_state.h"
 #include "scenario/scenario_test.h"
 #include "window/screen.h"
@@ -89,7 +90,7 @@ TEST_F(WholeJobTest, KeepsItsOwnBarWhenTheNextJobIsAnnounced) {
   while (GetFile("\\late.bin") != "late") Sleep(100);
   Sleep(1000);
 
-  EXPECT_EQ(report::window_state.overall_value.get(), report::kBarUnits / 2) << "4 of 8 bytes";
+  EXPECT_EQ(test::OverallProgress(), report::kBarUnits / 2) << "4 of 8 bytes";
   ASSERT_TRUE(test::AwaitEndOfJobs(device()));
 }
 

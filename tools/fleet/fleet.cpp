@@ -205,13 +205,6 @@ Outcome Voyage::Go() {
 
 }  // namespace
 
-sim::LinkProfile Plan::DefaultLink() {
-  sim::LinkProfile link;
-  link.delay = std::chrono::microseconds(500);
-  link.bytes_per_second = 12'500'000;
-  return link;
-}
-
 std::size_t Outcome::Count(FileFate fate) const {
   return std::accumulate(devices.begin(), devices.end(), std::size_t{0},
                          [fate](std::size_t sum, const DeviceOutcome& device) {
@@ -230,16 +223,6 @@ bool Outcome::all_right() const {
 
 Outcome Run(const Plan& plan) {
   return Voyage(plan).Go();
-}
-
-std::string Noise(std::size_t size, std::uint64_t seed) {
-  std::string bytes(size, '\0');
-  std::uint64_t state = seed;
-  for (char& byte : bytes) {
-    state = state * 6364136223846793005U + 1442695040888963407U;
-    byte = static_cast<char>(state >> 56U);
-  }
-  return bytes;
 }
 
 double IdealFrames(std::uint32_t devices, double loss) {

@@ -21,6 +21,9 @@ struct Table {
 
 std::atomic<SetCallbacks> library{nullptr};
 
+std::mutex tables_mutex;
+std::deque<Table> tables;  ///< the library keeps their addresses
+
 int PassOn(std::uintptr_t context, const char* text, std::int32_t length,
            const IcfgCallbacks* table) {
   const IcfgCallbacks* const host = reinterpret_cast<const Table*>(table)->host;
@@ -29,11 +32,9 @@ int PassOn(std::uintptr_t context, const char* text, std::int32_t length,
 
 std::uint32_t SetThroughGate(std::uintptr_t context, const IcfgCallbacks* table) {
   if (table == nullptr) return library.load()(context, nullptr);
-  static std::mutex mutex;
-  static std::deque<Table> tables;  // the library keeps their addresses
   const Table* given = nullptr;
   {
-    const std::lock_guard<std::mutex> hold(mutex);
+    const std::lock_guard<std::mutex> hold(tables_mutex);
     tables.push_back({*table, table});
     if (table->set_data != nullptr) {
       tables.back().shown.set_data = reinterpret_cast<decltype(table->set_data)>(
@@ -49,6 +50,14 @@ std::uint32_t SetThroughGate(std::uintptr_t context, const IcfgCallbacks* table)
 Function CallbacksThroughGates(Function set_callbacks) {
   library = reinterpret_cast<SetCallbacks>(set_callbacks);
   return reinterpret_cast<Function>(&SetThroughGate);
+}
+
+const IcfgCallbacks* HostTable(const IcfgCallbacks* given) {
+  const std::lock_guard<std::mutex> hold(tables_mutex);
+  for (const Table& table : tables) {
+    if (&table.shown == given) return table.host;
+  }
+  return given;
 }
 
 }  // namespace loader

@@ -23,10 +23,11 @@ extern "C" {{
 
 namespace loader {{
 
-const HostFunction kHostFunctions[] = {{
+// There before any code runs: a DLL may be loaded by what runs before main.
+constexpr HostFunction kHostFunctions[] = {{
 {rows}
 }};
-const std::size_t kHostFunctionCount = {count};
+constexpr std::size_t kHostFunctionCount = {count};
 
 }}  // namespace loader
 """

@@ -10,18 +10,18 @@ struct State {
   device::Lock lock;  ///< around what follows, never around a call of the host
   HostCallbacks callbacks;
 };
-State state;
+State host;
 
 }  // namespace
 
 void SetHostCallbacks(HostCallbacks callbacks) noexcept {
-  const device::LockGuard lock(state.lock);
-  state.callbacks = callbacks;
+  const device::LockGuard lock(host.lock);
+  host.callbacks = callbacks;
 }
 
 HostCallbacks GetHostCallbacks() noexcept {
-  const device::LockGuard lock(state.lock);
-  return state.callbacks;
+  const device::LockGuard lock(host.lock);
+  return host.callbacks;
 }
 
 }  // namespace report
