@@ -5,8 +5,11 @@
 
 #include <deque>
 #include <set>
+#include <string>
 #include <utility>
 #include <vector>
+
+#include "mcftp/rules/stored_events.h"
 
 namespace {
 
@@ -15,32 +18,6 @@ using mcftp::At;
 using mcftp::Event;
 using mcftp::State;
 using ::testing::UnorderedElementsAre;
-
-/// What an action may store, by its own rules.
-std::vector<Event> EventsOf(Action action) {
-  switch (action) {
-    case Action::Nop: return {};
-    case Action::ResetSession: return {Event::EventReady};
-    case Action::AwaitAnnouncement:
-      return {Event::EventAbort, Event::EventAnnouncement, Event::EventFileError,
-              Event::EventShutdown};
-    case Action::SendRequest:
-      return {Event::EventAbort, Event::EventRequestSent, Event::EventNoServer,
-              Event::EventShutdown};
-    case Action::AwaitOack:
-      return {Event::EventAbort,      Event::EventAnnouncement, Event::EventJoined,
-              Event::EventErrorFrame, Event::EventData,         Event::EventJoinFailed,
-              Event::EventTimeout};
-    case Action::ReceiveBlocks:
-      return {Event::EventAbort, Event::EventAnnouncement, Event::EventErrorFrame,
-              Event::EventData,  Event::EventLastBlock,    Event::EventTimeout};
-    case Action::CompleteAndDally:
-      return {Event::EventAbort, Event::EventAnnouncement, Event::EventErrorFrame,
-              Event::EventTimeout, Event::EventShutdown};
-    case Action::Shutdown: return {Event::EventShutdown};
-  }
-  return {};
-}
 
 using Place = std::pair<int, int>;  // state, event
 
@@ -52,7 +29,7 @@ std::set<Place> ReachedPlaces() {
     const Event event{static_cast<std::uint32_t>(next.front().second)};
     next.pop_front();
     if (state == State::StateShutdown) continue;
-    for (const Event stored : EventsOf(At(state, event).action)) {
+    for (const Event stored : test::StoredEvents(At(state, event).action)) {
       const Place place(static_cast<int>(At(state, stored).next), static_cast<int>(stored));
       if (reached.insert(place).second) next.push_back(place);
     }
