@@ -4,7 +4,7 @@ usage: check_ce_binary.py [BUILD]      (BUILD: build/ce)
 
 The compiler's flags say most of this already; here is looked at what came out of them, with tools
 that had no part in making it. BUILD has orvenix.elf, orvenix_check.elf (the same objects linked at
-another base), orvenix.dll and the converter.
+another base), orvenix.dll, orvenix.lib and the converter.
 
 Code. The device's processors know the instructions of version 4T, and no more. Its callers may be
 Thumb code, so whatever returns does so by BX. And its callers keep the stack at multiples of 4 only,
@@ -181,6 +181,13 @@ def check_exports(readobj, listed):
     return complaints
 
 
+def check_import_library(readobj, listed):
+    """@param readobj  what it says of the members of the import library"""
+    found = re.findall(r"^Type: code\nName type: name\nSymbol: __imp_(\S+)\nSymbol: (\S+)$", readobj, re.M)
+    offered = {slot for slot, function in found if slot == function}
+    return [f"orvenix.lib and exports.txt differ in {name}" for name in sorted(offered ^ listed)]
+
+
 def check_relocations(readobj, readelf):
     """The DLL has as many as the linker listed, all of them of one kind."""
     kinds = re.findall(r"^    Type: (\w+)$", readobj[readobj.index("BaseReloc ["):], re.M)
@@ -192,6 +199,39 @@ def check_relocations(readobj, readelf):
     if kinds.count("HIGHLOW") != words or words == 0:
         complaints.append(f"has {kinds.count('HIGHLOW')} relocations, where the linker listed {words}")
     return complaints
+
+
+def check_same_code(linked, converted, slots, tables):
+    """The DLL's code is what was disassembled, but for words that now address import tables.
+
+    linked, converted: the bytes of both; slots, tables: ranges of addresses, {start: end}
+    """
+    if len(linked) != len(converted):
+        return ["its code has another length than the linker's"]
+
+    def within(address, ranges):
+        return any(start <= address < end for start, end in ranges.items())
+
+    complaints = []
+    for at in range(0, len(linked), 4):
+        before = int.from_bytes(linked[at:at + 4], "little")
+        after = int.from_bytes(converted[at:at + 4], "little")
+        if before != after and not (within(before, slots) and within(after, tables)):
+            complaints.append(f"its code has {after:08x} at {at:#x}, where the linker had {before:08x}")
+    return complaints
+
+
+def code_of(elf, dll, readobj, readelf):
+    """The arguments of check_same_code."""
+    sections = {name: (int(address, 16), int(offset, 16), int(size, 16)) for name, address, offset, size in
+                re.findall(r"^ *\[ *\d+\] (\S+) +\S+ +([0-9a-f]+) ([0-9a-f]+) ([0-9a-f]+)", readelf, re.M)}
+    _, offset, size = sections[".text"]
+    raw = int(re.search(r"Name: \.text .*?PointerToRawData: 0x([0-9A-F]+)", readobj, re.S).group(1), 16)
+    table = [int(value, 16) for value in re.search(r"IATRVA: 0x([0-9A-F]+)\s+IATSize: 0x([0-9A-F]+)", readobj).groups()]
+    base = int(re.search(r"ImageBase: 0x([0-9A-F]+)", readobj).group(1), 16)
+    slots = {start: start + length for name, (start, _, length) in sections.items() if name.startswith(".idata$")}
+    return (elf.read_bytes()[offset:offset + size], dll.read_bytes()[raw:raw + size], slots,
+            {base + table[0]: base + sum(table)})
 
 
 # ---- variadic calls ----
@@ -321,17 +361,20 @@ def main():
         sys.exit(__doc__.strip())
     build = pathlib.Path(sys.argv[1] if len(sys.argv) == 2 else ROOT / "build/ce").resolve()
     dll, elf = build / "orvenix.dll", build / "orvenix.elf"
-    for needed in (dll, elf, build / "orvenix_check.elf", build / "elf2pe", build / "compile_commands.json"):
+    library = build / "orvenix.lib"
+    for needed in (dll, elf, library, build / "orvenix_check.elf", build / "elf2pe", build / "compile_commands.json"):
         if not needed.exists():
             sys.exit(f"{needed}: is not there; build the library for the device first")
     readobj = shutil.which("llvm-readobj-14") or "llvm-readobj"
-    seen = output(readobj, "--file-headers", "--coff-imports", "--coff-exports", "--coff-basereloc", dll)
+    seen = output(readobj, "--file-headers", "--sections", "--coff-imports", "--coff-exports", "--coff-basereloc", dll)
     platform = ROOT / "platform/ce"
     complaints = check_code(output("arm-none-eabi-objdump", "-d", "--no-show-raw-insn", elf),
                             names(platform / "reviewed_code.txt"))
+    complaints += check_same_code(*code_of(elf, dll, seen, output("arm-none-eabi-readelf", "-SW", elf)))
     complaints += check_header(seen)
     complaints += check_imports(seen, listed_imports((platform / "imports.txt").read_text()))
     complaints += check_exports(seen, names(platform / "exports.txt"))
+    complaints += check_import_library(output(readobj, library), names(platform / "exports.txt"))
     complaints += check_relocations(seen, output("arm-none-eabi-readelf", "-rW", elf))
     complaints += check_sources(json.loads((build / "compile_commands.json").read_text()))
     complaints += check_reproducible(build)

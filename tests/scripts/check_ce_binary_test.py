@@ -83,6 +83,27 @@ class CodeTest(unittest.TestCase):
             self.assertIn(expected, complaint)
 
 
+def words(*values):
+    return b"".join(value.to_bytes(4, "little") for value in values)
+
+
+class SameCodeTest(unittest.TestCase):
+    SLOTS, TABLES = {0x10006000: 0x10006008}, {0x10007050: 0x10007060}
+
+    def complaints(self, linked, converted):
+        return lint.check_same_code(words(*linked), words(*converted), self.SLOTS, self.TABLES)
+
+    def test_takes_words_that_now_address_an_import_table(self):
+        self.assertEqual(self.complaints([1, 0x10006004, 3], [1, 0x10007054, 3]), [])
+
+    def test_refuses_every_other_difference(self):
+        self.assertEqual(self.complaints([1, 2], [1, 3]),
+                         ["its code has 00000003 at 0x4, where the linker had 00000002"])
+        self.assertEqual(len(self.complaints([1, 0x10006004], [1, 0x10007060])), 1)
+        self.assertEqual(len(self.complaints([1, 0x10006008], [1, 0x10007054])), 1)
+        self.assertEqual(self.complaints([1, 2], [1]), ["its code has another length than the linker's"])
+
+
 HEADER = """  Machine: IMAGE_FILE_MACHINE_ARM (0x1C0)
   TimeDateStamp: 1970-01-01 00:00:00 (0x0)
   OptionalHeaderSize: 224
@@ -177,6 +198,15 @@ class HeaderTest(unittest.TestCase):
         turned = EXPORTS.replace("Alpha", "@").replace("beta", "Alpha").replace("@", "beta")
         self.assertEqual(lint.check_exports(turned, {"Alpha", "beta"}),
                          ["the exports are not sorted, or one is there twice"])
+
+    def test_refuses_an_import_library_of_other_functions(self):
+        library = "File: a.dll\nType: code\nName type: name\nSymbol: __imp_Alpha\nSymbol: Alpha\n"
+        self.assertEqual(lint.check_import_library(library, {"Alpha"}), [])
+        self.assertEqual(lint.check_import_library(library, {"Alpha", "beta"}),
+                         ["orvenix.lib and exports.txt differ in beta"])
+        self.assertEqual(lint.check_import_library(library, set()),
+                         ["orvenix.lib and exports.txt differ in Alpha"])
+        self.assertTrue(lint.check_import_library(library.replace("Type: code", "Type: data"), {"Alpha"}))
 
     def test_refuses_relocations_but_those_that_the_linker_listed(self):
         self.assertEqual(lint.check_relocations(RELOCATIONS, READELF), [])
