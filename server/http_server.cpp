@@ -58,6 +58,7 @@ class HttpServer::Listener::Connection : public std::enable_shared_from_this<Con
  public:
   Connection(std::shared_ptr<Listener> owner, tcp::socket socket, std::string address)
       : owner_(std::move(owner)),
+        number_(owner_->figures_.accepted),
         socket_(std::move(socket)),
         timer_(socket_.get_executor()),
         session_(owner_->site_, owner_->ledger_, owner_->options_.session, std::move(address),
@@ -120,7 +121,9 @@ class HttpServer::Listener::Connection : public std::enable_shared_from_this<Con
     if (error) {
       session_.OnPeerClosed(Now());
     } else {
-      session_.OnBytes({input_.data(), got}, Now());
+      const std::string_view bytes(input_.data(), got);
+      if (owner_->options_.tap) owner_->options_.tap(number_, bytes);
+      session_.OnBytes(bytes, Now());
     }
   }
 
@@ -141,6 +144,7 @@ class HttpServer::Listener::Connection : public std::enable_shared_from_this<Con
   }
 
   const std::shared_ptr<Listener> owner_;
+  const std::uint64_t number_;
   tcp::socket socket_;
   asio::steady_timer timer_;
   HttpSession session_;

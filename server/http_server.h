@@ -2,8 +2,10 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
 #include <string>
+#include <string_view>
 
 #include "server/http_session.h"
 #include "server/ledger.h"
@@ -21,6 +23,8 @@ struct HttpServerOptions {
   /// Connections above this number are closed as they come; devices try again by themselves.
   std::size_t max_connections = 4096;
   SessionOptions session;
+  /// Sees every byte that clients send, as it comes; may be empty. Connections are counted from 1.
+  std::function<void(std::uint64_t connection, std::string_view bytes)> tap;
 };
 
 struct HttpServerFigures {

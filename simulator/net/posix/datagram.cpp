@@ -34,8 +34,9 @@ PosixDatagram::~PosixDatagram() {
 int PosixDatagram::Bind(const Endpoint& local) {
   SocketFile& file = own_box_.file();
   const in_addr out{SwapOrder(device_.own)};
-  int error = file.Set(IPPROTO_IP, IP_MULTICAST_IF, &out, sizeof out);
-  if (error == 0) error = file.Set(SOL_SOCKET, SO_TIMESTAMPNS, 1);
+  // Without it what goes to a group leaves by the interface of the address that it is bound to.
+  int error = file.SetIfKnown(IPPROTO_IP, IP_MULTICAST_IF, &out, sizeof out);
+  if (error == 0) error = file.SetIfKnown(SOL_SOCKET, SO_TIMESTAMPNS, 1);
   if (error == 0) error = file.Bind({device_.own, local.port});
   if (error != 0) return error;
   bound_ = true;
@@ -187,8 +188,8 @@ int PosixDatagram::OpenGroup(Address group, Inbox& inbox) {
   SocketFile opened;
   int error = SocketFile::Make(SOCK_DGRAM, opened);
   if (error == 0) error = opened.Set(SOL_SOCKET, SO_REUSEADDR, 1);
-  if (error == 0) error = opened.Set(IPPROTO_IP, kMulticastAll, 0);
-  if (error == 0) error = opened.Set(SOL_SOCKET, SO_TIMESTAMPNS, 1);
+  if (error == 0) error = opened.SetIfKnown(IPPROTO_IP, kMulticastAll, 0);
+  if (error == 0) error = opened.SetIfKnown(SOL_SOCKET, SO_TIMESTAMPNS, 1);
   if (error == 0) {
     error = opened.Set(SOL_SOCKET, SO_RCVBUF, receive_buffer_ > 0 ? receive_buffer_ : kGroupBuffer);
   }

@@ -24,6 +24,11 @@ int SocketFile::Set(int level, int option, const void* value, socklen_t size) {
   return setsockopt(file_, level, option, value, size) == 0 ? 0 : ToWinsockError(errno);
 }
 
+int SocketFile::SetIfKnown(int level, int option, const void* value, socklen_t size) {
+  const bool set = setsockopt(file_, level, option, value, size) == 0 || errno == ENOPROTOOPT;
+  return set ? 0 : ToWinsockError(errno);
+}
+
 int SocketFile::Pending(std::uint32_t& bytes) {
   int count = 0;
   if (ioctl(file_, FIONREAD, &count) != 0) return ToWinsockError(errno);

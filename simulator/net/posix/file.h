@@ -32,6 +32,11 @@ class SocketFile {
   int Bind(const Endpoint& local);
   int Set(int level, int option, const void* value, socklen_t size);
   int Set(int level, int option, int value) { return Set(level, option, &value, sizeof value); }
+  /// As Set, for an option that helps and is not needed: an emulated host may not have it.
+  int SetIfKnown(int level, int option, const void* value, socklen_t size);
+  int SetIfKnown(int level, int option, int value) {
+    return SetIfKnown(level, option, &value, sizeof value);
+  }
   int Pending(std::uint32_t& bytes);
 
   [[nodiscard]] Endpoint Local() const;

@@ -37,7 +37,7 @@ int PosixStream::Bind(const Endpoint& local) {
 
 int PosixStream::Connect(const Endpoint& peer) {
   if (!bound_) {
-    int error = file_.Set(IPPROTO_IP, kBindAddressNoPort, 1);
+    int error = file_.SetIfKnown(IPPROTO_IP, kBindAddressNoPort, 1);
     if (error == 0) error = file_.Bind({own_, 0});
     if (error != 0) return error;
     bound_ = true;
