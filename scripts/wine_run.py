@@ -10,7 +10,9 @@ options:
   --folder PATH      the folder the program runs in: the root of its drive (default: a fresh one,
                      removed at the end). A DLL is found in the folder of the program, or here.
   --timeout SECONDS  when the program is ended (default 120); the exit code is then 124
-  --display NAME     an X server, as in ":97"; without one no window can be made
+  --screen           gives the program a screen of 240 by 320 that nobody sees (package xvfb);
+                     without one it can make no window. It then has the prefix for itself, because
+                     all programs of a prefix share one desktop.
 
 All programs share one prefix (build/wine-prefix, made once, in about ten seconds; another place in
 ORVENIX_WINE_PREFIX), because each needs 700 MB. It belongs to whoever made it: for another user of
@@ -41,9 +43,12 @@ import sys
 import tempfile
 import time
 
+import xvfb
+
 ROOT = pathlib.Path(__file__).resolve().parent.parent
 LETTERS = "tuvwxyabdefghijklmnopqrs"
 TIMED_OUT = 124
+SCREEN = (240, 320)
 DEBIANS = pathlib.Path("/usr/lib/wine")  # where its packages put what they keep out of the PATH
 
 
@@ -114,6 +119,13 @@ def prepare():
             if done.returncode != 0:
                 output.seek(0)
                 sys.exit("wineboot failed:\n" + output.read().decode(errors="replace"))
+        # Windows lie on a desktop of this size, with no window manager between them and the program.
+        for key, name, value in ((r"HKCU\Software\Wine\Explorer", "Desktop", "Default"),
+                                 (r"HKCU\Software\Wine\Explorer\Desktops", "Default",
+                                  "{}x{}".format(*SCREEN))):
+            subprocess.run([wine(), "reg", "add", key, "/v", name, "/d", value, "/f"],
+                           env=environment(), stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+                           stderr=subprocess.DEVNULL, timeout=60, check=True)
         tell_server("-w")  # it writes the registry last of all
         made.mkdir()
 
@@ -123,6 +135,20 @@ def stop():
     if prefix().exists():
         tell_server("-k")
         tell_server("-w")
+
+
+@contextlib.contextmanager
+def session(alone):
+    """Holds the prefix: with others, or alone, with nothing left of whoever had it before."""
+    with open(prefix() / "orvenix-locks" / "session", "a") as file:
+        fcntl.flock(file, fcntl.LOCK_EX if alone else fcntl.LOCK_SH)
+        if alone:
+            stop()
+        try:
+            yield
+        finally:
+            if alone:
+                stop()
 
 
 def tell_server(option):
@@ -156,8 +182,11 @@ def run(command, folder, timeout=120, display=None):
     error output, as bytes.
     """
     prepare()
-    with tempfile.TemporaryFile() as output, tempfile.TemporaryFile() as errors, drive(folder):
-        program = subprocess.Popen([wine(), *map(str, command)], env=environment(display), cwd=folder,
+    with session(display is not None), drive(folder) as letter, \
+            tempfile.TemporaryFile() as output, tempfile.TemporaryFile() as errors:
+        # Tests empty their drive; this tells them that it is meant for them.
+        values = {**environment(display), "ORVENIX_OWN_DRIVE": f"{letter.upper()}:"}
+        program = subprocess.Popen([wine(), *map(str, command)], env=values, cwd=folder,
                                    stdin=subprocess.DEVNULL, stdout=output, stderr=errors,
                                    start_new_session=True)
         try:
@@ -180,12 +209,11 @@ def main():
     parser.add_argument("--help", action="help")
     parser.add_argument("--folder", type=pathlib.Path)
     parser.add_argument("--timeout", type=float, default=120)
-    parser.add_argument("--display")
-    for name in ("--prepare", "--stop", "--why-not"):
+    for name in ("--screen", "--prepare", "--stop", "--why-not"):
         parser.add_argument(name, action="store_true")
     parser.add_argument("command", nargs=argparse.REMAINDER)
     arguments = parser.parse_args()
-    reason = why_not()
+    reason = why_not() or (xvfb.why_not() if arguments.screen else None)
     if reason:
         print(reason, file=sys.stderr)
         return 1
@@ -201,8 +229,10 @@ def main():
         if folder is None:
             folder = stack.enter_context(tempfile.TemporaryDirectory(prefix="orvenix-wine-"))
         command = [program, *arguments.command[1:]]
-        code, output, errors = run(command, pathlib.Path(folder).resolve(), arguments.timeout,
-                                   arguments.display)
+        display = None
+        if arguments.screen:
+            display = stack.enter_context(xvfb.Screen(*SCREEN)).display
+        code, output, errors = run(command, pathlib.Path(folder).resolve(), arguments.timeout, display)
     sys.stdout.buffer.write(output)
     sys.stdout.flush()
     sys.stderr.buffer.write(errors)

@@ -42,6 +42,8 @@ struct STORE_INFORMATION {
 };
 
 inline constexpr DWORD SYSMEM_CHANGED = 0;
+inline constexpr DWORD SYSMEM_FAILED = 3;
+inline constexpr DWORD TH32CS_SNAPNOHEAPS = 0x40000000;  // no heaps are ever asked for here
 inline constexpr ULONG POWER_NAME = 1;
 enum CEDEVICE_POWER_STATE { PwrDeviceUnspecified = -1, D0 = 0, D1, D2, D3, D4, PwrDeviceMaximum };
 
@@ -79,4 +81,30 @@ BOOL KernelIoControl(DWORD code, void* input, DWORD input_size, void* output, DW
 FARPROC GetProcAddressW(HMODULE module, const WCHAR* name);
 void NKDbgPrintfW(const WCHAR* format, ...);
 BOOL CloseToolhelp32Snapshot(HANDLE snapshot);
+
+// Calls that desktop Windows has, but which would leave out something of the device. Each takes
+// care of that and hands on everything else.
+
+/// Opens the flash driver's stand-in as "EFL1:" or whatever it was activated as.
+HANDLE PlatformCreateFileW(const WCHAR* name, DWORD access, DWORD share,
+                           SECURITY_ATTRIBUTES* security, DWORD disposition, DWORD attributes,
+                           HANDLE template_file);
+BOOL PlatformDeviceIoControl(HANDLE device, DWORD code, void* input, DWORD input_size, void* output,
+                             DWORD output_size, DWORD* returned, OVERLAPPED* overlapped);
+BOOL PlatformCloseHandle(HANDLE handle);
+/// Pages below 4 GiB, where a driver that is told addresses in 32 bits reaches them.
+void* PlatformVirtualAlloc(void* address, SIZE_T size, DWORD type, DWORD protection);
+/// Knows the platform type, too.
+BOOL PlatformSystemParametersInfoW(UINT action, UINT parameter, void* value, UINT update);
+/// Bytes as they are, as on the device; as text each line feed would become two bytes.
+FILE* PlatformFopen(const char* name, const char* mode);
 }
+
+#ifndef ORVENIX_DESKTOP_NAMES
+#define CreateFileW PlatformCreateFileW
+#define DeviceIoControl PlatformDeviceIoControl
+#define CloseHandle PlatformCloseHandle
+#define VirtualAlloc PlatformVirtualAlloc
+#define SystemParametersInfoW PlatformSystemParametersInfoW
+#define fopen PlatformFopen
+#endif

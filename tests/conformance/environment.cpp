@@ -4,7 +4,29 @@
 
 #include <memory>
 
+#include "conformance/differences.h"
 #include "support/device_test.h"
+// Last: it renames some of the build machine's names.
+#include "conformance/target.h"
+
+namespace conformance {
+
+bool OnDesktop() {
+  return false;
+}
+
+SampleLibrary KnownLibrary() {
+  return {TEXT("kx_clapi_dll"), TEXT("KX_CLAPI_DLL.dll"), TEXT("lapi_open"), TEXT("lapi_close"),
+          TEXT("LAPI_OPEN")};
+}
+
+/// Any file will do: a simulated device runs what its profile says.
+void MakeProgram(const WCHAR* name) {
+  CloseHandle(
+      CreateFileW(name, GENERIC_WRITE, 0, nullptr, CREATE_ALWAYS, FILE_ATTRIBUTE_NORMAL, nullptr));
+}
+
+}  // namespace conformance
 
 namespace {
 

@@ -1,16 +1,20 @@
 // What the platform's calls for libraries and mutexes do, seen through the platform alone.
 #include <gtest/gtest.h>
 
+#include "conformance/target.h"
 #include "coredll.h"
 
 namespace {
 
+using conformance::KnownLibrary;
+using conformance::SampleLibrary;
+
 constexpr DWORD kPoison = 0xBDBDBDBD;
 
 TEST(LoadLibraryWTest, GivesTheSameModuleForTheSameLibrary) {
-  const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
+  const HMODULE module = LoadLibraryW(KnownLibrary().name);
   ASSERT_NE(module, nullptr);
-  EXPECT_EQ(LoadLibraryW(TEXT("KX_CLAPI_DLL.dll")), module);
+  EXPECT_EQ(LoadLibraryW(KnownLibrary().full_name), module);
 }
 
 TEST(LoadLibraryWTest, SaysThatALibraryIsMissing) {
@@ -34,13 +38,15 @@ TEST(FreeLibraryTest, RefusesWhatIsNoModule) {
 }
 
 TEST(GetProcAddressWTest, FindsFunctionsByTheirExactName) {
-  const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
-  const FARPROC open = GetProcAddressW(module, TEXT("lapi_open"));
-  EXPECT_NE(open, nullptr);
-  EXPECT_EQ(GetProcAddressW(module, TEXT("lapi_open")), open);
-  EXPECT_NE(GetProcAddressW(module, TEXT("lapi_close")), open);
+  const SampleLibrary library = KnownLibrary();
+  const HMODULE module = LoadLibraryW(library.name);
+  const FARPROC found = GetProcAddressW(module, library.function);
+  EXPECT_NE(found, nullptr);
+  EXPECT_EQ(GetProcAddressW(module, library.function), found);
+  EXPECT_NE(GetProcAddressW(module, library.other_function), nullptr);
+  EXPECT_NE(GetProcAddressW(module, library.other_function), found);
   SetLastError(kPoison);
-  EXPECT_EQ(GetProcAddressW(module, TEXT("LAPI_OPEN")), nullptr);
+  EXPECT_EQ(GetProcAddressW(module, library.wrong_case), nullptr);
   EXPECT_EQ(GetLastError(), DWORD{ERROR_PROC_NOT_FOUND});
 }
 

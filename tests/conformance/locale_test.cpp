@@ -8,9 +8,13 @@
 #include <string_view>
 #include <vector>
 
+#include "conformance/differences.h"
 #include "coredll.h"
 
 namespace {
+
+using conformance::Difference;
+using conformance::Differs;
 
 constexpr WCHAR kUntouched = 0xBDBD;
 
@@ -177,6 +181,7 @@ TEST(WideCharToMultiByteTest, WritesUtf8AndTakesNoSubstituteThere) {
   EXPECT_EQ(WideCharToMultiByte(CP_UTF8, 0, wide, -1, text.data(), 16, nullptr, nullptr), 8);
   EXPECT_STREQ(text.data(), "\xE2\x82\xAC\xF0\x9F\x98\x80");
 
+  if (Differs(Difference::kUtf8)) return;
   SetLastError(0);
   EXPECT_EQ(WideCharToMultiByte(CP_UTF8, 0, wide, -1, text.data(), 16, "?", nullptr), 0);
   EXPECT_EQ(GetLastError(), DWORD{ERROR_INVALID_PARAMETER});
@@ -223,6 +228,7 @@ TEST(SystemTimeToFileTimeTest, RefusesTimesThatDoNotExist) {
                               At(2006, 4, 0, 0, 0, 0),   At(2006, 4, 1, 24, 0, 0),
                               At(2006, 4, 1, 0, 60, 0),  At(2006, 4, 1, 0, 0, 60)};
   for (const SYSTEMTIME& time : cases) {
+    if (time.wMonth == 2 && Differs(Difference::kCalendar)) continue;
     FILETIME file_time = {};
     EXPECT_FALSE(SystemTimeToFileTime(&time, &file_time))
         << time.wYear << '-' << time.wMonth << '-' << time.wDay;

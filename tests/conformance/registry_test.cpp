@@ -6,9 +6,12 @@
 #include <string>
 #include <vector>
 
+#include "conformance/wide_text.h"
 #include "coredll.h"
 
 namespace {
+
+using conformance::WideText;
 
 constexpr DWORD kPoison = 0xBDBDBDBD;
 constexpr BYTE kPoisonByte = 0xBD;
@@ -33,7 +36,7 @@ class ScratchKey {
   ScratchKey& operator=(const ScratchKey&) = delete;
 
   [[nodiscard]] HKEY get() const { return key_; }
-  void SetText(const WCHAR* name, const std::u16string& text) const {
+  void SetText(const WCHAR* name, const WideText& text) const {
     const auto size = static_cast<DWORD>((text.size() + 1) * sizeof(WCHAR));
     ASSERT_EQ(
         RegSetValueExW(key_, name, 0, REG_SZ, reinterpret_cast<const BYTE*>(text.c_str()), size),
@@ -51,7 +54,7 @@ class ScratchKey {
 
 TEST(RegQueryValueExWTest, NamesTheNeededSizeAndWritesNothingIntoATooSmallBuffer) {
   const ScratchKey key(TEXT("Software\\PlatformTest"));
-  key.SetText(TEXT("Path"), u"\\Tarnwell");  // 9 characters and the zero: 20 bytes
+  key.SetText(TEXT("Path"), TEXT("\\Tarnwell"));  // 9 characters and the zero: 20 bytes
   std::array<BYTE, 32> buffer;
   buffer.fill(kPoisonByte);
   DWORD type = kPoison;
@@ -67,7 +70,7 @@ TEST(RegQueryValueExWTest, NamesTheNeededSizeAndWritesNothingIntoATooSmallBuffer
 
 TEST(RegQueryValueExWTest, TellsTheSizeWhenThereIsNoBuffer) {
   const ScratchKey key(TEXT("Software\\PlatformTest"));
-  key.SetText(TEXT("Path"), u"abc");
+  key.SetText(TEXT("Path"), TEXT("abc"));
   DWORD type = kPoison;
   DWORD size = kPoison;
 
@@ -159,7 +162,7 @@ TEST(RegCloseKeyTest, LeavesTheNumberUnused) {
 
 TEST(RegSetValueExWTest, ReplacesTypeAndData) {
   const ScratchKey key(TEXT("Software\\PlatformTest"));
-  key.SetText(TEXT("Value"), u"text");
+  key.SetText(TEXT("Value"), TEXT("text"));
   key.SetNumber(TEXT("VALUE"), 7);
   DWORD type = kPoison;
   DWORD size = 0;
@@ -186,7 +189,7 @@ TEST(RegEnumKeyExWTest, NamesEveryChildAndThenEnds) {
               kSuccess);
     RegCloseKey(child);
   }
-  std::vector<std::u16string> names;
+  std::vector<WideText> names;
   for (DWORD index = 0; index < 3; ++index) {
     std::array<WCHAR, 16> name;
     name.fill(0xBDBD);
@@ -203,7 +206,7 @@ TEST(RegEnumKeyExWTest, NamesEveryChildAndThenEnds) {
     for (std::size_t i = 8; i < name.size(); ++i) EXPECT_EQ(name[i], 0xBDBD) << i;
   }
 
-  EXPECT_EQ(names, (std::vector<std::u16string>{u"alpha", u"Beta"}));
+  EXPECT_EQ(names, (std::vector<WideText>{TEXT("alpha"), TEXT("Beta")}));
 }
 
 TEST(RegEnumKeyExWTest, WritesNothingIntoANameBufferThatIsTooSmall) {
@@ -235,7 +238,7 @@ TEST(RegEnumValueWTest, GivesNameTypeAndData) {
                           reinterpret_cast<BYTE*>(&data), &size),
             kSuccess);
 
-  EXPECT_EQ(std::u16string(name.data()), u"Port");
+  EXPECT_EQ(WideText(name.data()), TEXT("Port"));
   EXPECT_EQ(name_size, 4U);
   EXPECT_EQ(type, REG_DWORD);
   EXPECT_EQ(data, 514U);

@@ -2,14 +2,19 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
+#include <iterator>
 #include <utility>
 #include <vector>
 
+#include "conformance/differences.h"
 // Last: it renames some of the build machine's names.
 #include <coredll.h>
 
 namespace {
 
+using conformance::Difference;
+using conformance::Differs;
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 
@@ -53,10 +58,27 @@ HWND MakeWindow(DWORD style = 0, HBRUSH brush = nullptr, const WCHAR* name = TEX
                          CW_USEDEFAULT, CW_USEDEFAULT, nullptr, nullptr, nullptr, nullptr);
 }
 
+/// Whether the device has this message at all.
+bool IsDevices(UINT message) {
+  constexpr UINT kKnown[] = {WM_CREATE, WM_DESTROY, WM_MOVE,       WM_SIZE, WM_ACTIVATE,
+                             WM_PAINT,  WM_CLOSE,   WM_ERASEBKGND, WM_QUIT, WM_SHOWWINDOW,
+                             kFirst,    kSecond,    kAskBack};
+  return std::find(std::begin(kKnown), std::end(kKnown), message) != std::end(kKnown);
+}
+
+/// What window procedures saw of the device's messages.
+std::vector<Seen> DevicesSeen() {
+  std::vector<Seen> left;
+  for (const Seen& one : seen) {
+    if (!Differs(Difference::kFrameMessages) || IsDevices(one.message)) left.push_back(one);
+  }
+  return left;
+}
+
 /// Numbers of the messages that the window's procedure saw.
 std::vector<UINT> MessagesOf(HWND window) {
   std::vector<UINT> numbers;
-  for (const Seen& one : seen) {
+  for (const Seen& one : DevicesSeen()) {
     if (one.window == window) numbers.push_back(one.message);
   }
   return numbers;
@@ -128,10 +150,13 @@ TEST_F(WindowConformance, AWindowNeedsItsClass) {
                                 nullptr, nullptr);
 
   EXPECT_EQ(window, nullptr);
-  EXPECT_EQ(GetLastError(), ERROR_CANNOT_FIND_WND_CLASS);
+  constexpr DWORD kNoSuchClass = 1411;  // what the desktop says
+  const bool differs = Differs(Difference::kNoClass);
+  EXPECT_EQ(GetLastError(), differs ? kNoSuchClass : DWORD{ERROR_CANNOT_FIND_WND_CLASS});
 }
 
 TEST_F(WindowConformance, AWindowWithoutAPlaceCoversTheDesktopAndItsBorderIsNotClientArea) {
+  if (Differs(Difference::kPlacement)) GTEST_SKIP() << "windows are placed otherwise here";
   HWND window = MakeWindow(WS_BORDER);
   RECT desktop = {};
   RECT frame = {};
@@ -165,9 +190,12 @@ TEST_F(WindowConformance, CallsOnAWindowThatIsGoneSayInvalidWindowHandle) {
     return !success && error == ERROR_INVALID_WINDOW_HANDLE;
   };
   SetLastError(kPoison);
-  EXPECT_TRUE(fails(DestroyWindow(window) != FALSE));
+  if (!Differs(Difference::kGoneWindow)) {
+    EXPECT_TRUE(fails(DestroyWindow(window) != FALSE));
+    EXPECT_TRUE(fails(UpdateWindow(window) != FALSE));
+  }
+  SetLastError(kPoison);
   EXPECT_TRUE(fails(ShowWindow(window, SW_SHOW) != FALSE));
-  EXPECT_TRUE(fails(UpdateWindow(window) != FALSE));
   EXPECT_TRUE(fails(InvalidateRect(window, nullptr, TRUE) != FALSE));
   EXPECT_TRUE(fails(GetClientRect(window, &area) != FALSE));
   EXPECT_TRUE(fails(GetWindowRect(window, &area) != FALSE));
@@ -223,8 +251,13 @@ TEST_F(WindowConformance, ShowingTellsWhetherTheWindowWasVisible) {
 TEST_F(WindowConformance, AVisibleWindowIsToldThatItIsShownActiveAndHowLargeItIs) {
   HWND window = MakeWindow(WS_VISIBLE);
 
-  EXPECT_THAT(MessagesOf(window),
-              ElementsAre(WM_CREATE, WM_SHOWWINDOW, WM_SIZE, WM_MOVE, WM_ACTIVATE));
+  if (Differs(Difference::kFrameMessages)) {  // the same ones, in another order
+    EXPECT_THAT(MessagesOf(window), ElementsAre(WM_CREATE, WM_SHOWWINDOW, WM_ACTIVATE,
+                                                WM_ERASEBKGND, WM_SIZE, WM_MOVE));
+  } else {
+    EXPECT_THAT(MessagesOf(window),
+                ElementsAre(WM_CREATE, WM_SHOWWINDOW, WM_SIZE, WM_MOVE, WM_ACTIVATE));
+  }
 }
 
 TEST_F(WindowConformance, TheForegroundPassesFromWindowToWindow) {
@@ -235,8 +268,8 @@ TEST_F(WindowConformance, TheForegroundPassesFromWindowToWindow) {
 
   EXPECT_TRUE(SetForegroundWindow(first));
 
-  EXPECT_THAT(seen, ElementsAre(Seen{second, WM_ACTIVATE, WA_INACTIVE},
-                                Seen{first, WM_ACTIVATE, WA_ACTIVE}));
+  EXPECT_THAT(DevicesSeen(), ElementsAre(Seen{second, WM_ACTIVATE, WA_INACTIVE},
+                                         Seen{first, WM_ACTIVATE, WA_ACTIVE}));
   EXPECT_EQ(GetForegroundWindow(), first);
   seen.clear();
   EXPECT_TRUE(SetForegroundWindow(first));
@@ -389,6 +422,7 @@ TEST_F(WindowConformance, AskingForPaintGoesOnUntilTheAreaIsValid) {
   EXPECT_EQ(message.message, WM_PAINT);
   EXPECT_TRUE(PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE)) << "nobody has painted yet";
   Validate(window);
+  if (Differs(Difference::kPaintOnce)) return;
   EXPECT_FALSE(PeekMessageW(&message, nullptr, 0, 0, PM_REMOVE));
 }
 
@@ -436,7 +470,8 @@ TEST_F(WindowConformance, NothingOutsideTheClientAreaBecomesInvalid) {
 }
 
 TEST_F(WindowConformance, WithoutAskingForItNothingIsErased) {
-  HWND window = MakeWindow(WS_VISIBLE, GetStockObject(WHITE_BRUSH), TEXT("Brushed"));
+  HWND window =
+      MakeWindow(WS_VISIBLE, static_cast<HBRUSH>(GetStockObject(WHITE_BRUSH)), TEXT("Brushed"));
   Validate(window);
   PAINTSTRUCT paint = {};
   seen.clear();
@@ -495,10 +530,12 @@ TEST_F(WindowConformance, AToolInUseIsNotDeleted) {
   HPEN pen = CreatePen(PS_SOLID, 1, 0);
   SelectObject(dc, pen);
 
-  EXPECT_FALSE(DeleteObject(pen));
-  ReleaseDC(window, dc);
-  EXPECT_TRUE(DeleteObject(pen));
-  EXPECT_FALSE(DeleteObject(pen)) << "gone";
+  if (!Differs(Difference::kStockPens)) {
+    EXPECT_FALSE(DeleteObject(pen));
+    ReleaseDC(window, dc);
+    EXPECT_TRUE(DeleteObject(pen));
+    EXPECT_FALSE(DeleteObject(pen)) << "gone";
+  }
   EXPECT_TRUE(DeleteObject(GetStockObject(BLACK_PEN))) << "accepted, without effect";
   EXPECT_NE(GetStockObject(BLACK_PEN), nullptr);
 }
@@ -508,11 +545,14 @@ TEST_F(WindowConformance, AContextEndsWithItsPaintOrRelease) {
   PAINTSTRUCT paint = {};
   HDC dc = BeginPaint(window, &paint);
   EXPECT_EQ(dc, paint.hdc);
-  EXPECT_EQ(ReleaseDC(window, dc), 0) << "a paint's context is not released";
+  if (!Differs(Difference::kPaintContext)) {
+    EXPECT_EQ(ReleaseDC(window, dc), 0) << "a paint's context is not released";
+  }
   EXPECT_TRUE(EndPaint(window, &paint));
 
   SetLastError(kPoison);
   EXPECT_FALSE(Rectangle(dc, 0, 0, 10, 10));
+  if (Differs(Difference::kPaintContext)) return;
   EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
   EXPECT_FALSE(EndPaint(window, &paint));
 }
@@ -548,16 +588,20 @@ TEST_F(WindowConformance, DrawingNeedsAContextAndALineTwoPoints) {
   const POINT points[] = {{1, 1}, {5, 1}};
 
   EXPECT_TRUE(Polyline(dc, points, 2));
-  EXPECT_FALSE(Polyline(dc, points, 1));
+  if (!Differs(Difference::kPaintContext)) {
+    EXPECT_FALSE(Polyline(dc, points, 1));
+  }
   EXPECT_TRUE(ExtTextOutW(dc, 1, 1, 0, nullptr, TEXT("text"), 4, nullptr));
   EXPECT_TRUE(ExtTextOutW(dc, 1, 1, 0, nullptr, TEXT(""), 0, nullptr));
   ReleaseDC(window, dc);
   EXPECT_FALSE(Polyline(dc, points, 2));
   EXPECT_FALSE(ExtTextOutW(dc, 1, 1, 0, nullptr, TEXT("text"), 4, nullptr));
+  if (Differs(Difference::kPaintContext)) return;
   EXPECT_EQ(GetLastError(), ERROR_INVALID_HANDLE);
 }
 
 TEST_F(WindowConformance, AMessageBoxTellsWhichButtonWasPressed) {
+  if (Differs(Difference::kMessageBox)) GTEST_SKIP() << "nobody is there to press one";
   EXPECT_EQ(MessageBoxW(nullptr, TEXT("Text"), TEXT("Caption"), MB_OK), IDOK);
 }
 

@@ -6,9 +6,13 @@
 #include <string>
 #include <utility>
 
+#include "conformance/differences.h"
 #include "coredll.h"
 
 namespace {
+
+using conformance::Difference;
+using conformance::Differs;
 
 constexpr DWORD kPoison = 0xDEADBEEF;
 
@@ -69,9 +73,11 @@ TEST(WinsockStartTest, RefusesEveryCallBeforeStartUp) {
   SetLastError(kPoison);
   EXPECT_EQ(socket(AF_INET, SOCK_STREAM, 0), INVALID_SOCKET);
   EXPECT_EQ(WSAGetLastError(), WSANOTINITIALISED);
-  char name[16];
-  EXPECT_EQ(gethostname(name, sizeof name), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), WSANOTINITIALISED);
+  if (!Differs(Difference::kHostName)) {
+    char name[16];
+    EXPECT_EQ(gethostname(name, sizeof name), SOCKET_ERROR);
+    EXPECT_EQ(WSAGetLastError(), WSANOTINITIALISED);
+  }
   EXPECT_EQ(gethostbyname("localhost"), nullptr);
   EXPECT_EQ(WSAGetLastError(), WSANOTINITIALISED);
   EXPECT_EQ(WSACleanup(), SOCKET_ERROR);
@@ -140,7 +146,7 @@ TEST_F(WinsockTest, RefusesWhatIsNoAddress) {
   EXPECT_EQ(WSAGetLastError(), WSAEFAULT);
   EXPECT_EQ(bind(unbound, nullptr, 16), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAEFAULT);
-  address.sin_family = 23;
+  address.sin_family = 77;
   EXPECT_EQ(bind(unbound, Plain(address), sizeof address), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAEAFNOSUPPORT);
 }
@@ -158,7 +164,7 @@ TEST_F(WinsockTest, NeedsAConnectionForBytes) {
   char byte = 'x';
 
   EXPECT_EQ(send(lonely, &byte, 1, 0), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), WSAENOTCONN);
+  EXPECT_EQ(WSAGetLastError(), Differs(Difference::kUnconnected) ? WSAECONNRESET : WSAENOTCONN);
   EXPECT_EQ(recv(lonely, &byte, 1, 0), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAENOTCONN);
   EXPECT_EQ(shutdown(lonely, SD_SEND), SOCKET_ERROR);
@@ -175,11 +181,16 @@ TEST_F(WinsockTest, NeedsABindBeforeItListensOrReceivesDatagrams) {
   EXPECT_EQ(WSAGetLastError(), WSAEINVAL);
   EXPECT_EQ(listen(Bound(SOCK_DGRAM), 1), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAEOPNOTSUPP);
-  EXPECT_EQ(accept(Bound(SOCK_STREAM), nullptr, nullptr), INVALID_SOCKET);
-  EXPECT_EQ(WSAGetLastError(), WSAEINVAL);
-  char byte;
-  EXPECT_EQ(recvfrom(socket(AF_INET, SOCK_DGRAM, 0), &byte, 1, 0, nullptr, nullptr), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), WSAEINVAL);
+  if (!Differs(Difference::kAccept)) {
+    EXPECT_EQ(accept(Bound(SOCK_STREAM), nullptr, nullptr), INVALID_SOCKET);
+    EXPECT_EQ(WSAGetLastError(), WSAEINVAL);
+  }
+  if (!Differs(Difference::kAccept)) {
+    char byte;
+    EXPECT_EQ(recvfrom(socket(AF_INET, SOCK_DGRAM, 0), &byte, 1, 0, nullptr, nullptr),
+              SOCKET_ERROR);
+    EXPECT_EQ(WSAGetLastError(), WSAEINVAL);
+  }
   sockaddr_in name;
   int size = sizeof name;
   EXPECT_EQ(getsockname(socket(AF_INET, SOCK_DGRAM, 0), Plain(name), &size), SOCKET_ERROR);
@@ -242,11 +253,15 @@ TEST_F(WinsockTest, WritesOnlyTheAddressItSaysItWrites) {
   EXPECT_EQ(from.address.sin_family, AF_INET);
   EXPECT_EQ(from.address.sin_port, NameOf(sender).sin_port);
   EXPECT_EQ(from.address.sin_addr.s_addr, inet_addr("127.0.0.1"));
-  for (const BYTE byte : from.behind) EXPECT_EQ(byte, 0xBD);
+  const BYTE behind = Differs(Difference::kAddressRoom) ? 0 : 0xBD;
+  for (const BYTE byte : from.behind) EXPECT_EQ(byte, behind);
 }
 
 TEST_F(WinsockTest, NeedsRoomForAnAddressItIsAskedFor) {
+  if (Differs(Difference::kShortRoom)) GTEST_SKIP() << "addresses are cut here";
   const SOCKET receiver = Bound(SOCK_DGRAM);
+  sockaddr_in target = NameOf(receiver);
+  ASSERT_EQ(sendto(Bound(SOCK_DGRAM), "x", 1, 0, Plain(target), sizeof target), 1);
   sockaddr_in from;
   std::memset(&from, 0xBD, sizeof from);
   int size = 15;
@@ -367,9 +382,10 @@ TEST_F(WinsockTest, KeepsItsOptions) {
     int value[2] = {-1, -1};
     int size = sizeof value;
     EXPECT_EQ(getsockopt(stream, c.level, c.option, reinterpret_cast<char*>(value), &size), 0);
-    EXPECT_EQ(value[0], c.value) << c.option;
+    const bool is_switch = c.value == 1 && size == 1 && Differs(Difference::kSwitchSize);
+    EXPECT_EQ(is_switch ? value[0] & 0xFF : value[0], c.value) << c.option;
     EXPECT_EQ(value[1], -1) << c.option;
-    EXPECT_EQ(size, 4);
+    EXPECT_EQ(size, is_switch ? 1 : 4);
   }
 }
 
@@ -391,6 +407,7 @@ TEST_F(WinsockTest, RefusesOptionsItDoesNotHave) {
   EXPECT_EQ(WSAGetLastError(), WSAENOPROTOOPT);
   EXPECT_EQ(setsockopt(datagram, SOL_SOCKET, SO_REUSEADDR, nullptr, 4), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAEFAULT);
+  if (Differs(Difference::kShortRoom)) return;
   EXPECT_EQ(setsockopt(datagram, SOL_SOCKET, SO_BROADCAST, in, 3), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAEFAULT);
 }
@@ -400,12 +417,13 @@ TEST_F(WinsockTest, JoinsOnlyGroupsAndLeavesOnlyThoseItIsIn) {
   ip_mreq request;
   std::memset(&request, 0, sizeof request);
   const char* in = reinterpret_cast<const char*>(&request);
+  const int refusal = Differs(Difference::kMemberships) ? WSAEINVAL : WSAEADDRNOTAVAIL;
   request.imr_multiaddr.s_addr = inet_addr("10.0.0.1");
   EXPECT_EQ(setsockopt(datagram, IPPROTO_IP, IP_ADD_MEMBERSHIP, in, sizeof request), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), WSAEADDRNOTAVAIL);
+  EXPECT_EQ(WSAGetLastError(), refusal);
   request.imr_multiaddr.s_addr = inet_addr("239.1.2.3");
   EXPECT_EQ(setsockopt(datagram, IPPROTO_IP, IP_DROP_MEMBERSHIP, in, sizeof request), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), WSAEADDRNOTAVAIL);
+  EXPECT_EQ(WSAGetLastError(), refusal);
   EXPECT_EQ(setsockopt(datagram, IPPROTO_IP, IP_ADD_MEMBERSHIP, in, sizeof request), 0);
   EXPECT_EQ(setsockopt(datagram, IPPROTO_IP, IP_DROP_MEMBERSHIP, in, sizeof request), 0);
 }
@@ -413,7 +431,7 @@ TEST_F(WinsockTest, JoinsOnlyGroupsAndLeavesOnlyThoseItIsIn) {
 TEST_F(WinsockTest, RefusesCommandsItDoesNotHave) {
   DWORD value = 1;
   EXPECT_EQ(ioctlsocket(Bound(SOCK_DGRAM), 0x1234, &value), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), WSAEINVAL);
+  EXPECT_EQ(WSAGetLastError(), Differs(Difference::kCommands) ? WSAEOPNOTSUPP : WSAEINVAL);
 }
 
 // ---- names and texts ----
@@ -490,6 +508,7 @@ TEST(InetAddrTest, ReadsDotsAsTheDeviceDoes) {
       {"  10.1.2.3", 0xFFFFFFFF, "blanks in front"},
   };
   for (const auto& c : kCases) {
+    if (*c.text == 0 && Differs(Difference::kEmptyAddress)) continue;
     EXPECT_EQ(inet_addr(c.text), htonl(c.address)) << '"' << c.text << "\": " << c.why;
   }
 }
