@@ -164,7 +164,9 @@ TEST_F(WinsockTest, NeedsAConnectionForBytes) {
   char byte = 'x';
 
   EXPECT_EQ(send(lonely, &byte, 1, 0), SOCKET_ERROR);
-  EXPECT_EQ(WSAGetLastError(), Differs(Difference::kUnconnected) ? WSAECONNRESET : WSAENOTCONN);
+  if (!Differs(Difference::kUnconnected)) {
+    EXPECT_EQ(WSAGetLastError(), WSAENOTCONN);
+  }
   EXPECT_EQ(recv(lonely, &byte, 1, 0), SOCKET_ERROR);
   EXPECT_EQ(WSAGetLastError(), WSAENOTCONN);
   EXPECT_EQ(shutdown(lonely, SD_SEND), SOCKET_ERROR);
