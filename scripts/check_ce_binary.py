@@ -341,10 +341,14 @@ def check_sources(commands):
 
 def check_reproducible(build):
     """The converter, run again, writes the same bytes; the second link made the same code before."""
+    version = re.search(r"project\(Orvenix VERSION (\S+)", (ROOT / "CMakeLists.txt").read_text())[1]
+    rules = (ROOT / "platform/ce/CMakeLists.txt").read_text()
+    description = re.search(r'--description "(.*)"', rules)[1]
     with tempfile.TemporaryDirectory() as folder:
         again = pathlib.Path(folder, "orvenix.dll")
         said = output(build / "elf2pe", build / "orvenix.elf", again, "--name", "orvenix.dll", "--exports",
-                      ROOT / "platform/ce/exports.txt", "--check", build / "orvenix_check.elf")
+                      ROOT / "platform/ce/exports.txt", "--check", build / "orvenix_check.elf",
+                      "--version", version, "--description", description)
         if "confirmed by second link" not in said:
             return ["the relocations are not confirmed by a second link"]
         if again.read_bytes() != (build / "orvenix.dll").read_bytes():

@@ -8,6 +8,7 @@
 
 #include "tools/elf2pe/pe_tables.h"
 #include "tools/elf2pe/pe_writer.h"
+#include "tools/elf2pe/version_resource.h"
 
 namespace elf2pe {
 namespace {
@@ -31,6 +32,7 @@ class Converter {
     }
     AddExports();
     AddImports();
+    AddVersion();
     AddRelocations();
     return WritePe(content_);
   }
@@ -101,6 +103,13 @@ class Converter {
         SetWord(part.bytes, rva - part.rva, image_.base + slots.at(word.slot));
       }
     }
+  }
+
+  void AddVersion() {
+    if (options_.version.empty()) return;
+    const std::uint32_t rva = NextRva();
+    AddPart(".rsrc", VersionSection(rva, {options_.version, options_.description, options_.name}));
+    content_.directories[pe::kResourceDirectory] = {rva, content_.parts.back().virtual_size};
   }
 
   void AddRelocations() {

@@ -15,6 +15,8 @@ struct DllOptions {
   std::string name;                  ///< that the DLL gives itself, such as "orvenix.dll"
   std::vector<std::string> exports;  ///< names, in any order
   std::uint16_t machine = pe::kMachineArm;
+  std::string version;      ///< such as "3.44", for a version resource; empty: there is none
+  std::string description;  ///< of the file, in that resource
 };
 
 /// Throws Refusal for a machine, a name or a number of exports that no DLL can have.

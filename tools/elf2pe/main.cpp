@@ -22,13 +22,14 @@ using elf2pe::Refusal;
 
 constexpr const char* kUsage =
     "usage: elf2pe INPUT.elf OUTPUT.dll --name NAME.dll --exports FILE [--check OTHER.elf]\n"
-    "              [--machine 0x1c0|0x1c2]\n"
+    "              [--machine 0x1c0|0x1c2] [--version 1.2.3.4 [--description TEXT]]\n"
     "       elf2pe --import-library OUTPUT.lib --name NAME.dll --exports FILE\n"
     "              [--machine 0x1c0|0x1c2]\n"
     "\n"
     "INPUT.elf   an image for ARM linked with --emit-relocs\n"
     "--exports   names that the DLL exports, one a line\n"
-    "--check     the same objects linked at another base: confirms the relocations\n";
+    "--check     the same objects linked at another base: confirms the relocations\n"
+    "--version   the DLL gets a version resource\n";
 
 struct UsageError {};
 
@@ -53,7 +54,8 @@ CommandLine ReadCommandLine(int argc, char** argv) {
       continue;
     }
     const bool known = word == "--name" || word == "--exports" || word == "--check" ||
-                       word == "--machine" || word == "--import-library";
+                       word == "--machine" || word == "--import-library" || word == "--version" ||
+                       word == "--description";
     if (!known || i + 1 == argc || !line.options.emplace(word, argv[i + 1]).second) {
       throw UsageError();
     }
@@ -89,6 +91,8 @@ elf2pe::DllOptions OptionsOf(const CommandLine& line) {
   elf2pe::DllOptions options;
   options.name = line.Need("--name");
   options.exports = elf2pe::ReadExportList(ReadFile(line.Need("--exports")));
+  if (line.options.count("--version") != 0) options.version = line.Need("--version");
+  if (line.options.count("--description") != 0) options.description = line.Need("--description");
   const auto machine = line.options.find("--machine");
   if (machine == line.options.end()) return options;
   if (machine->second != "0x1c0" && machine->second != "0x1c2") throw UsageError();
