@@ -24,10 +24,10 @@ TEST(LoadLibraryWTest, SaysThatALibraryIsMissing) {
 }
 
 TEST(FreeLibraryTest, GivesOneUseBack) {
-  const HMODULE module = LoadLibraryW(TEXT("kx_clapi_dll"));
-  ASSERT_EQ(LoadLibraryW(TEXT("kx_clapi_dll")), module);
+  const HMODULE module = LoadLibraryW(KnownLibrary().name);
+  ASSERT_EQ(LoadLibraryW(KnownLibrary().name), module);
   EXPECT_TRUE(FreeLibrary(module));
-  EXPECT_NE(GetProcAddressW(module, TEXT("lapi_open")), nullptr);
+  EXPECT_NE(GetProcAddressW(module, KnownLibrary().function), nullptr);
   EXPECT_TRUE(FreeLibrary(module));
 }
 
