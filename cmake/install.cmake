@@ -1,10 +1,15 @@
 # What `cmake --install` lays out for an integrator: component `library` is what programs are built
 # against, component `tools` the program `orvenix`.
-include(CMakePackageConfigHelpers)
-
-set(package_folder lib/cmake/Orvenix)
-
 install(DIRECTORY include/orvenix DESTINATION include COMPONENT library FILES_MATCHING PATTERN "*.h")
+
+if(ORVENIX_CE)
+  install(FILES ${CMAKE_BINARY_DIR}/orvenix.dll DESTINATION bin COMPONENT library)
+  install(FILES ${CMAKE_BINARY_DIR}/orvenix.lib DESTINATION lib COMPONENT library)
+  return()
+endif()
+
+include(CMakePackageConfigHelpers)
+set(package_folder lib/cmake/Orvenix)
 install(TARGETS orvenix EXPORT OrvenixTargets
         LIBRARY DESTINATION lib COMPONENT library
         RUNTIME DESTINATION bin COMPONENT library

@@ -1,7 +1,9 @@
 """Installs the library of a build tree and uses it as an integrator does: the examples, in C and in
 C++, are built against the installed files alone, by CMake and by pkg-config, and upgrade a device.
 
-usage: check_install.py BUILD_TREE ORVENIX_PROGRAM
+The bundle comes from another installed tree's program `orvenix`, which serves it, too.
+
+usage: check_install.py BUILD_TREE BUILD_TREE_WITH_TOOLS
 """
 
 import concurrent.futures
@@ -14,7 +16,6 @@ import sys
 
 ROOT = pathlib.Path(__file__).resolve().parent.parent
 WORK = ROOT / "build/integrator"
-PREFIX = WORK / "installed"
 SERVER = "127.0.0.3"
 TEXT = "What an integrator sends.\n" * 100
 LIMIT = 120  # seconds for any one command
@@ -27,11 +28,12 @@ def call(*command, **more):
         sys.exit(f"check_install: {command[0]} exits with {result.returncode}")
 
 
-def install(tree):
-    call("cmake", "--install", tree, "--component", "library", "--prefix", PREFIX)
-    # Installed files must not lean on the folders that they come from: as if those were elsewhere.
-    moved = WORK / "moved"
-    PREFIX.rename(moved)
+def install(tree, name, *components):
+    prefix, moved = WORK / "first", WORK / name
+    for component in components:
+        call("cmake", "--install", tree, "--component", component, "--prefix", prefix)
+    # Installed files must not lean on the folders that they come from, nor on where they are.
+    prefix.rename(moved)
     for file in moved.rglob("*.cmake"):
         if str(ROOT / "src") in file.read_text() or str(ROOT / "simulator") in file.read_text():
             sys.exit(f"check_install: {file.name} names a folder of the sources")
@@ -93,18 +95,41 @@ def upgrade(program, port, manifest):
         sys.exit(f"check_install: after {program.name} the device has not got {file['destination']}")
 
 
+def link_for_windows(tree):
+    """The host in C against what is installed for desktop Windows."""
+    prefix = install(tree, "windows", "library")
+    call("x86_64-w64-mingw32-gcc", "-std=c90", "-Wall", "-Wextra", "-Werror", f"-I{prefix}/include",
+         ROOT / "examples/host_in_c/host.c", ROOT / "examples/host_in_c/windows.c",
+         f"-L{prefix}/lib", "-lorvenix", "-o", prefix / "bin/host.exe")
+
+
+def look_at_device(tree):
+    """What an integrator of the device finds."""
+    prefix = install(tree, "device", "library")
+    for file in ("bin/orvenix.dll", "lib/orvenix.lib", "include/orvenix/configlet.h"):
+        if not (prefix / file).is_file():
+            sys.exit(f"check_install: {tree} installs no {file}")
+
+
 def main():
     if len(sys.argv) != 3:
         sys.exit(__doc__.strip())
-    tree, program = pathlib.Path(sys.argv[1]).resolve(), pathlib.Path(sys.argv[2]).resolve()
+    tree, tree_with_tools = pathlib.Path(sys.argv[1]).resolve(), pathlib.Path(sys.argv[2]).resolve()
     shutil.rmtree(WORK, ignore_errors=True)
     WORK.mkdir(parents=True)
-    folders = build_examples(install(tree))
+    folders = build_examples(install(tree, "library", "library"))
+    program = install(tree_with_tools, "tools", "library", "tools") / "bin/orvenix"
     bundle, manifest = make_bundle(program)
     with Server(program, bundle) as server:
         programs = [folder / name for folder in folders for name in ("host", "client")]
         with concurrent.futures.ThreadPoolExecutor(len(programs)) as pool:  # they mostly wait
             list(pool.map(lambda program: upgrade(program, server.port, manifest), programs))
+    for tree, library, check in ((ROOT / "build/windows", "bin/orvenix.dll", link_for_windows),
+                                 (ROOT / "build/ce", "orvenix.dll", look_at_device)):
+        if (tree / library).exists():
+            check(tree)
+        else:
+            print(f"not looked at: {tree} is not built")
     print("the installed library serves integrators in C and in C++")
 
 

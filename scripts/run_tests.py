@@ -209,14 +209,15 @@ STEPS = [
     ("exports", "what the library exports and needs",
      check([sys.executable, "scripts/check_exports.py", "build/release/lib/liborvenix.so"],
            [sys.executable, "scripts/check_surface.py", "build/release/lib/liborvenix.so"])),
-    ("install", "the installed library, used by integrators in C and in C++",
-     check([sys.executable, "scripts/check_install.py", "build/release", "build/dev/bin/orvenix"])),
     ("windows", "the library for desktop Windows",
      check(["cmake", "--preset", "windows"], ["cmake", "--build", "--preset", "windows", "-j", JOBS],
            [sys.executable, "scripts/check_exports.py", "build/windows/bin/orvenix.dll"])),
     ("ce", "the library for Windows CE on 32-bit ARM", unless_missing(ARM_NONE, check(
         ["cmake", "--preset", "ce"], ["cmake", "--build", "--preset", "ce", "-j", JOBS],
         [sys.executable, "scripts/check_ce.py", "build/ce"]))),
+    ("install", "the installed library, used by integrators in C and in C++",
+     unless_unbuilt("build/release/lib/liborvenix.so", unless_unbuilt("build/dev/bin/orvenix", check(
+         [sys.executable, "scripts/check_install.py", "build/release", "build/dev"])))),
     ("ce-lint", "what the device's library consists of", unless_missing(CE_LINT, unless_unbuilt(
         "build/ce/orvenix.dll", check([sys.executable, "scripts/check_ce_binary.py", "build/ce"])))),
     ("ce-loader-build", "the simulator and the loader for 32-bit ARM",

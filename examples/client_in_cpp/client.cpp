@@ -28,7 +28,12 @@ UpgradeConfig* MakeJob(const Wanted& wanted) {
   auto* const job = new UpgradeConfig;
   auto* const store = NewRecord<tagStorageReq>();
   auto* const file = NewRecord<tagDownloadFile>();
-  if (job == nullptr || store == nullptr || file == nullptr) return nullptr;
+  if (job == nullptr || store == nullptr || file == nullptr) {
+    delete job;
+    LocalFree(store);
+    LocalFree(file);
+    return nullptr;
+  }
   Put(store->name, "\\");
   Put(store->required_space, "1");
   Put(file->source, wanted.source);

@@ -1,4 +1,5 @@
 // The client on a simulated device: client FOLDER SERVER PORT SOURCE DESTINATION CRC
+// Ends with 0 when the upgrade was carried out; what came of it stands in the device's log.
 #include <cesim/desk.h>
 
 #include <iostream>

@@ -1,4 +1,4 @@
-/* The host on a simulated device: host FOLDER SERVER PORT LIST CRC */
+/* The host on a simulated device of Linux: host FOLDER SERVER PORT LIST CRC */
 #include <cesim/desk.h>
 #include <stdio.h>
 #include <time.h>

@@ -23,7 +23,13 @@
  */
 #pragma once
 
+#if defined(_MSC_VER) && _MSC_VER < 1600 /* a device's compiler may be older than <stdint.h> */
+#include <stddef.h>
+typedef __int32 int32_t;
+typedef unsigned __int32 uint32_t;
+#else
 #include <stdint.h>
+#endif
 
 #include "orvenix/export.h"
 
@@ -35,11 +41,14 @@
 #define ICFG_NO_POWER 0xC4111003U        /* end of "Upgrade": power requirement not met */
 #define ICFG_TEST_FAILED 0xC4111005U     /* end of "Upgrade": a registry test failed */
 
-#ifdef __cplusplus
+#if defined(__cplusplus) && (!defined(_MSC_VER) || _MSC_VER >= 1900)
 #define ICFG_NOEXCEPT noexcept
-extern "C" {
 #else
 #define ICFG_NOEXCEPT
+#endif
+
+#ifdef __cplusplus
+extern "C" {
 #endif
 
 typedef struct IcfgCallbacks IcfgCallbacks;
