@@ -48,6 +48,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const std::string_view bytes(reinterpret_cast<const char*>(data), size);
   elf2pe::DllOptions options;
   options.name = "fuzzed.dll";
+  options.version = "3.44";
   try {
     const elf2pe::LinkedImage image = elf2pe::ReadLinkedImage(bytes);
     CheckImage(image);

@@ -21,11 +21,13 @@ constexpr std::size_t kSections = kOptional + 224;
 constexpr std::size_t kText = 0x400;
 constexpr std::size_t kExports = 0xA00;
 constexpr std::size_t kImports = 0xC00;
-constexpr std::size_t kRelocations = 0xE00;
+constexpr std::size_t kResources = 0xE00;
+constexpr std::size_t kRelocations = 0x1000;
 
 std::string Toy() {
   DllOptions options;
   options.name = "toy.dll";
+  options.version = "3.44";
   options.exports = {"Alpha", "Beta", "Counter"};
   return Convert(ReadLinkedImage(ToyImage().Bytes()), options);
 }
@@ -110,7 +112,7 @@ TEST(ReadPeTest, RefusesSectionsOfOtherNamesKindsAndPlaces) {
             "the file does not end with its last section");
   EXPECT_EQ(With([](std::string& dll) { dll.resize(dll.size() - 512); }),
             "section .reloc is at a wrong place in the file");
-  EXPECT_EQ(WithWord(kOptional + 56, 0x10000), "the header's image size is 0x10000, not 0x9000");
+  EXPECT_EQ(WithWord(kOptional + 56, 0x10000), "the header's image size is 0x10000, not 0xa000");
   EXPECT_EQ(WithWord(kOptional + 60, 0x200), "section .text is at a wrong place in the file");
 }
 
@@ -181,6 +183,16 @@ TEST(ReadPeTest, RefusesImportsOfOtherKinds) {
             "an import from 'COREDLL.dll' has a hint");
   EXPECT_EQ(WithWord(kDirectories + 12, 0x28),
             "the tables of imports do not have the size that they say");
+}
+
+TEST(ReadPeTest, RefusesResourcesButAVersion) {
+  constexpr const char* kRefused = "the image has resources besides a version";
+  EXPECT_EQ(WithByte(kResources + 16, 3), kRefused) << "an icon";
+  EXPECT_EQ(WithByte(kResources + 14, 2), kRefused) << "two of them";
+  EXPECT_EQ(WithWord(kResources + 72, 0x1000), kRefused) << "somewhere else";
+  EXPECT_EQ(WithWord(kResources + 76, 0x7FFFFFFF), kRefused) << "of another size";
+  EXPECT_EQ(WithWord(kDirectories + 2 * 8 + 4, 16),
+            "the resources do not have the size that they say");
 }
 
 TEST(ReadPeTest, RefusesRelocationsOfOtherKinds) {

@@ -126,6 +126,17 @@ TEST_F(Elf2peProgramTest, WritesADllThatOtherToolsReadAlike) {
   EXPECT_EQ(seen.output, expected);
 }
 
+TEST_F(Elf2peProgramTest, ShowsAVersionThatOtherToolsFind) {
+  if (!Has("llvm-readobj-14")) GTEST_SKIP() << "llvm-readobj-14 is not installed";
+  ASSERT_EQ(Run("toy.elf toy.dll --name toy.dll --exports exports.txt --version 3.44").code, 0);
+
+  const std::string seen = Shell("llvm-readobj-14 --coff-resources toy.dll").output;
+
+  EXPECT_THAT(seen, HasSubstr("Total Number of Resources: 1\n"));
+  EXPECT_THAT(seen, HasSubstr("Type: VERSIONINFO (ID 16) [\n"));
+  EXPECT_THAT(seen, HasSubstr("Language: (ID 1033) [\n"));
+}
+
 TEST_F(Elf2peProgramTest, WritesAnImportLibraryThatOtherToolsReadAlike) {
   if (!Has("llvm-readobj-14") || !Has("llvm-ar-14")) GTEST_SKIP() << "llvm-14 is not installed";
   ASSERT_EQ(Run("--import-library toy.lib --name toy.dll --exports exports.txt").code, 0);
