@@ -571,6 +571,12 @@ TEST_F(StorageTest, CountsStreamsAndRefusesOnesThatAreClosed) {
   EXPECT_EQ(ce_fopen("\\log.txt", nullptr), nullptr);
 }
 
+TEST_F(StorageTest, GivesTheConsoleByItsNumberAsTheDevicesLibraryAsksForIt) {
+  EXPECT_NE(_getstdfilex(1), nullptr);
+  EXPECT_EQ(_getstdfilex(1), ce_stdout());
+  EXPECT_EQ(_getstdfilex(0), nullptr);
+}
+
 TEST_F(StorageTest, AFullVolumeTakesNoLine) {
   ASSERT_TRUE(Make(TEXT("\\SDMMC Disk\\a.bin"), kCardBytes - 3));
   ce_FILE* const stream = ce_fopen("\\SDMMC Disk\\log.txt", "a");
