@@ -21,6 +21,7 @@
 #include "driver/drivers.h"
 #include "kernel/kernel.h"
 #include "library/library_code.h"
+#include "net/network.h"
 #include "profile/profile.h"
 #include "targets/device/library.h"
 #include "targets/host/host.h"
@@ -53,6 +54,8 @@ int Run(const std::filesystem::path& folder, std::uint32_t hurry) {
   device.kernel().ShortenSleeps(hurry);
   const sim::AttachedThread client(device);
   const host::Outcome outcome = host::RunHost();
+  std::printf("datagrams lost: %llu\n",
+              static_cast<unsigned long long>(device.network().datagrams_lost()));
   if (!AwaitThreads(device)) throw std::runtime_error("threads of the upgrade do not end");
   return static_cast<int>(outcome);
 }

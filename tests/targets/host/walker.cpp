@@ -69,6 +69,21 @@ bool AwaitEvent(bool wanted, DWORD limit_ms) {
   return true;
 }
 
+/// Whether a program of this name runs.
+bool ProcessRuns(const std::basic_string<WCHAR>& name) {
+  HANDLE const snapshot = CreateToolhelp32Snapshot(TH32CS_SNAPPROCESS, 0);
+  if (snapshot == INVALID_HANDLE_VALUE) return false;
+  PROCESSENTRY32 process = {};
+  process.dwSize = sizeof process;
+  bool found = false;
+  for (BOOL more = Process32First(snapshot, &process); more != FALSE && !found;
+       more = Process32Next(snapshot, &process)) {
+    found = name == process.szExeFile;
+  }
+  CloseToolhelp32Snapshot(snapshot);
+  return found;
+}
+
 /// What a file has gained since it had `taken` bytes.
 std::string Gain(const char* path, std::size_t& taken) {
   const std::string all = ReadWhole(path).value_or("");
@@ -97,6 +112,7 @@ const Walker::Verb Walker::kVerbs[] = {
     {"end", 1, 1, &Walker::EndGroup},
     {"await-end", 0, 0, &Walker::AwaitEnd},
     {"is-running", 0, 0, &Walker::IsRunning},
+    {"is-process", 1, 1, &Walker::IsProcess},
     {"log", 0, 0, &Walker::TakeLog},
     {"has-logged", 1, 1, &Walker::HasLogged},
     {"documents", 0, 0, &Walker::TakeDocuments},
@@ -228,6 +244,10 @@ Walker::Results Walker::AwaitEnd(const Arguments& /*arguments*/) {
 
 Walker::Results Walker::IsRunning(const Arguments& /*arguments*/) {
   return {YesOrNo(EventExists())};
+}
+
+Walker::Results Walker::IsProcess(const Arguments& arguments) {
+  return {YesOrNo(ProcessRuns(Widen(arguments[0].text)))};
 }
 
 Walker::Results Walker::TakeLog(const Arguments& /*arguments*/) {

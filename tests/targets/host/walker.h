@@ -54,6 +54,7 @@ class Walker {
   // What else happens on the device
   Results AwaitEnd(const Arguments& arguments);
   Results IsRunning(const Arguments& arguments);
+  Results IsProcess(const Arguments& arguments);
   Results TakeLog(const Arguments& arguments);
   Results HasLogged(const Arguments& arguments);
   Results MakeFolder(const Arguments& arguments);

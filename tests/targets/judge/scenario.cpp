@@ -37,7 +37,7 @@ Scenario HttpJob() {
   site["demo/wrong.txt"] = "right at last";
   site["demo/listed one.bin"] = Noise(5'000, 3);
   site["demo/foreign.bin"] = Noise(100, 4);
-  site["demo/new.txt.tmp"] = "takes the place of another\r\n";
+  site["demo/os.nb0"] = Noise(40'000, 8);
   std::string list;
   const auto add = [&site, &list](const std::string& name, const std::string& path,
                                   const std::string& masks) {

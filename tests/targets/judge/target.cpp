@@ -50,7 +50,7 @@ class Device final : public Target {
   [[nodiscard]] std::string name() const override { return "device"; }
   [[nodiscard]] std::string WhyNot() const override {
     if (!HasProgram("qemu-arm")) return "qemu-arm is missing (Debian package qemu-user)";
-    return Missing({host_, library_}, "./test targets builds it");
+    return Missing({host_, library_}, "./test ce ce-loader-build makes it");
   }
   [[nodiscard]] std::vector<std::string> Command(const fs::path& run) const override {
     MakeDevice(run, library_);
@@ -70,7 +70,7 @@ class Windows final : public Target {
   [[nodiscard]] std::string name() const override { return "windows"; }
   [[nodiscard]] std::string WhyNot() const override {
     if (!HasProgram("python3 " + Runner("--why-not"))) return "Wine cannot be used here";
-    return Missing({host_, library_}, "./test targets builds it");
+    return Missing({host_, library_}, "./test windows makes it");
   }
   void Prepare() const override {
     if (std::system(("python3 " + Runner("--prepare")).c_str()) != 0) {

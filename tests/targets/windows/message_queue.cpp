@@ -1,5 +1,6 @@
 // "kx_clapi_dll", the device's message queue, for machines that have none: every message becomes a
 // file in "\messages" of the current drive, named and numbered as the simulated device does it.
+#define ORVENIX_DESKTOP_NAMES  // the system's own functions, not what stands in for a device's
 #include <coredll.h>
 
 #include <cstdint>
