@@ -10,7 +10,7 @@ Code. The device's processors know the instructions of version 4T, and no more. 
 Thumb code, so whatever returns does so by BX. And its callers keep the stack at multiples of 4 only,
 where the compiler believes in 8: that shows when an address is rounded to 8 bytes, which is what
 reading a 64-bit argument of a variadic function does, or when the stack pointer is taken for round.
-Functions that round something else are listed in platform/ce/reviewed_code.txt.
+Sources that round something else are listed in platform/ce/reviewed_code.txt.
 
 Variadic calls. No argument may have 64 bits, or be of floating point. Every variadic function here
 takes a format, whose arguments the compiler compares with it (-Wformat=2, an error): so it is enough
@@ -97,24 +97,32 @@ def code_complaint(mnemonic, operands):
     return None
 
 
-def check_code(disassembly, reviewed):
-    """@param reviewed  names of functions whose roundings have been looked at"""
-    complaints, seen, link_set = [], set(), None
+def check_code(disassembly, reviewed, source_of):
+    """@param reviewed   sources, or functions without one, whose roundings have been looked at
+       @param source_of  gives the source that the instruction at an address comes from, or None
+    """
+    complaints, link_set = [], None
     for address, function, mnemonic, operands in instructions(disassembly):
         complaint = code_complaint(mnemonic, operands)
-        plain = function.split(".")[0]
-        if complaint and complaint.startswith("rounds") and plain in reviewed:
-            seen.add(plain)
-            complaint = None
+        if complaint and complaint.startswith("rounds"):
+            source = source_of(address) or function.split(".")[0]
+            complaint = None if source in reviewed else f"{complaint}, in {source}"
         if link_set is not None and mnemonic != "bx" + link_set:
             complaint = complaint or "does not call by BX, though the link register has been set"
         call = re.fullmatch(rf"mov({CONDITION})", mnemonic) if operands == "lr, pc" else None
         link_set = call.group(1) if call else None
         if complaint:
             complaints.append(f"{address} in {function}: {mnemonic} {operands}: {complaint}")
-    complaints += [f"platform/ce/reviewed_code.txt: {name} rounds nothing any more"
-                   for name in sorted(reviewed - seen)]
     return complaints
+
+
+def source_in(elf):
+    """The source_of() of an image: wherever the compiler has put the code, its source is the same."""
+    def source_of(address):
+        place = output("arm-none-eabi-addr2line", "-e", elf, address).split(":")[0]
+        found = re.search(r"\b(?:src|platform|include)/.*", place)
+        return found.group() if found else None
+    return source_of
 
 
 # ---- headers, imports, exports, relocations ----
@@ -373,7 +381,7 @@ def main():
     seen = output(readobj, "--file-headers", "--sections", "--coff-imports", "--coff-exports", "--coff-basereloc", dll)
     platform = ROOT / "platform/ce"
     complaints = check_code(output("arm-none-eabi-objdump", "-d", "--no-show-raw-insn", elf),
-                            names(platform / "reviewed_code.txt"))
+                            names(platform / "reviewed_code.txt"), source_in(elf))
     complaints += check_same_code(*code_of(elf, dll, seen, output("arm-none-eabi-readelf", "-SW", elf)))
     complaints += check_header(seen)
     complaints += check_imports(seen, listed_imports((platform / "imports.txt").read_text()))

@@ -20,7 +20,8 @@ def disassembly(*code, function="Alpha"):
 
 
 def complaints(*code, reviewed=()):
-    return [line.rsplit(": ", 1)[1] for line in lint.check_code(disassembly(*code), set(reviewed))]
+    found = lint.check_code(disassembly(*code), set(reviewed), lambda address: f"src/{address}.cpp")
+    return [line.rsplit(": ", 1)[1] for line in found]
 
 
 class CodeTest(unittest.TestCase):
@@ -53,11 +54,24 @@ class CodeTest(unittest.TestCase):
 
     def test_refuses_to_round_to_eight_but_where_it_has_been_seen(self):
         for code in ("bic\tr3, r3, #7", "bicne\tr3, r3, #7", "bics\tr9, r9, #7", "bic\tr2, r3, #7", "bic\tsp, sp, #7"):
-            self.assertIn("rounds to a multiple of 8", complaints(code))
-        self.assertEqual(complaints("bic\tr3, r3, #7", reviewed=["Alpha"]), [])
-        self.assertEqual(lint.check_code(disassembly("bic\tr3, r3, #7", function="Alpha.constprop.0"), {"Alpha"}), [])
-        self.assertEqual(lint.check_code(disassembly("bx\tlr"), {"Alpha"}),
-                         ["platform/ce/reviewed_code.txt: Alpha rounds nothing any more"])
+            self.assertIn("rounds to a multiple of 8, in src/10001000.cpp", complaints(code))
+        self.assertEqual(complaints("bic\tr3, r3, #7", reviewed=["src/10001000.cpp"]), [])
+        self.assertEqual(len(complaints("nop", "bic\tr3, r3, #7", reviewed=["src/10001000.cpp"])), 1)
+
+    def test_knows_code_without_a_source_by_its_function(self):
+        code = disassembly("bic\tr3, r3, #7", function="Alpha.constprop.0")
+        self.assertEqual(lint.check_code(code, {"Alpha"}, lambda address: None), [])
+        self.assertEqual(len(lint.check_code(code, {"Beta"}, lambda address: None)), 1)
+
+    def test_finds_the_source_of_an_instruction(self):
+        if not shutil.which("arm-none-eabi-g++"):
+            self.skipTest("gcc-arm-none-eabi is not installed")
+        with tempfile.TemporaryDirectory() as folder:
+            pathlib.Path(folder, "src").mkdir()
+            source = pathlib.Path(folder, "src/a.cpp")
+            source.write_text("extern \"C\" unsigned Round(unsigned n) { return n & ~7u; }\n")
+            subprocess.run(["arm-none-eabi-g++", "-O2", "-g", "-marm", "-c", source, "-o", f"{folder}/a.o"], check=True)
+            self.assertEqual(lint.source_in(f"{folder}/a.o")("0"), "src/a.cpp")
 
     def test_refuses_to_take_the_stack_pointer_for_round(self):
         for code in ("orr\tr0, sp, #4", "and\tr0, sp, #7", "tst\tsp, #7", "eor\tr0, sp, #4", "bic\tsp, sp, #15"):
@@ -77,7 +91,7 @@ class CodeTest(unittest.TestCase):
             subprocess.run(["arm-none-eabi-as", "-o", f"{folder}/bad.o", source], check=True)
             text = subprocess.run(["arm-none-eabi-objdump", "-d", "--no-show-raw-insn", f"{folder}/bad.o"],
                                   check=True, capture_output=True, text=True).stdout
-        found = lint.check_code(text, set())
+        found = lint.check_code(text, set(), lambda address: None)
         self.assertEqual(len(found), len(code), found)
         for complaint, expected in zip(found, code.values()):
             self.assertIn(expected, complaint)
