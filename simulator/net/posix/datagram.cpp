@@ -18,8 +18,14 @@ namespace {
 constexpr int kMulticastAll = 49;
 
 /// Devices of one host share its processors: what comes from a group to one of them while others
-/// run waits here. A host that allows less gives what it allows.
+/// run waits here. A host that allows less gives what it allows, but for its administrators.
 constexpr int kGroupBuffer = 1 << 20;
+
+int SetGroupBuffer(SocketFile& file, int wanted) {
+  if (wanted > 0) return file.Set(SOL_SOCKET, SO_RCVBUF, wanted);
+  if (file.Set(SOL_SOCKET, SO_RCVBUFFORCE, kGroupBuffer) == 0) return 0;
+  return file.Set(SOL_SOCKET, SO_RCVBUF, kGroupBuffer);
+}
 
 }  // namespace
 
@@ -190,9 +196,7 @@ int PosixDatagram::OpenGroup(Address group, Inbox& inbox) {
   if (error == 0) error = opened.Set(SOL_SOCKET, SO_REUSEADDR, 1);
   if (error == 0) error = opened.SetIfKnown(IPPROTO_IP, kMulticastAll, 0);
   if (error == 0) error = opened.SetIfKnown(SOL_SOCKET, SO_TIMESTAMPNS, 1);
-  if (error == 0) {
-    error = opened.Set(SOL_SOCKET, SO_RCVBUF, receive_buffer_ > 0 ? receive_buffer_ : kGroupBuffer);
-  }
+  if (error == 0) error = SetGroupBuffer(opened, receive_buffer_);
   if (error == 0) error = opened.Bind({group, port_});
   const ip_mreq request{{SwapOrder(group)}, {SwapOrder(device_.own)}};
   if (error == 0) error = opened.Set(IPPROTO_IP, IP_ADD_MEMBERSHIP, &request, sizeof request);
