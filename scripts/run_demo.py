@@ -6,7 +6,8 @@ find it. Everything the demo makes lies in out/demo: files, bundle, devices, scr
 evidence/ what the verdict was drawn from. Exit code 0 only if every line of the verdict holds.
 
 A scenario goes another way and proves that it ends as it must: result, messages, and what was
-touched before. Its files lie in out/demo-SCENARIO.
+touched before. Its files lie in out/demo-SCENARIO. With the target ce the device's own binary does all
+of that under qemu (demo_ce.py); files in out/demo-ce and out/demo-SCENARIO-ce.
 """
 
 import argparse
@@ -81,11 +82,16 @@ SCENARIOS = {scenario.name: scenario for scenario in (
 
 
 def build():
-    """Builds the tools; what the build says is shown only when it fails."""
+    """Builds the tools."""
+    build_with("release", "orvenix", "orvenix_program")
+
+
+def build_with(preset, *targets):
+    """What the build says is shown only when it fails."""
     jobs = str(os.cpu_count() or 2)
-    for command in (["cmake", "--preset", "release"],
-                    ["cmake", "--build", "--preset", "release", "-j", jobs, "--target", "orvenix",
-                     "orvenix_program"]):
+    for command in (["cmake", "--preset", preset],
+                    ["cmake", "--build", "--preset", preset, "-j", jobs,
+                     *(["--target", *targets] if targets else [])]):
         result = subprocess.run(command, cwd=ROOT, capture_output=True, text=True, check=False)
         if result.returncode != 0:
             sys.exit(f"demo: {' '.join(command)} failed:\n{result.stdout[-4000:]}{result.stderr[-4000:]}")
@@ -212,6 +218,12 @@ class Server:
     def read(self):
         self.lines.extend(self.process.stdout)
 
+    def multicast_events(self):
+        """What it has said so far of the files that go to the group."""
+        events = (json.loads(line) for line in list(self.lines))
+        return [event for event in events
+                if event["event"] == "multicast" and event.get("what") not in (None, "ready")]
+
     def await_line(self, text):
         """Waits until the server has said this."""
         limit = time.monotonic() + 30
@@ -231,6 +243,8 @@ class Server:
 class Device:
     """One simulated device, its run, and what is known of it afterwards."""
 
+    draws = True  # its screen, and the block map of what it receives
+
     def __init__(self, out, number):
         self.number = number
         suffix = "" if number == 0 else f"-{number + 1}"
@@ -238,7 +252,7 @@ class Device:
         self.screen = out / f"screen{suffix}"
         self.address = f"127.0.0.{1 if number == 0 else number + 2}"  # the server has 127.0.0.2
         self.events_file = self.evidence / "run-events.jsonl"
-        self.process = None
+        self.process = self.server = None
         self.seen = 0  # bytes of the events file
         self.has_received = self.spoilt = False
 
@@ -260,6 +274,16 @@ class Device:
             [str(PROGRAM), "run", str(job), "--device", str(self.folder), "--screens",
              str(self.screen), "--timeout", str(RUN_LIMIT_S), "--events", str(self.events_file)],
             stdin=subprocess.DEVNULL, stdout=shown, stderr=shown)
+
+    def watch(self):
+        """Shows what happens, if the run does not do that itself."""
+
+    def exit_code(self, scenario):
+        """Which one the run must have, and of what."""
+        return scenario.exit_code, "orvenix run"
+
+    def finish(self):
+        """To be called when the process has ended."""
 
     def arrived(self):
         """The files of the bundle that are on it."""
@@ -378,7 +402,8 @@ def judge_reception(device, events):
     started = log_file.is_file() and "State machine thread created" in log_file.read_text()
     if log_file.is_file():
         shutil.copyfile(log_file, device.evidence / "mcast.log")
-    return [row("block map", len(maps) > 0, f"{len(maps)} times drawn, {', '.join(sorted(roles))}"),
+    shown = [row("block map", len(maps) > 0, f"{len(maps)} times drawn, {', '.join(sorted(roles))}")]
+    return [*(shown if device.draws else []),
             row("spoilt", device.spoilt, f"{SPOILT} damaged after it had come"),
             row("client log", started, "mcast.log")]
 
@@ -436,7 +461,8 @@ def judge_end(device, events, log, log_file, scenario):
     result = f"0x{results[-1]:08X}" if results else "none"
     told = story.get("outcome") == scenario.outcome and story.get("result", 0) == scenario.result
     code = device.process.returncode
-    return [row("exit code", code == scenario.exit_code, f"`orvenix run` exit code {code}"),
+    expected, program = device.exit_code(scenario)
+    return [row("exit code", code == expected, f"`{program}` exit code {code}"),
             row("result", results == [scenario.result], result),
             row("log explained", told, f"{story.get('outcome')}: {story.get('text')}"),
             row("transfer log", scenario.result != 0 or
@@ -447,10 +473,11 @@ def judge_upgrade(device, report):
     done = [entry["report"] for entry in report.get("devices", [])
             if entry["address"] == device.address and entry.get("report")]
     pictures = sorted(device.screen.glob("*.png"))
+    window = [row("progress window", len(pictures) >= 2,
+                  f"{len(pictures)} pictures in {device.screen.name}/")]
     return [row("completion report", len(done) == 1 and done[0]["error"] == "",
                 f"{done[0]['bundle_rx']:,} bytes by HTTP" if done else "none received"),
-            row("progress window", len(pictures) >= 2,
-                f"{len(pictures)} pictures in {device.screen.name}/")]
+            *(window if device.draws else [])]
 
 
 def judge_device(device, files, before, scenario, report):
@@ -495,9 +522,12 @@ def run_devices(devices, job, scenario):
         device.start(job)
     while any(device.process.poll() is None for device in devices):
         for device in devices:
+            device.watch()
             if scenario.multicast and not device.spoilt:
                 device.spoil_when_received()
         time.sleep(0.05)
+    for device in devices:
+        device.watch()
 
 
 def read_options():
@@ -505,6 +535,8 @@ def read_options():
     parser.add_argument("--scenario", choices=sorted(filter(None, (*SCENARIOS, FIRMWARE))), default="",
                         help="a job that the device must refuse; http: one without multicast; "
                              "firmware: images, loaders, a package, two passes")
+    parser.add_argument("--target", choices=["linux", "ce"], default="linux",
+                        help="ce: the device's own binary under qemu-arm, without a screen")
     parser.add_argument("--loss", type=float, default=2.0, metavar="P",
                         help="percent of the server's datagrams that a device does not hear (2)")
     parser.add_argument("--seed", type=int, default=1, metavar="N",
@@ -515,6 +547,8 @@ def read_options():
     options = parser.parse_args()
     if not 0 <= options.loss <= 100 or not 1 <= options.devices <= 200 or options.seed < 0:
         parser.error("--loss goes from 0 to 100, --devices from 1 to 200, --seed from 0")
+    if options.target == "ce" and (options.scenario == FIRMWARE or options.devices > 1):
+        parser.error(f"--target ce has one device, and not the scenario {FIRMWARE}")
     return options
 
 
@@ -538,20 +572,28 @@ def fresh(out):
 def main():
     options = read_options()
     print("building ...", flush=True)
-    build()
+    kind, folder = Device, ""
+    if options.target == "ce":
+        import demo_ce
+        demo_ce.build()
+        kind, folder = demo_ce.Device, "-ce"
+    else:
+        build()
     if options.scenario == FIRMWARE:
         import demo_firmware
         return demo_firmware.main(fresh(ROOT / "out" / f"demo-{FIRMWARE}"))
     scenario = SCENARIOS[options.scenario]
-    out = fresh(scenario.folder)
+    out = fresh(scenario.folder.with_name(scenario.folder.name + folder))
     files, bundle, evidence = out / "files", out / "bundle", out / "evidence"
     evidence.mkdir(parents=True)
     make_files(files)
     port = free_port()
     count = options.devices if scenario.result == 0 else 1
+    if not kind.draws:
+        print("the device's own binary runs under qemu; nothing draws its screen or its block map")
     print(f"making a bundle and {'a device' if count == 1 else f'{count} devices'} ...", flush=True)
     make_bundle(files, bundle, port, scenario, options)
-    devices = [Device(out, number) for number in range(count)]
+    devices = [kind(out, number) for number in range(count)]
     for device in devices:
         device.make(scenario, options)
         prepare(device.folder, scenario)
@@ -562,9 +604,13 @@ def main():
     multicast = ["--expect", str(count), "--wait", "8"] if scenario.multicast else []
     server = Server(bundle, port, evidence, multicast)
     try:
+        for device in devices:
+            device.server = server
         run_devices(devices, bundle / "job.xml", scenario)
     finally:
         server.stop()
+    for device in devices:
+        device.finish()
     report_file = evidence / "server-report.json"
     report = json.loads(report_file.read_text()) if report_file.is_file() else {}
     rows = []
