@@ -1,7 +1,5 @@
 #include "ce_loader/toy_dll.h"
 
-#include <fstream>
-#include <iterator>
 #include <stdexcept>
 #include <utility>
 
@@ -16,11 +14,6 @@
 namespace test {
 namespace {
 
-std::string Content(const std::filesystem::path& path) {
-  std::ifstream file(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(file), {}};
-}
-
 std::size_t ChecksumField() {
   return elf2pe::DosPart().size() + 4 + elf2pe::SizeInFile<elf2pe::pe::FileHeader>() +
          elf2pe::pe::kChecksumOffset;
@@ -32,8 +25,8 @@ const std::string& ToyDll() {
   static const std::string dll = [] {
     elf2pe::DllOptions options;
     options.name = "toy.dll";
-    options.exports = elf2pe::ReadExportList(Content(ORVENIX_TOY_EXPORTS));
-    return elf2pe::Convert(elf2pe::ReadLinkedImage(Content(ORVENIX_TOY_ELF)), options);
+    options.exports = elf2pe::ReadExportList(loader::ReadDllFile(ORVENIX_TOY_EXPORTS));
+    return elf2pe::Convert(elf2pe::ReadLinkedImage(loader::ReadDllFile(ORVENIX_TOY_ELF)), options);
   }();
   return dll;
 }

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cstdio>
 #include <fstream>
-#include <iterator>
 #include <string>
 #include <system_error>
 
@@ -24,9 +23,10 @@ std::string ReadDllFile(const std::filesystem::path& file) {
   const std::uintmax_t size = std::filesystem::file_size(file, error);
   if (error) throw elf2pe::Refusal("it cannot be read: " + error.message());
   if (size > elf2pe::pe::kMaxImageSize) throw elf2pe::Refusal("it is too large for a DLL");
+  std::string bytes(static_cast<std::size_t>(size), '\0');
   std::ifstream stream(file, std::ios::binary);
-  std::string bytes{std::istreambuf_iterator<char>(stream), {}};
-  if (!stream.is_open() || stream.bad()) throw elf2pe::Refusal("it cannot be read");
+  stream.read(bytes.data(), static_cast<std::streamsize>(bytes.size()));
+  if (!stream) throw elf2pe::Refusal("it cannot be read");
   return bytes;
 }
 
