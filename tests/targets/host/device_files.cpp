@@ -121,6 +121,13 @@ bool Write(std::string_view path, std::string_view text) {
   return File(path, GENERIC_WRITE, CREATE_ALWAYS).Write(text);
 }
 
+std::uint64_t WriteTimeOf(std::string_view path) {
+  const File file(path, GENERIC_READ, OPEN_EXISTING);
+  FILETIME written = {};
+  if (!file.is_open() || GetFileTime(file.handle(), nullptr, nullptr, &written) == FALSE) return 0;
+  return std::uint64_t{written.dwHighDateTime} << 32U | written.dwLowDateTime;
+}
+
 bool MakeFolder(std::string_view path) {
   return CreateDirectoryW(Widen(path).c_str(), nullptr) != FALSE;
 }

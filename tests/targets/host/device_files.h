@@ -3,6 +3,7 @@
 
 #include <coredll.h>
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -17,6 +18,8 @@ namespace host {
 bool Append(std::string_view path, std::string_view text);
 /// Makes a file, in place of what it was.
 bool Write(std::string_view path, std::string_view text);
+/// The time of the last writing in the unit of file times; 0 when there is no such file.
+[[nodiscard]] std::uint64_t WriteTimeOf(std::string_view path);
 /// Makes a folder; its parent must be there.
 bool MakeFolder(std::string_view path);
 

@@ -118,6 +118,8 @@ const Walker::Verb Walker::kVerbs[] = {
     {"documents", 0, 0, &Walker::TakeDocuments},
     {"make-folder", 1, 1, &Walker::MakeFolder},
     {"make-file", 2, 2, &Walker::MakeFile},
+    {"attributes", 1, 1, &Walker::ShowAttributes},
+    {"write-time", 1, 1, &Walker::ShowWriteTime},
     {"file", 1, 1, &Walker::ShowFile},
     {"set-text", 3, 3, &Walker::SetText},
     {"set-number", 3, 3, &Walker::SetNumber},
@@ -269,6 +271,15 @@ Walker::Results Walker::MakeFolder(const Arguments& arguments) {
 
 Walker::Results Walker::MakeFile(const Arguments& arguments) {
   return {YesOrNo(Write(arguments[0].text, arguments[1].text))};
+}
+
+Walker::Results Walker::ShowAttributes(const Arguments& arguments) {
+  const DWORD attributes = GetFileAttributesW(Widen(arguments[0].text).c_str());
+  return {attributes == ~DWORD{0} ? "(none)" : std::to_string(attributes)};
+}
+
+Walker::Results Walker::ShowWriteTime(const Arguments& arguments) {
+  return {std::to_string(WriteTimeOf(arguments[0].text))};
 }
 
 Walker::Results Walker::ShowFile(const Arguments& arguments) {

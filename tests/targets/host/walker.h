@@ -59,6 +59,8 @@ class Walker {
   Results HasLogged(const Arguments& arguments);
   Results MakeFolder(const Arguments& arguments);
   Results MakeFile(const Arguments& arguments);
+  Results ShowAttributes(const Arguments& arguments);
+  Results ShowWriteTime(const Arguments& arguments);
   Results ShowFile(const Arguments& arguments);
   Results SetText(const Arguments& arguments);
   Results SetNumber(const Arguments& arguments);

@@ -101,6 +101,7 @@ int Run::CarryOut() const {
     WriteFile(folder_ / "said.txt", complaint);
     return kNoNetwork;
   }
+  ::setenv("TZ", "UTC", 1);
   const std::vector<std::string> command = target_.Command(folder_);
   WriteFile(folder_ / "device/storage/host.walk", WalkOf(scenario_, kWalks));
   WireServer server(scenario_, folder_);
