@@ -49,6 +49,12 @@ ROOT = pathlib.Path(__file__).resolve().parent.parent
 LETTERS = "tuvwxyabdefghijklmnopqrs"
 TIMED_OUT = 124
 SCREEN = (240, 320)
+# Windows lie on a desktop of that size, with no window manager between them and the program, and in
+# the colours of a device.
+SETTINGS = ((r"Software\\Wine\\Explorer", "Desktop", "Default"),
+            (r"Software\\Wine\\Explorer\\Desktops", "Default", "{}x{}".format(*SCREEN)),
+            (r"Control Panel\\Colors", "Background", "72 96 120"),
+            (r"Control Panel\\Colors", "WindowFrame", "0 0 0"))
 DEBIANS = pathlib.Path("/usr/lib/wine")  # where its packages put what they keep out of the PATH
 
 
@@ -119,14 +125,9 @@ def prepare():
             if done.returncode != 0:
                 output.seek(0)
                 sys.exit("wineboot failed:\n" + output.read().decode(errors="replace"))
-        # Windows lie on a desktop of this size, with no window manager between them and the program.
-        for key, name, value in ((r"HKCU\Software\Wine\Explorer", "Desktop", "Default"),
-                                 (r"HKCU\Software\Wine\Explorer\Desktops", "Default",
-                                  "{}x{}".format(*SCREEN))):
-            subprocess.run([wine(), "reg", "add", key, "/v", name, "/d", value, "/f"],
-                           env=environment(), stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-                           stderr=subprocess.DEVNULL, timeout=60, check=True)
         tell_server("-w")  # it writes the registry last of all
+        with open(where / "user.reg", "a") as registry:
+            registry.writelines(f'\n[{key}]\n"{name}"="{value}"\n' for key, name, value in SETTINGS)
         made.mkdir()
 
 

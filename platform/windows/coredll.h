@@ -96,6 +96,12 @@ BOOL PlatformCloseHandle(HANDLE handle);
 void* PlatformVirtualAlloc(void* address, SIZE_T size, DWORD type, DWORD protection);
 /// Knows the platform type, too.
 BOOL PlatformSystemParametersInfoW(UINT action, UINT parameter, void* value, UINT update);
+/// A window without a place covers the whole desktop, with no frame but the one it asks for.
+HWND PlatformCreateWindowExW(DWORD extended, const WCHAR* name, const WCHAR* title, DWORD style,
+                             int x, int y, int width, int height, HWND parent, HMENU menu,
+                             HINSTANCE instance, void* parameter);
+/// A line with flat ends, however wide.
+HPEN PlatformCreatePen(int style, int width, COLORREF colour);
 /// Bytes as they are, as on the device; as text each line feed would become two bytes.
 FILE* PlatformFopen(const char* name, const char* mode);
 }
@@ -106,5 +112,8 @@ FILE* PlatformFopen(const char* name, const char* mode);
 #define CloseHandle PlatformCloseHandle
 #define VirtualAlloc PlatformVirtualAlloc
 #define SystemParametersInfoW PlatformSystemParametersInfoW
+#undef CreateWindowExW
+#define CreateWindowExW PlatformCreateWindowExW
+#define CreatePen PlatformCreatePen
 #define fopen PlatformFopen
 #endif

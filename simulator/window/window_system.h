@@ -171,6 +171,8 @@ class WindowSystem {
   /// The object that a brush argument stands for, a system colour plus 1 included.
   [[nodiscard]] std::optional<Brush> BackgroundBrush(HBRUSH brush) const;
   [[nodiscard]] Font& font();
+  /// Another font than the system's, before anything is drawn.
+  void SetFont(std::unique_ptr<Font> font) { font_ = std::move(font); }
   [[nodiscard]] Image Compose();
 
   // ---- what the screen's public face keeps ----
