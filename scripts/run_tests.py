@@ -186,6 +186,23 @@ def fuzz_target(target):
 
 FUZZ_SECONDS = 5
 
+# Without these nothing can be made for desktop Windows, or not be carried out.
+MINGW = {"g++-mingw-w64-x86-64": "x86_64-w64-mingw32-g++",
+         "googletest": "/usr/src/googletest/googletest/src/gtest-all.cc"}
+MINGW32 = {"g++-mingw-w64-i686": "i686-w64-mingw32-g++"}
+WINE = {"wine64": "/usr/lib/wine/wine64", "xvfb": "Xvfb"}
+
+# Without these nothing can be made for 32-bit ARM, or not be carried out.
+ARM_LINUX = {"g++-arm-linux-gnueabi": "arm-linux-gnueabi-g++", "qemu-user": "qemu-arm",
+             "googletest": "/usr/src/googletest/googletest/src/gtest-all.cc"}
+
+ARM_NONE = {"gcc-arm-none-eabi": "arm-none-eabi-g++",
+            "libstdc++-arm-none-eabi-newlib": "/usr/include/newlib/c++"}
+
+# What looks at the device's library.
+CE_LINT = {"gcc-arm-none-eabi": "arm-none-eabi-g++", "binutils-arm-none-eabi": "arm-none-eabi-objdump",
+           "llvm-14": "llvm-readobj-14"}
+
 STEPS = [
     ("layers", "who may include whom", check([sys.executable, "scripts/check_layers.py"])),
     ("words", "words and paths that must not be in the project",
