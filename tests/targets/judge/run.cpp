@@ -85,7 +85,7 @@ void Run::Start() {
   process_ = ::fork();
   if (process_ < 0) throw std::runtime_error("no further process");
   if (process_ > 0) return;
-  ::setpgid(0, 0);
+  ::prctl(PR_SET_PDEATHSIG, SIGKILL);
   int code = kBroken;
   try {
     code = CarryOut();
@@ -114,10 +114,6 @@ bool Run::PollEnd() {
   if (::waitpid(process_, &status_, WNOHANG) == 0) return false;
   has_no_network_ = WIFEXITED(status_) && WEXITSTATUS(status_) == kNoNetwork;
   return true;
-}
-
-void Run::Kill() const {
-  ::kill(-process_, SIGKILL);
 }
 
 std::string Run::Complaint() const {

@@ -25,9 +25,6 @@ class Run {
   void Start();
   /// @return whether the run has ended, in which case it is over for good
   [[nodiscard]] bool PollEnd();
-  /// Only when started and not ended.
-  void Kill() const;
-
   [[nodiscard]] const std::filesystem::path& folder() const { return folder_; }
   /// Why nothing can be concluded from the run; empty when the client went its whole way.
   [[nodiscard]] std::string Complaint() const;

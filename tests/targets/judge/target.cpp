@@ -71,18 +71,20 @@ class Windows final : public Target {
  public:
   [[nodiscard]] std::string name() const override { return "windows"; }
   [[nodiscard]] std::string WhyNot() const override {
-    if (!HasProgram("python3 " + Runner("--why-not"))) return "Wine cannot be used here";
+    if (!Runs("--why-not")) return "Wine is missing (Debian package wine64)";
     return Missing({host_, library_}, "./test windows makes it");
   }
   void Prepare() const override {
-    if (std::system(("python3 " + Runner("--prepare")).c_str()) != 0) {
+    if (!Runs("--prepare")) {
       throw std::runtime_error("no Wine prefix could be made");
     }
   }
   [[nodiscard]] std::vector<std::string> Command(const fs::path& run) const override {
     MakeDevice(run, library_);
     const fs::path prefix = run / "prefix";
-    MakePrefix(prefix);
+    if (!Runs("--branch '" + prefix.string() + "'")) {
+      throw std::runtime_error("no Wine prefix could be made");
+    }
     ::setenv("ORVENIX_WINE_PREFIX", prefix.c_str(), 1);
     return {"python3",   kSources / "scripts/wine_run.py",
             "--folder",  run / "device/storage",
@@ -90,7 +92,7 @@ class Windows final : public Target {
             host_};
   }
   void TidyUp(const fs::path& run) const override {
-    std::system(("python3 " + Runner("--stop")).c_str());
+    static_cast<void>(Runs("--stop"));
     std::error_code ignored;
     fs::rename(run / "device/storage/messages", run / "device/messages", ignored);
     fs::rename(run / "device/storage/Flash", run / "device/flash", ignored);
@@ -98,20 +100,10 @@ class Windows final : public Target {
   }
 
  private:
-  static std::string Runner(const std::string& option) {
-    return (kSources / "scripts/wine_run.py").string() + " " + option + " 2>/dev/null";
-  }
-
-  static void MakePrefix(const fs::path& prefix) {
-    const fs::path shared = kBuilds / "wine-prefix";
-    fs::create_directories(prefix / "dosdevices");
-    fs::create_directories(prefix / "orvenix-locks");
-    for (const char* file : {"system.reg", "user.reg", "userdef.reg", ".update-timestamp"}) {
-      fs::copy_file(shared / file, prefix / file);
-    }
-    fs::create_directory_symlink(shared / "drive_c", prefix / "drive_c");
-    fs::create_directory_symlink("../drive_c", prefix / "dosdevices/c:");
-    fs::create_directory_symlink("/", prefix / "dosdevices/z:");
+  /// Has the script that knows Wine do something.
+  static bool Runs(const std::string& what) {
+    const std::string script = (kSources / "scripts/wine_run.py").string();
+    return std::system(("python3 '" + script + "' " + what + " >/dev/null 2>&1").c_str()) == 0;
   }
 
   const fs::path host_ = kBuilds / "windows/bin/target_host.exe";
