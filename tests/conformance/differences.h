@@ -55,7 +55,8 @@ struct Row {
 inline constexpr Row kDifferences[] = {
     {Difference::kNewAttribute, "SetFileAttributesW, GetFileAttributesW, FindFirstFileW",
      "keep exactly the attributes that were set",
-     "tell FILE_ATTRIBUTE_ARCHIVE of every file, whatever was set"},
+     "tell FILE_ATTRIBUTE_ARCHIVE of every file, whatever was set; ordinary users cannot set "
+     "others together with FILE_ATTRIBUTE_READONLY"},
     {Difference::kDots, "FindFirstFileW", "finds neither \".\" nor \"..\"", "finds both"},
     {Difference::kReplace, "CreateFileW (CREATE_ALWAYS)",
      "refuses a file that is read-only, hidden or a system file", "replaces it"},

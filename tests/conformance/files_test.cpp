@@ -381,9 +381,13 @@ TEST(SetFileAttributesWTest, SetsAndClearsAndAnswersNormalForNone) {
   ASSERT_TRUE(Write(TEXT("\\a.txt"), "x"));
   EXPECT_EQ(GetFileAttributesW(TEXT("\\a.txt")), FILE_ATTRIBUTE_ARCHIVE) << "a new file";
 
-  constexpr DWORD kSome = FILE_ATTRIBUTE_READONLY | FILE_ATTRIBUTE_HIDDEN | FILE_ATTRIBUTE_SYSTEM;
+  constexpr DWORD kSome = FILE_ATTRIBUTE_HIDDEN | FILE_ATTRIBUTE_SYSTEM;
   ASSERT_TRUE(SetFileAttributesW(TEXT("\\a.txt"), kSome));
   EXPECT_EQ(Attributes(GetFileAttributesW(TEXT("\\A.TXT"))), kSome);
+  constexpr DWORD kAll = kSome | FILE_ATTRIBUTE_READONLY;
+  ASSERT_TRUE(SetFileAttributesW(TEXT("\\a.txt"), kAll));
+  const DWORD told = Attributes(GetFileAttributesW(TEXT("\\A.TXT")));
+  EXPECT_EQ(Differs(Difference::kNewAttribute) ? told | kSome : told, kAll);
 
   ASSERT_TRUE(SetFileAttributesW(TEXT("\\a.txt"), FILE_ATTRIBUTE_NORMAL));
   EXPECT_EQ(Attributes(GetFileAttributesW(TEXT("\\a.txt"))), FILE_ATTRIBUTE_NORMAL);
