@@ -117,7 +117,9 @@ Gates::Gates(const std::vector<Gate>& gates) {
   if (memory == MAP_FAILED) throw std::system_error(errno, std::generic_category(), "gates");
   code_ = static_cast<std::uint32_t*>(memory);
   for (std::size_t i = 0; i < gates.size(); ++i) Write(gates[i], code_ + i * kWords);
-  mprotect(code_, size_, PROT_READ | PROT_EXEC);
+  if (mprotect(code_, size_, PROT_READ | PROT_EXEC) != 0) {
+    throw std::system_error(errno, std::generic_category(), "gates");
+  }
   auto* const begin = static_cast<char*>(memory);
   __builtin___clear_cache(begin, begin + size_);
 }

@@ -2,10 +2,12 @@
 
 #include <sys/mman.h>
 
+#include <cerrno>
 #include <cstdlib>
 #include <cstring>
 #include <limits>
 #include <string>
+#include <system_error>
 #include <utility>
 
 #include "tools/elf2pe/pe_format.h"
@@ -48,7 +50,9 @@ Options OptionsFromEnvironment() {
   Options options;
   const char* const base = std::getenv("ORVENIX_CE_BASE");
   if (base != nullptr && *base != '\0') {
-    options.base = static_cast<std::uint32_t>(std::strtoul(base, nullptr, 0));
+    char* end = nullptr;
+    options.base = static_cast<std::uint32_t>(std::strtoul(base, &end, 0));
+    if (*end != '\0') throw Refusal("ORVENIX_CE_BASE is no address: " + std::string(base));
   }
   const char* const misaligned = std::getenv("ORVENIX_CE_MISALIGNED");
   options.misaligned =
@@ -106,12 +110,16 @@ void MappedImage::Bind(const PeImage& image, bool misaligned) {
 }
 
 void MappedImage::Protect(const PeImage& image) const {
-  mprotect(base_, size_, PROT_READ);
+  const auto protect = [](char* begin, std::size_t size, int protection) {
+    if (mprotect(begin, size, protection) == 0) return;
+    throw std::system_error(errno, std::generic_category(), "protecting the image");
+  };
+  protect(base_, size_, PROT_READ);
   for (const elf2pe::PeSection& section : image.sections) {
     int protection = PROT_READ;
     if ((section.characteristics & elf2pe::pe::kExecute) != 0) protection |= PROT_EXEC;
     if ((section.characteristics & elf2pe::pe::kWrite) != 0) protection |= PROT_WRITE;
-    mprotect(base_ + section.rva, section.virtual_size, protection);
+    protect(base_ + section.rva, section.virtual_size, protection);
   }
 }
 
