@@ -9,7 +9,8 @@ another base), orvenix.dll, orvenix.lib and the converter.
 Code. The device's processors know the instructions of version 4T, and no more. Its callers may be
 Thumb code, so whatever returns does so by BX. And its callers keep the stack at multiples of 4 only,
 where the compiler believes in 8: that shows when an address is rounded to 8 bytes, which is what
-reading a 64-bit argument of a variadic function does, or when the stack pointer is taken for round.
+reading a 64-bit argument of a variadic function does, or when the stack pointer, or a copy of it, is
+taken for round.
 Sources that round something else are listed in platform/ce/reviewed_code.txt.
 
 Variadic calls. No argument may have 64 bits, or be of floating point. Every variadic function here
@@ -29,6 +30,11 @@ import sys
 import tempfile
 
 ROOT = pathlib.Path(__file__).resolve().parent.parent
+sys.path.insert(0, str(ROOT / "platform/ce"))
+sys.dont_write_bytecode = True
+
+import import_veneers  # noqa: E402
+
 LARGEST_DLL = 160 * 1024
 
 CONDITION = "(?:eq|ne|cs|cc|mi|pl|vs|vc|hi|ls|ge|lt|gt|le)?"
@@ -90,20 +96,40 @@ def code_complaint(mnemonic, operands):
             r"pc, \[pc, \w+, lsl #2\]", operands)
         if not table:
             return "jumps without BX"
-    if re.match(r"bics?" + CONDITION + "$", mnemonic) and operands.endswith("#7"):
+    if re.match(r"bics?" + CONDITION + "$", mnemonic) and re.search(r", #(?:7|15|31|63)$", operands):
         return "rounds to a multiple of 8"
     if re.search(r"\bsp\b", operands) and not MAY_USE_STACK_POINTER.match(mnemonic):
         return "takes the stack pointer for more than an address"
     return None
 
 
+def stack_complaint(mnemonic, operands, on_stack):
+    """The same for the bits of an address on the stack.
+
+    @param on_stack  registers that hold one since an instruction or more; kept up to date
+    """
+    registers = [part.strip() for part in operands.split(",")]
+    holds = re.match(r"(?:mov|add|sub)s?" + CONDITION + "$", mnemonic) and registers[1:2] == ["sp"]
+    looks = re.match(r"(?:and|orr|bic|eor|tst|teq)", mnemonic) and on_stack & set(
+        registers if mnemonic.startswith("t") else registers[1:])
+    if not COMPARES.match(mnemonic) or re.match(r"bl", mnemonic):
+        on_stack.difference_update(["r0", "r1", "r2", "r3"] if mnemonic.startswith("bl") else
+                                   re.findall(r"\b(?:r\d+|fp|ip|lr)\b", operands)
+                                   if re.match(r"ldm|pop", mnemonic) else registers[:1])
+    if re.match(r"b(?!l|ic)", mnemonic):
+        on_stack.clear()  # what follows is reached from elsewhere
+    if holds and registers[0] != "sp":
+        on_stack.add(registers[0])
+    return "takes the bits of an address on the stack" if looks else None
+
+
 def check_code(disassembly, reviewed, source_of):
     """@param reviewed   sources, or functions without one, whose roundings have been looked at
        @param source_of  gives the source that the instruction at an address comes from, or None
     """
-    complaints, link_set = [], None
+    complaints, link_set, on_stack = [], None, set()
     for address, function, mnemonic, operands in instructions(disassembly):
-        complaint = code_complaint(mnemonic, operands)
+        complaint = code_complaint(mnemonic, operands) or stack_complaint(mnemonic, operands, on_stack)
         if complaint and complaint.startswith("rounds"):
             source = source_of(address) or function.split(".")[0]
             complaint = None if source in reviewed else f"{complaint}, in {source}"
@@ -209,44 +235,91 @@ def check_relocations(readobj, readelf):
     return complaints
 
 
-def check_same_code(linked, converted, slots, tables):
-    """The DLL's code is what was disassembled, but for words that now address import tables.
+def check_same_code(linked, converted, moved):
+    """The DLL's code is what was disassembled, but for the words that address import slots: each now
+    addresses the entry of the same function.
 
-    linked, converted: the bytes of both; slots, tables: ranges of addresses, {start: end}
+    linked, converted: the bytes of both; moved: {address of a slot: address of the entry}
     """
     if len(linked) != len(converted):
         return ["its code has another length than the linker's"]
-
-    def within(address, ranges):
-        return any(start <= address < end for start, end in ranges.items())
-
     complaints = []
     for at in range(0, len(linked), 4):
         before = int.from_bytes(linked[at:at + 4], "little")
         after = int.from_bytes(converted[at:at + 4], "little")
-        if before != after and not (within(before, slots) and within(after, tables)):
+        if after != moved.get(before, before):
             complaints.append(f"its code has {after:08x} at {at:#x}, where the linker had {before:08x}")
     return complaints
 
 
-def code_of(elf, dll, readobj, readelf):
+def entries(readobj, base):
+    """{function: address of its entry in an import address table}"""
+    found = {}
+    for block in re.findall(r"^Import \{\n(.*?)^\}", readobj, re.M | re.S):
+        table = int(re.search(r"ImportAddressTableRVA: 0x([0-9A-F]+)", block).group(1), 16)
+        for at, function in enumerate(re.findall(r"^  Symbol: (\S*) ", block, re.M)):
+            found[function] = base + table + 4 * at
+    return found
+
+
+def code_of(elf, dll, readobj, readelf, symbols):
     """The arguments of check_same_code."""
-    sections = {name: (int(address, 16), int(offset, 16), int(size, 16)) for name, address, offset, size in
-                re.findall(r"^ *\[ *\d+\] (\S+) +\S+ +([0-9a-f]+) ([0-9a-f]+) ([0-9a-f]+)", readelf, re.M)}
-    _, offset, size = sections[".text"]
+    _, offset, size = next((int(address, 16), int(offset, 16), int(size, 16)) for name, address, offset, size in
+                           re.findall(r"^ *\[ *\d+\] (\S+) +\S+ +([0-9a-f]+) ([0-9a-f]+) ([0-9a-f]+)", readelf, re.M)
+                           if name == ".text")
     raw = int(re.search(r"Name: \.text .*?PointerToRawData: 0x([0-9A-F]+)", readobj, re.S).group(1), 16)
-    table = [int(value, 16) for value in re.search(r"IATRVA: 0x([0-9A-F]+)\s+IATSize: 0x([0-9A-F]+)", readobj).groups()]
     base = int(re.search(r"ImageBase: 0x([0-9A-F]+)", readobj).group(1), 16)
-    slots = {start: start + length for name, (start, _, length) in sections.items() if name.startswith(".idata$")}
-    return (elf.read_bytes()[offset:offset + size], dll.read_bytes()[raw:raw + size], slots,
-            {base + table[0]: base + sum(table)})
+    table = entries(readobj, base)
+    moved = {int(address, 16): table[function]
+             for address, function in re.findall(r"^([0-9a-f]+) \w __imp_(\S+)$", symbols, re.M)}
+    return elf.read_bytes()[offset:offset + size], dll.read_bytes()[raw:raw + size], moved
+
+
+# What would end the host's process, or count on the end of one.
+UNWANTED = {"_Znwj": "operator new that ends the process", "_Znaj": "operator new[] that ends the process",
+            "abort": "abort", "__aeabi_atexit": "a static destructor"}
+
+
+def check_symbols(symbols):
+    there = set(re.findall(r"^[0-9a-f]+ \w (\S+)$", symbols, re.M))
+    return [f"has {what}" for name, what in UNWANTED.items() if name in there]
+
+
+# ---- declarations ----
+
+NARROW = re.compile(r"(?:const )?(?:BYTE|UCHAR|CHAR|char|bool|WORD|USHORT|SHORT|ATOM|WCHAR|(?:unsigned )?short|"
+                    r"(?:std::)?u?int(?:8|16)_t)")
+WIDE = re.compile(r"(?:const )?(?:LONGLONG|ULONGLONG|double|float|ULARGE_INTEGER|(?:std::)?u?int64_t)")
+FUNCTION = re.compile(r"^(?:ORVENIX_EXPORT )?([A-Za-z_][\w: ]*?[ *&]+)(\w+)\(([^()]*)\)(?: ICFG_NOEXCEPT)?;", re.M)
+
+
+def without_name(parameter):
+    return re.sub(r"\s*\b\w+$", "", parameter.strip()) if " " in parameter.strip() else parameter.strip()
+
+
+def check_declarations(api, cleared, may_take_narrow):
+    """@param cleared  functions whose results of 8 or 16 bits the veneers clear
+       @param may_take_narrow  we are the caller, and extend what is passed"""
+    structures = set(re.findall(r"^struct (\w+) \{", api, re.M))
+    complaints = []
+    for result, name, parameters in FUNCTION.findall(re.sub(r"//.*|/\*.*?\*/", "", api)):
+        result = result.strip()
+        name = name.removeprefix("ce_")
+        if NARROW.fullmatch(result) and name not in cleared:
+            complaints.append(f"{name} gives {result}, and nobody clears the rest of the register")
+        if WIDE.fullmatch(result) or result in structures:
+            complaints.append(f"{name} gives {result}, which is more than a register")
+        for parameter in (without_name(part) for part in parameters.split(",")):
+            if WIDE.fullmatch(parameter) or NARROW.fullmatch(parameter) and not may_take_narrow:
+                complaints.append(f"{name} takes {parameter}, which is no word")
+    return complaints
 
 
 # ---- variadic calls ----
 
 WIDE_CONVERSION = re.compile(r"%[-+ #0-9.*]*(?:(?:ll|j|z|t|L|q|I64|w)\s*[a-zA-Z]|[aefgAEFG])")
 # `...` behind a comma or alone, and not behind a type: no parameter pack.
-VARIADIC = re.compile(r"[(,]\s*\.\.\.\s*\)\s*(?:const\s*)?(?:noexcept\s*)?[;{]")
+VARIADIC = re.compile(r"[(,]\s*\.\.\.\s*\)\s*(?:const\s*)?(?:noexcept\s*)?(?:override\s*)?(?:final\s*)?[;{]")
 LITERAL = re.compile(r'"((?:[^"\\\n]|\\.)*)"')
 
 
@@ -265,7 +338,9 @@ def check_formats(sources):
     """@param sources  {path: text} of everything that is compiled into the library"""
     complaints, formatted, variadic = [], set(), {}
     for path, text in sources.items():
-        joined = re.sub(r'"\s*\n\s*"', "", text.replace("'\"'", ""))
+        joined = re.sub(r'(?<!\\)"\s*"', "", text.replace("'\"'", "").replace('""', ""))
+        if re.search(r"\bPRI[diouxX](?:64|MAX)\b", text):
+            complaints.append(f"{path}: has a conversion of 64 bits by its name")
         for literal in LITERAL.findall(joined):
             bad = WIDE_CONVERSION.search(literal.replace("%%", ""))
             if bad:
@@ -382,7 +457,12 @@ def main():
     platform = ROOT / "platform/ce"
     complaints = check_code(output("arm-none-eabi-objdump", "-d", "--no-show-raw-insn", elf),
                             names(platform / "reviewed_code.txt"), source_in(elf))
-    complaints += check_same_code(*code_of(elf, dll, seen, output("arm-none-eabi-readelf", "-SW", elf)))
+    symbols = output("arm-none-eabi-nm", elf)
+    complaints += check_same_code(*code_of(elf, dll, seen, output("arm-none-eabi-readelf", "-SW", elf), symbols))
+    complaints += check_symbols(symbols)
+    for folder, narrow in ((ROOT / "platform/api/ce", True), (ROOT / "include/orvenix", False)):
+        api = "".join(path.read_text() for path in sorted(folder.glob("*.h")) if path.name != "upgrade_config.h")
+        complaints += check_declarations(api, import_veneers.SHORT_RESULTS, narrow)
     complaints += check_header(seen)
     complaints += check_imports(seen, listed_imports((platform / "imports.txt").read_text()))
     complaints += check_exports(seen, names(platform / "exports.txt"))

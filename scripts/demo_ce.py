@@ -97,8 +97,8 @@ class Device(demo.Device):
     def finish(self):
         """Tells what happened in the words of `orvenix run`."""
         storage = self.folder / "storage"
-        trace = (storage / "host.trace").read_text().splitlines()
-        shutil.copyfile(storage / "host.trace", self.evidence / "host.trace")
+        trace = lines_of(storage / "host.trace")
+        (self.evidence / "host.trace").write_text("\n".join(trace) + "\n")
         events = [{"event": "processes", "names": [demo.STOPPED] if line.endswith('"yes"') else []}
                   for line in trace if line.startswith("is-process ")]
         for line in trace:
@@ -106,7 +106,7 @@ class Device(demo.Device):
             if ended:
                 events.append({"event": "call", "function": "IcfgEndGroup", "name": "Upgrade",
                                "result": RESULTS.get(ended[1], -1)})
-        events += [status_of(text) for text in documents(storage / "documents.trace")]
+        events += [status_of(text) for text in lines_of(storage / "documents.trace")]
         events += [{"event": "multicast", "step": "received", "file": event["file"]}
                    for event in self.server.multicast_events() if event["what"] == "proven"]
         lost = re.search(r"datagrams lost: (\d+)", (self.evidence / "run.txt").read_text())
@@ -114,7 +114,7 @@ class Device(demo.Device):
         self.events_file.write_text("".join(json.dumps(event) + "\n" for event in events))
 
 
-def documents(file):
+def lines_of(file):
     return file.read_text().splitlines() if file.is_file() else []
 
 

@@ -518,14 +518,21 @@ def show(rows, out):
 
 def run_devices(devices, job, scenario):
     """Runs all of them at once, and damages the file on each as soon as it may be."""
-    for device in devices:
-        device.start(job)
-    while any(device.process.poll() is None for device in devices):
+    deadline = time.monotonic() + RUN_LIMIT_S + 60  # they end by themselves before, if they can
+    try:
         for device in devices:
-            device.watch()
-            if scenario.multicast and not device.spoilt:
-                device.spoil_when_received()
-        time.sleep(0.05)
+            device.start(job)
+        while any(device.process.poll() is None for device in devices) and time.monotonic() < deadline:
+            for device in devices:
+                device.watch()
+                if scenario.multicast and not device.spoilt:
+                    device.spoil_when_received()
+            time.sleep(0.05)
+    finally:
+        for device in devices:
+            if device.process is not None and device.process.poll() is None:
+                device.process.kill()
+                device.process.wait()
     for device in devices:
         device.watch()
 

@@ -53,7 +53,8 @@ class CodeTest(unittest.TestCase):
         self.assertEqual(len(complaints("movne\tlr, pc", "bx\tr3")), 1)
 
     def test_refuses_to_round_to_eight_but_where_it_has_been_seen(self):
-        for code in ("bic\tr3, r3, #7", "bicne\tr3, r3, #7", "bics\tr9, r9, #7", "bic\tr2, r3, #7", "bic\tsp, sp, #7"):
+        for code in ("bic\tr3, r3, #7", "bicne\tr3, r3, #7", "bics\tr9, r9, #7", "bic\tr2, r3, #7", "bic\tsp, sp, #7",
+                     "bic\tr2, r3, #15"):
             self.assertIn("rounds to a multiple of 8, in src/10001000.cpp", complaints(code))
         self.assertEqual(complaints("bic\tr3, r3, #7", reviewed=["src/10001000.cpp"]), [])
         self.assertEqual(len(complaints("nop", "bic\tr3, r3, #7", reviewed=["src/10001000.cpp"])), 1)
@@ -76,6 +77,14 @@ class CodeTest(unittest.TestCase):
     def test_refuses_to_take_the_stack_pointer_for_round(self):
         for code in ("orr\tr0, sp, #4", "and\tr0, sp, #7", "tst\tsp, #7", "eor\tr0, sp, #4", "bic\tsp, sp, #15"):
             self.assertEqual(len(complaints(code)), 1, code)
+
+    def test_refuses_to_look_at_the_bits_of_a_copy_of_the_stack_pointer(self):
+        for code in (("mov\tr3, sp", "orr\tr3, r3, #4"), ("add\tr2, sp, #8", "tst\tr2, #7"),
+                     ("mov\tr3, sp", "nop", "and\tr0, r3, #7")):
+            self.assertEqual(complaints(*code), ["takes the bits of an address on the stack"], code)
+        for code in (("mov\tr3, sp", "ldr\tr3, [r3]", "orr\tr3, r3, #4"), ("mov\tr0, sp", "bl\t10002000 <F>", "tst\tr0, #1"),
+                     ("mov\tr3, sp", "add\tr3, r3, #4", "bx\tlr")):
+            self.assertEqual(complaints(*code), [], code)
 
     def test_finds_all_of_it_in_what_the_assembler_makes(self):
         if not shutil.which("arm-none-eabi-as"):
@@ -102,10 +111,10 @@ def words(*values):
 
 
 class SameCodeTest(unittest.TestCase):
-    SLOTS, TABLES = {0x10006000: 0x10006008}, {0x10007050: 0x10007060}
+    MOVED = {0x10006000: 0x10007050, 0x10006004: 0x10007054}
 
     def complaints(self, linked, converted):
-        return lint.check_same_code(words(*linked), words(*converted), self.SLOTS, self.TABLES)
+        return lint.check_same_code(words(*linked), words(*converted), self.MOVED)
 
     def test_takes_words_that_now_address_an_import_table(self):
         self.assertEqual(self.complaints([1, 0x10006004, 3], [1, 0x10007054, 3]), [])
@@ -115,7 +124,42 @@ class SameCodeTest(unittest.TestCase):
                          ["its code has 00000003 at 0x4, where the linker had 00000002"])
         self.assertEqual(len(self.complaints([1, 0x10006004], [1, 0x10007060])), 1)
         self.assertEqual(len(self.complaints([1, 0x10006008], [1, 0x10007054])), 1)
+        self.assertEqual(len(self.complaints([1, 0x10006004], [1, 0x10006004])), 1)
         self.assertEqual(self.complaints([1, 2], [1]), ["its code has another length than the linker's"])
+
+    def test_refuses_the_entry_of_another_function(self):
+        self.assertEqual(len(self.complaints([0x10006000], [0x10007054])), 1)
+
+    def test_finds_the_entries_in_the_order_of_their_functions(self):
+        table = "ImportAddressTableRVA: 0x50"
+        said = f"Import {{\n  Name: A.dll\n  {table}\n  Symbol: One (0)\n  Symbol: Two (0)\n}}\n"
+        self.assertEqual(lint.entries(said, 0x1000), {"One": 0x1050, "Two": 0x1054})
+
+
+class SymbolsTest(unittest.TestCase):
+    def test_refuses_what_ends_the_host_s_process(self):
+        for name in ("_Znwj", "_Znaj", "abort", "__aeabi_atexit"):
+            self.assertEqual(len(lint.check_symbols(f"10001000 T {name}\n10002000 T _ZdlPv\n")), 1, name)
+        self.assertEqual(lint.check_symbols("10001000 T abort_transfer\n"), [])
+
+
+class DeclarationsTest(unittest.TestCase):
+    def complaints(self, api, narrow=True):
+        return lint.check_declarations(api, {"htons"}, narrow)
+
+    def test_takes_words(self):
+        self.assertEqual(self.complaints("BOOL Beep(DWORD length, const WCHAR* name,\n          void* more);\n"
+                                         "std::uint16_t ce_htons(std::uint16_t value);\nvoid Nothing();\n"), [])
+
+    def test_refuses_results_that_nobody_extends_or_that_take_more_than_a_register(self):
+        for api in ("SHORT GetKeyState(int key);", "std::uint16_t ce_swap(int a);", "LONGLONG Ticks(void);",
+                    "double Half(int of);", "struct POINT {\n};\nPOINT Where(int of);"):
+            self.assertEqual(len(self.complaints(api + "\n")), 1, api)
+
+    def test_refuses_arguments_of_more_than_a_word_and_where_others_call_of_less(self):
+        self.assertEqual(len(self.complaints("BOOL Wait(ULONGLONG until, int more);\n")), 1)
+        self.assertEqual(self.complaints("BOOL Set(BYTE value);\n"), [])
+        self.assertEqual(len(self.complaints("ORVENIX_EXPORT uint32_t Set(uint8_t value) ICFG_NOEXCEPT;\n", False)), 1)
 
 
 HEADER = """  Machine: IMAGE_FILE_MACHINE_ARM (0x1C0)
@@ -244,6 +288,8 @@ class VariadicTest(unittest.TestCase):
             found = lint.check_formats({"a.cpp": f'Log("wide: {conversion}\\n", wide);'})
             self.assertEqual(len(found), 1, conversion)
         self.assertEqual(len(lint.check_formats({"a.cpp": 'Log("split %l"\n    "lu");'})), 1)
+        self.assertEqual(len(lint.check_formats({"a.cpp": 'Log("split %" "llu", wide);'})), 1)
+        self.assertEqual(len(lint.check_formats({"a.cpp": 'Log("%" PRIu64, wide);'})), 1)
 
     def test_refuses_variadic_functions_whose_formats_nobody_reads(self):
         found = lint.check_formats({"log.h": FORMATTED + "\nvoid Tell(const char* format, ...);\n"})

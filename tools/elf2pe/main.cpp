@@ -75,7 +75,9 @@ void WriteFile(const std::string& path, const std::string& bytes) {
   std::ofstream file(path, std::ios::binary);
   file.write(bytes.data(), static_cast<std::streamsize>(bytes.size()));
   file.close();
-  if (!file) throw Refusal(path + ": cannot be written");
+  if (file) return;
+  std::remove(path.c_str());  // nobody is to take half of it
+  throw Refusal(path + ": cannot be written");
 }
 
 elf2pe::LinkedImage ReadImage(const std::string& path) {
@@ -102,6 +104,7 @@ elf2pe::DllOptions OptionsOf(const CommandLine& line) {
 }
 
 void MakeDll(const CommandLine& line) {
+  std::remove(line.files[1].c_str());  // an older one would pass for this one's result
   const elf2pe::DllOptions options = OptionsOf(line);
   const elf2pe::LinkedImage image = ReadImage(line.files[0]);
   const auto check = line.options.find("--check");

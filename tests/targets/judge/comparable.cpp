@@ -19,9 +19,6 @@ constexpr std::string_view kForms[] = {
 constexpr std::string_view kClosedInWait = "Orvenix - MCStatusThread - recvfrom got error";
 constexpr std::string_view kClosedInWaitToo = "Orvenix - MCStatusThread, select error";
 
-/// The library writes whole line ends into a stream of text, and some C run times add their own.
-constexpr std::string_view kTwice = "\r\r\n";
-
 bool Fits(std::string_view text, std::string_view form) {
   if (text.size() < form.size()) return false;
   for (std::size_t i = 0; i < form.size(); ++i) {
@@ -35,10 +32,6 @@ bool Fits(std::string_view text, std::string_view form) {
 
 std::string Comparable(const std::string& text) {
   std::string result = text;
-  for (std::size_t at = result.find(kTwice); at != std::string::npos;
-       at = result.find(kTwice, at)) {
-    result.erase(at, 1);
-  }
   const std::size_t closed = result.find(kClosedInWait);
   if (closed != std::string::npos) result.replace(closed, kClosedInWait.size(), kClosedInWaitToo);
   for (const std::string_view form : kForms) {

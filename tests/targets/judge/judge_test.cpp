@@ -39,10 +39,6 @@ TEST(JudgeTest, TakesAllTimesOfDayForOne) {
   EXPECT_EQ(Comparable("200000 2026/11/22 20"), "200000 2026/11/22 20") << "no times";
 }
 
-TEST(JudgeTest, TakesADoubledCarriageReturnForOne) {
-  EXPECT_EQ(Comparable("a\r\r\nb\r\n\r\rc\r\n"), "a\r\nb\r\n\r\rc\r\n");
-}
-
 host::WalkLine Read(const std::string& text) {
   host::WalkLine line;
   EXPECT_TRUE(host::ReadWalkLine(text, line)) << text;

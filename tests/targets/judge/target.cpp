@@ -3,6 +3,7 @@
 #include <stdlib.h>
 
 #include <cstdlib>
+#include <fstream>
 #include <stdexcept>
 #include <system_error>
 
@@ -96,6 +97,11 @@ class Windows final : public Target {
     std::error_code ignored;
     fs::rename(run / "device/storage/messages", run / "device/messages", ignored);
     fs::rename(run / "device/storage/Flash", run / "device/flash", ignored);
+    std::string left_behind;  // by the server, where it talks to its programs
+    std::ifstream(run / "prefix/wineserver") >> left_behind;
+    if (left_behind.rfind("wine-", 0) == 0) {
+      fs::remove_all(fs::temp_directory_path() / left_behind, ignored);
+    }
     fs::remove_all(run / "prefix", ignored);
   }
 
